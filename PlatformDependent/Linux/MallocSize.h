@@ -1,0 +1,6 @@
+// malloc_size, under its name on other systems: the usable size of a block of the C heap, 0 for null.
+#pragma once
+
+#include <malloc.h>
+
+inline size_t malloc_size(const void* pointer) { return malloc_usable_size(const_cast<void*>(pointer)); }
