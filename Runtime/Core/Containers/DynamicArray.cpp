@@ -1,0 +1,53 @@
+#include "Runtime/Core/Containers/DynamicArray.h"
+
+#include "Runtime/Utilities/Format.h"
+
+#include <algorithm>
+
+namespace dynamic_array_detail {
+
+// A product that does not fit becomes a size that every allocation refuses, not a small one.
+static size_t GetByteCount(size_t capacity, size_t elementSize) {
+    size_t bytes = 0;
+    return __builtin_mul_overflow(capacity, elementSize, &bytes) ? ~size_t{0} : bytes;
+}
+
+void* dynamic_array_data::resize_buffer(size_t capacity, ResizePolicy policy, size_t elementSize, size_t alignment) {
+    if (policy == kResizeDouble) capacity = std::max(capacity, 2 * this->capacity());
+    return reserve(capacity, elementSize, alignment);
+}
+
+void* dynamic_array_data::reserve(size_t capacity, size_t elementSize, size_t alignment) {
+    const size_t byteCount = GetByteCount(capacity, elementSize);
+    void* buffer = nullptr;
+    if (!owns_data()) {
+        if (capacity != 0)
+            buffer = malloc_internal(byteCount, alignment, label, kAllocateOptionNone, __FILE__, __LINE__);
+        if (const size_t kept = std::min(size, capacity); buffer != nullptr && kept != 0)
+            memcpy(buffer, data, kept * elementSize);
+    } else {
+        if (static_cast<SInt64>(capacity) < 0)
+            ReportFailedCheck(Format("Dynamic array capacity overflow: 0x%llx", UInt64{capacity}).c_str());
+        buffer = realloc_internal(data, byteCount, alignment, label, kAllocateOptionNone, __FILE__, __LINE__);
+        // Refused, the old buffer is still there, but nobody would find it again.
+        if (buffer == nullptr && byteCount != 0) free_buffer();
+    }
+    data = buffer;
+    // Without memory there is no capacity, so that a later and smaller request is tried afresh.
+    capacityWord = buffer == nullptr && byteCount != 0 ? kNotOwned : capacity * 2;
+    return buffer;
+}
+
+void* dynamic_array_data::grow(size_t elementSize, size_t alignment) {
+    return reserve(std::max<size_t>(2 * capacity(), 1), elementSize, alignment);
+}
+
+void dynamic_array_data::free_buffer() { free_alloc_internal(data, label, __FILE__, __LINE__); }
+
+void dynamic_array_data::reset() {
+    data = nullptr;
+    size = 0;
+    capacityWord = kNotOwned;
+}
+
+} // namespace dynamic_array_detail
