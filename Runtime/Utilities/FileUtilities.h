@@ -1,0 +1,47 @@
+// One-call questions and changes to folders and files. Paths are made absolute through the registry and reach the
+// handler that claims them. Any thread, once the registry exists.
+#pragma once
+
+#include "Runtime/Allocator/Allocator.h"
+#include "Runtime/Core/Containers/String.h"
+#include "Runtime/VirtualFileSystem/VirtualFileSystemTypes.h"
+
+#include <functional>
+#include <set>
+
+// How GetFolderContentsAtPath writes the paths that it collects; other values collect nothing.
+enum FolderContentsPathMode : SInt32 {
+    kFolderContentsRelativeToCurrentDirectory = 0, // the file system's, not the process's
+    kFolderContentsRelativeToBase = 1,
+    kFolderContentsAbsolute = 2,
+};
+
+using FolderContents = std::set<core::basic_string<char>, std::less<core::basic_string<char>>,
+                                stl_allocator<core::basic_string<char>, kMemLabelGeneral, 16>>;
+
+core::basic_string<char> PathToAbsolutePath(core::basic_string_ref<char> path);
+
+// An empty path stands for the current directory as a folder, and for nothing as a file or path.
+bool IsDirectoryCreated(core::basic_string_ref<char> path);
+bool IsFileCreated(core::basic_string_ref<char> path);
+bool IsPathCreated(core::basic_string_ref<char> path);
+
+// True when the folder is there afterwards. A failed creation prints one message; a file in the way does not.
+bool CreateDirectory(core::basic_string_ref<char> path);
+
+// The same for a folder and every folder above it that is missing, outermost first. Recurses once a component: the path
+// must be of a length that an entry can hold.
+bool CreateDirectoryRecursive(core::basic_string_ref<char> path);
+
+// A folder with all that it holds.
+bool DeleteFileOrDirectory(core::basic_string_ref<char> path);
+
+// Whether somebody holds a lock on the file, or on one in the folder. The path is taken as given.
+bool IsFileOrDirectoryInUse(core::basic_string_ref<char> path);
+
+// Adds what the folder holds to out. Always true: what can't be listed is just missing. base matters to
+// kFolderContentsRelativeToBase alone.
+bool GetFolderContentsAtPath(core::basic_string_ref<char> path, FileEnumerationFlag flags, FolderContents& out,
+                             FolderContentsPathMode mode, const core::basic_string<char>& base, bool recursive);
+bool GetFolderContentsAtPath(core::basic_string_ref<char> path, FolderContents& out, FolderContentsPathMode mode,
+                             const core::basic_string<char>& base, bool recursive);

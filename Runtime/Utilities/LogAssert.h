@@ -1,0 +1,106 @@
+// The log sink: console output, reported errors and failed checks. Nothing here stops the program (but a record that
+// carries the fatal bit does), and nothing here fails: without a standard output the texts are dropped.
+//
+//   printf_console("  data size: %llu bytes\n", size);      // text as it is
+//   ReportError(Format("Unable to open ...: %s", path).c_str());
+//   if (!Check(type < kCompressionCount, "Assertion failed on expression: 't < kCompressionCount'")) return nullptr;
+//
+// Every function may be called from any thread. The hooks at the end are installed before other threads start.
+// Only plain C types are used, so that the containers, which the sink itself is built on, can report through it.
+#pragma once
+
+#include "Runtime/Core/SourceLocation.h"
+#include "Runtime/Core/Types.h"
+
+#include <cstdarg>
+
+enum LogType : SInt32 {
+    kLogTypeError = 0,
+    kLogTypeAssert = 1,
+    kLogTypeWarning = 2,
+    kLogTypeLog = 3,
+    kLogTypeException = 4,
+    kLogTypeConsole = 5, // printf_console
+};
+constexpr int kLogTypeCount = 6;
+
+// Bits of DebugStringToFileData::mode. The sink tests groups of them; these are the ones with a meaning of their own.
+enum LogMode : UInt32 {
+    kLogModeError = 0x1,
+    kLogModeAssert = 0x2,
+    kLogModeFatal = 0x10,                  // the process is stopped once the record is out
+    kLogModeForceStackTrace = 0x300,       // the trace goes to the console even where the table says none
+    kLogModeNoStackTrace = 0x40000,        // both traces are emptied
+    kLogModeKeepStackTrace = 0x400000,     // the caller's traces are kept
+    kLogModeShowSourcePosition = 0x800000, // file and line follow the trace
+};
+
+// One report. Texts are the caller's and must outlive the call.
+struct DebugStringToFileData {
+    const char* message = "";
+    const char* auxiliaryText = "";   // carried along
+    const char* shortStackTrace = ""; // added to assertion texts for the clean log handlers
+    const char* stackTrace = "";      // printed after the message
+    const char* file = "";
+    SInt32 line = 0; // 0: none
+    SInt32 column = -1;
+    UInt32 mode = 0;
+    SInt32 identifier = 0;
+
+    // Carried for the embedding application; the sink does not read them.
+    SInt32 reserved0 = 0;
+    UInt64 reserved1 = 0;
+    bool reserved2 = true;
+    UInt64 reserved3 = 0;
+    SInt32 reserved4 = 0;
+    const char* reservedText0 = "";
+    const char* reservedText1 = "";
+};
+
+// Prints to standard output as printf does, then flushes.
+[[gnu::format(printf, 1, 2)]] void printf_console(const char* format, ...);
+
+void DebugStringToFile(const DebugStringToFileData& data);
+
+// The sink's second stage: the stack traces of data are final.
+void DebugStringToFilePostprocessedStacktrace(const DebugStringToFileData& data);
+
+// Reports a failed check with its complete text; always 1. The caller goes on, so this is never the guard itself.
+int AssertImplementation(int identifier, const char* file, int line, int column, const char* message);
+
+// Reports message as a failed check at the caller's position.
+inline void ReportFailedCheck(const char* message, SourceLocation where = SourceLocation::current()) {
+    AssertImplementation(0, where.file, where.line, -1, message);
+}
+
+// The answer is condition; when it is false, message is reported as a failed check at the caller's position.
+inline bool Check(bool condition, const char* message, SourceLocation where = SourceLocation::current()) {
+    if (!condition) [[unlikely]]
+        ReportFailedCheck(message, where);
+    return condition;
+}
+
+// Reports message as an error at the caller's position.
+void ReportError(const char* message, SourceLocation where = SourceLocation::current());
+
+// Tells the clean log handlers, in list order, under g_LogHandlerListMutex.
+[[gnu::format(printf, 2, 3)]] void CleanLogHandler(LogType type, const char* format, ...);
+
+// Which stack trace accompanies a type of record.
+enum StackTraceLogType : SInt32 {
+    kStackTraceNone = 0,
+    kStackTracePreprocessed = 1, // what gPreprocessor makes, or none
+    kStackTraceNative = 2,       // not to be had on this platform, and said so
+};
+extern StackTraceLogType gStackTraceLogType[kLogTypeCount];
+
+// Hooks for an embedding application; null until it installs one. Those that need the lock or strings are in
+// LogHooks.h.
+
+// Asked before every console print; false suppresses the print.
+using CurrentLogEntryHandler = bool (*)(LogType type, const char* format, va_list arguments);
+extern CurrentLogEntryHandler gCurrentLogEntryHandler;
+
+using LogForwardFunction = void (*)(const DebugStringToFileData& data);
+extern LogForwardFunction gLogToConsoleFunc; // called after the console output
+extern LogForwardFunction gUtpLogFunc;       // called after that

@@ -1,0 +1,59 @@
+#include "Runtime/Utilities/RegisterRuntimeInitializeAndCleanup.h"
+
+#include "Runtime/Core/Containers/DynamicArray.h"
+
+#include <algorithm>
+#include <functional>
+
+using Registration = RegisterRuntimeInitializeAndCleanup;
+
+Registration::RegisterRuntimeInitializeAndCleanup(CallbackFunction initCallback, CallbackFunction cleanupCallback,
+                                                  SInt32 sortOrder, void* callbackData)
+    : order(sortOrder),
+      userData(callbackData),
+      init(initCallback),
+      cleanup(cleanupCallback),
+      initialized(false),
+      older(s_LastRegistered),
+      newer(nullptr) {
+    if (older != nullptr) older->newer = this;
+    s_LastRegistered = this;
+}
+
+Registration::~RegisterRuntimeInitializeAndCleanup() {
+    if (older != nullptr) older->newer = newer;
+    if (newer != nullptr)
+        newer->older = older;
+    else
+        s_LastRegistered = older;
+}
+
+bool Registration::Sort(const Registration* a, const Registration* b) {
+    if (a->order != b->order) return a->order < b->order;
+    return std::less<const Registration*>()(a, b); // < itself is not defined between unrelated objects
+}
+
+void Registration::ExecuteInitializations() {
+    dynamic_array<Registration*> registrations(kMemLabelGeneral);
+    for (Registration* each = s_LastRegistered; each != nullptr; each = each->older)
+        registrations.push_back(each);
+    std::sort(registrations.begin(), registrations.end(), Sort);
+
+    for (Registration* each : registrations) {
+        if (each->init != nullptr && !each->initialized) each->init(each->userData);
+        each->initialized = true;
+    }
+}
+
+void Registration::ExecuteCleanup() {
+    dynamic_array<Registration*> registrations(kMemLabelTemporary);
+    for (Registration* each = s_LastRegistered; each != nullptr; each = each->older)
+        registrations.push_back(each);
+    std::sort(registrations.begin(), registrations.end(), Sort);
+
+    for (size_t index = registrations.size(); index-- > 0;) {
+        Registration* each = registrations[index];
+        if (each->cleanup != nullptr && each->initialized) each->cleanup(each->userData);
+        each->initialized = false;
+    }
+}

@@ -1,0 +1,44 @@
+// The registry of what runs first and last in main. A registration is a static object; it is linked in from its
+// construction to its destruction.
+//
+//   static RegisterRuntimeInitializeAndCleanup gFontsInitAndCleanup(InitFonts, CleanupFonts, 10);
+//   ...
+//   RegisterRuntimeInitializeAndCleanup::ExecuteInitializations();   // in main, before its work
+//   RegisterRuntimeInitializeAndCleanup::ExecuteCleanup();           // and after it
+//
+// Main thread only: there is no lock.
+#pragma once
+
+#include "Runtime/Core/NonCopyable.h"
+#include "Runtime/Core/Types.h"
+
+class RegisterRuntimeInitializeAndCleanup : private NonCopyable {
+public:
+    using CallbackFunction = void (*)(void* userData);
+
+    // Lower orders start earlier and are cleaned up later. Either callback may be null. callbackData is passed to
+    // both.
+    RegisterRuntimeInitializeAndCleanup(CallbackFunction initCallback, CallbackFunction cleanupCallback,
+                                        SInt32 sortOrder = 0, void* callbackData = nullptr);
+    ~RegisterRuntimeInitializeAndCleanup();
+
+    // Whether a runs before b at start-up: by order, then by the objects' addresses.
+    static bool Sort(const RegisterRuntimeInitializeAndCleanup* a, const RegisterRuntimeInitializeAndCleanup* b);
+
+    // Runs the init callbacks of those that are not initialized. A second call has no effect.
+    static void ExecuteInitializations();
+
+    // Runs the cleanup callbacks of those that are initialized, in the reverse order. A second call has no effect.
+    static void ExecuteCleanup();
+
+private:
+    static RegisterRuntimeInitializeAndCleanup* s_LastRegistered; // the newest; null when there is none
+
+    const SInt32 order;
+    void* const userData;
+    const CallbackFunction init;
+    const CallbackFunction cleanup;
+    bool initialized; // the start-up callback has run, or would have if there were one
+    RegisterRuntimeInitializeAndCleanup* older;
+    RegisterRuntimeInitializeAndCleanup* newer;
+};
