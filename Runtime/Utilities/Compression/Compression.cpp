@@ -1,0 +1,16 @@
+#include "Runtime/Utilities/Compression/Compression.h"
+
+#include "Runtime/Allocator/Allocator.h"
+#include "Runtime/Utilities/Compression/Lz4Decompressor.h"
+#include "Runtime/Utilities/Compression/LzmaDecompressor.h"
+#include "Runtime/Utilities/Format.h"
+#include "Runtime/Utilities/LogAssert.h"
+
+IDecompressor* CreateDecompressor(CompressionType type, MemLabelId label) {
+    if (type == kCompressionNone) return nullptr;
+    if (type == kCompressionLzma) return New<LzmaDecompressor>(label);
+    if (type == kCompressionLz4 || type == kCompressionLz4HC) return New<Lz4Decompressor>(label);
+    ReportError(
+        Format("Decompressing this format (%d) is not supported on this platform.", static_cast<int>(type)).c_str());
+    return nullptr;
+}

@@ -1,0 +1,99 @@
+#include "Runtime/Utilities/Compression/LzmaDecompressor.h"
+
+#include "Runtime/Allocator/Allocator.h"
+
+#include <lzma/LzmaDec.h>
+
+namespace {
+
+constexpr size_t kDecoderMemoryAlignment = 16;
+
+void* LzmaDecAlloc(void*, size_t size) {
+    return malloc_internal(size, kDecoderMemoryAlignment, kMemLabelFileSystem, kAllocateOptionNone, __FILE__, __LINE__);
+}
+
+void LzmaDecFree(void*, void* address) { free_alloc_internal(address, kMemLabelFileSystem, __FILE__, __LINE__); }
+
+// The decoder takes it by a pointer that is not const, but only calls through it.
+constinit ISzAlloc s_LzmaDecAlloc = {LzmaDecAlloc, LzmaDecFree};
+
+// Stands in for input that there is none of: the decoder copies 0 bytes from it, which null does not allow.
+constexpr Byte kNoInput = 0;
+
+struct LzmaStreamState {
+    CLzmaDec decoder;
+    bool started; // the properties were consumed, and the decoder has its tables and dictionary
+    bool failed;  // the decoder reported an error: called again it would read and write wild memory
+};
+
+} // namespace
+
+CompressionType LzmaDecompressor::GetType() const { return kCompressionLzma; }
+
+bool LzmaDecompressor::DecompressMemory(const void* src, size_t* srcSize, void* dst, size_t* dstSize) const {
+    if (*srcSize < LZMA_PROPS_SIZE) return false;
+    const auto* const properties = static_cast<const Byte*>(src);
+    SizeT consumed = *srcSize - LZMA_PROPS_SIZE;
+    SizeT produced = *dstSize;
+    ELzmaStatus status;
+    if (LzmaDecode(static_cast<Byte*>(dst), &produced, properties + LZMA_PROPS_SIZE, &consumed, properties,
+                   LZMA_PROPS_SIZE, LZMA_FINISH_ANY, &status, &s_LzmaDecAlloc) != SZ_OK)
+        return false;
+    *srcSize = consumed + LZMA_PROPS_SIZE;
+    *dstSize = produced;
+    return true;
+}
+
+bool LzmaDecompressor::DecompressStreamInit(void** state) const {
+    if (*state == nullptr) {
+        *state = New<LzmaStreamState>(kMemLabelFileSystem);
+        if (*state == nullptr) return false;
+    }
+    auto& stream = *static_cast<LzmaStreamState*>(*state);
+    if (stream.started) LzmaDec_Free(&stream.decoder, &s_LzmaDecAlloc);
+    LzmaDec_Construct(&stream.decoder);
+    stream.started = false;
+    stream.failed = false;
+    return true;
+}
+
+void LzmaDecompressor::DecompressStreamDeinit(void* state) const {
+    auto* const stream = static_cast<LzmaStreamState*>(state);
+    if (stream == nullptr) return;
+    if (stream->started) LzmaDec_Free(&stream->decoder, &s_LzmaDecAlloc);
+    Delete(stream, kMemLabelFileSystem);
+}
+
+bool LzmaDecompressor::DecompressStream(void* state, const void* src, size_t* srcSize, void* dst, size_t* dstSize,
+                                        bool isLastInput) const {
+    auto* const stream = static_cast<LzmaStreamState*>(state);
+    if (stream == nullptr || stream->failed) return false;
+    const Byte* const input = src != nullptr ? static_cast<const Byte*>(src) : &kNoInput;
+    size_t consumed = 0;
+    if (!stream->started) {
+        if (*srcSize < LZMA_PROPS_SIZE) return false;
+        if (LzmaDec_Allocate(&stream->decoder, input, LZMA_PROPS_SIZE, &s_LzmaDecAlloc) != SZ_OK) return false;
+        LzmaDec_Init(&stream->decoder);
+        stream->started = true;
+        consumed = LZMA_PROPS_SIZE;
+    }
+
+    // Every round that does not stop makes at least one byte.
+    size_t produced = 0;
+    while (produced < *dstSize) {
+        SizeT taken = *srcSize - consumed;
+        SizeT made = *dstSize - produced;
+        ELzmaStatus status;
+        if (LzmaDec_DecodeToBuf(&stream->decoder, static_cast<Byte*>(dst) + produced, &made, input + consumed, &taken,
+                                isLastInput ? LZMA_FINISH_END : LZMA_FINISH_ANY, &status) != SZ_OK) {
+            stream->failed = true;
+            return false;
+        }
+        consumed += taken;
+        produced += made;
+        if (status == LZMA_STATUS_FINISHED_WITH_MARK || status == LZMA_STATUS_NEEDS_MORE_INPUT) break;
+    }
+    *srcSize = consumed;
+    *dstSize = produced;
+    return true;
+}

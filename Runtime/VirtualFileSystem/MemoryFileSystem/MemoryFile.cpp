@@ -1,0 +1,111 @@
+#include "Runtime/VirtualFileSystem/MemoryFileSystem/MemoryFile.h"
+
+#include "Runtime/Utilities/LogAssert.h"
+#include "Runtime/VirtualFileSystem/MemoryFileSystem/MultiBlocksMemoryFileData.h"
+#include "Runtime/VirtualFileSystem/MemoryFileSystem/SingleBlockMemoryFileData.h"
+
+namespace {
+
+constexpr char kSourceName[] = "./Runtime/VirtualFileSystem/MemoryFileSystem/MemoryFile";
+
+constexpr UInt64 kUnreachable = ~UInt64{0};
+
+// The position that lies distance after base, or before it; kUnreachable where that is no position.
+UInt64 GetPositionAfter(UInt64 base, SInt64 distance) {
+    const UInt64 target = base + static_cast<UInt64>(distance);
+    return (distance < 0) == (target < base) ? target : kUnreachable;
+}
+UInt64 GetPositionBefore(UInt64 base, SInt64 distance) {
+    const UInt64 target = base - static_cast<UInt64>(distance);
+    return (distance > 0) == (target < base) ? target : kUnreachable;
+}
+
+} // namespace
+
+MemoryFile::MemoryFile(MemLabelId memLabel, MemoryFileData* contents, FilePermission filePermission)
+    : data(contents), permission(filePermission), label(memLabel) {
+    if (data != nullptr)
+        data->AddRef();
+    else
+        data = New<MultiBlocksMemoryFileData>(label, label, MultiBlocksMemoryFileData::kDefaultBlockSize);
+}
+
+MemoryFile::~MemoryFile() {
+    if (data != nullptr) data->Release();
+}
+
+FileSystemEntry MemoryFile::CreateFileSystemEntry(MemLabelId memLabel, FilePermission filePermission, void* data,
+                                                  size_t size, bool takeOwnership) {
+    FileEntryData entry;
+    MemoryFileData* const contents = New<SingleBlockMemoryFileData>(memLabel, memLabel, data, size, takeOwnership);
+    if (contents != nullptr) {
+        auto* const file = New<MemoryFile>(memLabel, memLabel, contents, filePermission);
+        contents->Release();
+        if (file != nullptr) entry.accessorHandler = New<IFileAdapter>(memLabel, file, memLabel, true);
+        if (entry.accessorHandler == nullptr) Delete(file, memLabel);
+    }
+    return FileSystemEntry(entry);
+}
+
+bool MemoryFile::IsOpen() const { return data != nullptr; }
+
+bool MemoryFile::Close() {
+    if (data != nullptr) data->Release();
+    data = nullptr;
+    return true;
+}
+
+bool MemoryFile::Read(VFS::FileSize from, UInt64 size, void* out, UInt64* actual, FileReadFlags) {
+    if (!IsReadable()) AssertImplementation(0, kSourceName, 37, -1, "Assertion failed on expression: 'IsReadable()'");
+    if (data == nullptr || !IsReadable()) return false;
+    const UInt64 count = data->Read(from, size, out);
+    if (actual != nullptr) *actual = count;
+    if (count == 0) return from <= data->Size();
+    position = from.Cast<UInt64>() + count;
+    return true;
+}
+
+bool MemoryFile::Read(UInt64 size, void* out, UInt64* actual, FileReadFlags flags) {
+    return Read(VFS::FileSize(position), size, out, actual, flags);
+}
+
+bool MemoryFile::Write(VFS::FileSize from, UInt64 size, const void* in, UInt64* written) {
+    if (!IsWritable()) AssertImplementation(0, kSourceName, 64, -1, "Assertion failed on expression: 'IsWritable()'");
+    if (data == nullptr || !IsWritable()) return false;
+    const UInt64 count = data->Write(from, size, in);
+    position = from.Cast<UInt64>() + count;
+    if (written != nullptr) *written = count;
+    return true;
+}
+
+bool MemoryFile::Write(UInt64 size, const void* in, UInt64* written) {
+    return Write(VFS::FileSize(position), size, in, written);
+}
+
+bool MemoryFile::Seek(VFS::FileOffset offset, FileOrigin origin) {
+    if (data == nullptr) return false;
+    const UInt64 end = data->Size().Cast<UInt64>();
+    UInt64 target = kUnreachable;
+    if (origin == kFileOriginBegin)
+        target = offset.Cast<UInt64>();
+    else if (origin == kFileOriginCurrent)
+        target = GetPositionAfter(position, offset.Cast<SInt64>());
+    else if (origin == kFileOriginEnd)
+        target = GetPositionBefore(end, offset.Cast<SInt64>());
+    if (target > end) return false;
+    position = target;
+    return true;
+}
+
+VFS::FileSize MemoryFile::Position() const { return position; }
+
+bool MemoryFile::SetLength(VFS::FileSize length) {
+    if (!IsWritable()) AssertImplementation(0, kSourceName, 109, -1, "Assertion failed on expression: 'IsWritable()'");
+    if (data == nullptr || !IsWritable()) return false;
+    data->SetLength(length);
+    return true;
+}
+
+VFS::FileSize MemoryFile::Size() const { return data != nullptr ? data->Size() : VFS::FileSize(); }
+
+bool MemoryFile::Flush() { return true; }
