@@ -1,0 +1,174 @@
+// The POSIX back end's content operations, and what they need to know of a path.
+#include "Runtime/VirtualFileSystem/LocalFileSystemPosix.h"
+
+#include "PlatformDependent/Linux/FileDescriptor.h"
+#include "Runtime/Allocator/Allocator.h"
+#include "Runtime/VirtualFileSystem/LocalFileSystemPosixCalls.h"
+
+#include <sys/stat.h>
+#include <unistd.h>
+
+constexpr int kNoDescriptor = -1;
+constexpr mode_t kNewFileMode = 0666; // before the umask
+constexpr mode_t kNewFolderMode = 0755;
+
+FileSystemError FileSystemErrorFromErrno(int error) {
+    switch (error) {
+    case 0: return kFileSystemErrorNone;
+    case ENOENT: return kFileSystemErrorNotFound;
+    case EEXIST: return kFileSystemErrorAlreadyExists;
+    case EPERM:
+    case EACCES: return kFileSystemErrorAccessDenied;
+    case EXDEV: return kFileSystemErrorCrossDevice;
+    default: return kFileSystemErrorUnknown;
+    }
+}
+
+int GetDescriptor(const FileEntryData& entry) {
+    return entry.handlerState != nullptr ? *static_cast<int*>(entry.handlerState) : kNoDescriptor;
+}
+
+static int GetOpenFlags(FilePermission permission) {
+    switch (permission) {
+    case kFilePermissionWrite: return O_WRONLY | O_CREAT | O_TRUNC;
+    case kFilePermissionReadWrite: return O_RDWR;
+    case kFilePermissionAppend: return O_WRONLY | O_CREAT | O_APPEND;
+    default: return O_RDONLY;
+    }
+}
+
+bool LocalFileSystemPosix::Open(FileEntryData& entry, FilePermission permission, FileAutoBehavior) {
+    int descriptor = PlatformOpen(entry.path, GetOpenFlags(permission), kNewFileMode);
+    if (descriptor == kNoDescriptor && permission == kFilePermissionReadWrite)
+        descriptor = PlatformOpen(entry.path, O_RDWR | O_CREAT | O_TRUNC, kNewFileMode);
+    const int error = descriptor == kNoDescriptor ? errno : 0;
+    // What is appended goes to the end wherever the position is.
+    if (descriptor != kNoDescriptor && permission == kFilePermissionAppend)
+        (void)RepeatOnInterrupt([&] { return lseek(descriptor, 0, SEEK_END); });
+
+    void* cell =
+        malloc_internal(sizeof(int), alignof(int), kMemLabelFileSystem, kAllocateOptionNone, __FILE__, __LINE__);
+    entry.handler = this;
+    entry.accessorHandler = this;
+    entry.handlerState = cell;
+    if (cell == nullptr) {
+        if (descriptor != kNoDescriptor) (void)PlatformClose(descriptor); // nothing was written to it
+        entry.lastError = kFileSystemErrorUnknown;
+        return false;
+    }
+    *static_cast<int*>(cell) = descriptor;
+    entry.lastError = FileSystemErrorFromErrno(error);
+    return descriptor != kNoDescriptor;
+}
+
+bool LocalFileSystemPosix::Read(FileEntryData& entry, VFS::FileSize position, UInt64 size, void* buffer, UInt64* actual,
+                                FileReadFlags flags) {
+    return Seek(entry, VFS::FileOffset(position), kFileOriginBegin) && Read(entry, size, buffer, actual, flags);
+}
+
+bool LocalFileSystemPosix::Read(FileEntryData& entry, UInt64 size, void* buffer, UInt64* actual, FileReadFlags) {
+    const int descriptor = GetDescriptor(entry);
+    if (descriptor == kNoDescriptor) return false;
+    const ssize_t count = RepeatOnInterrupt([&] { return read(descriptor, buffer, size); });
+    *actual = count > 0 ? static_cast<UInt64>(count) : 0;
+    if (count < 0) entry.lastError = FileSystemErrorFromErrno(errno);
+    return count > 0;
+}
+
+bool LocalFileSystemPosix::Write(FileEntryData& entry, VFS::FileSize position, UInt64 size, const void* buffer,
+                                 UInt64* written) {
+    return Seek(entry, VFS::FileOffset(position), kFileOriginBegin) && Write(entry, size, buffer, written);
+}
+
+bool LocalFileSystemPosix::Write(FileEntryData& entry, UInt64 size, const void* buffer, UInt64* written) {
+    constexpr UInt64 kMaxPieceSize = 0x7FFFFFFF; // one call takes no more
+    const int descriptor = GetDescriptor(entry);
+    if (descriptor == kNoDescriptor) return false;
+    const char* from = static_cast<const char*>(buffer);
+    UInt64 total = 0;
+    for (bool isLast = false; !isLast;) {
+        isLast = size - total <= kMaxPieceSize;
+        const size_t piece = static_cast<size_t>(isLast ? size - total : kMaxPieceSize);
+        const ssize_t count = RepeatOnInterrupt([&] { return write(descriptor, from + total, piece); });
+        if (count < 0) {
+            *written = 0;
+            entry.lastError = FileSystemErrorFromErrno(errno);
+            return false;
+        }
+        total += static_cast<UInt64>(count);
+    }
+    *written = total;
+    return true;
+}
+
+bool LocalFileSystemPosix::Close(FileEntryData& entry) {
+    if (entry.handlerState == nullptr) return true;
+    const int descriptor = GetDescriptor(entry);
+    free_alloc_internal(entry.handlerState, kMemLabelFileSystem, __FILE__, __LINE__);
+    entry.handlerState = nullptr;
+    if (descriptor == kNoDescriptor) return true;
+    const int result = PlatformClose(descriptor);
+    entry.lastError = FileSystemErrorFromErrno(result == 0 ? 0 : errno);
+    return entry.lastError == kFileSystemErrorNone;
+}
+
+static int GetSeekBase(FileOrigin origin) {
+    switch (origin) {
+    case kFileOriginBegin: return SEEK_SET;
+    case kFileOriginCurrent: return SEEK_CUR;
+    case kFileOriginEnd: return SEEK_END;
+    }
+    AssertImplementation(0, "Runtime/VirtualFileSystem/LocalFileSystemPosix", __LINE__, -1, "unknown file origin enum");
+    return SEEK_SET;
+}
+
+bool LocalFileSystemPosix::Seek(FileEntryData& entry, VFS::FileOffset offset, FileOrigin origin) {
+    const int descriptor = GetDescriptor(entry);
+    if (descriptor == kNoDescriptor) return false;
+    const int base = GetSeekBase(origin);
+    return RepeatOnInterrupt([&] { return lseek(descriptor, offset.Cast<SInt64>(), base); }) >= 0;
+}
+
+VFS::FileSize LocalFileSystemPosix::Position(const FileEntryData& entry) const {
+    const int descriptor = GetDescriptor(entry);
+    if (descriptor == kNoDescriptor) return 0;
+    return static_cast<UInt64>(RepeatOnInterrupt([&] { return lseek(descriptor, 0, SEEK_CUR); }));
+}
+
+bool LocalFileSystemPosix::SetLength(FileEntryData& entry, VFS::FileSize length) {
+    const SInt64 bytes = VFS::FileOffset(length).Cast<SInt64>();
+    return RepeatOnInterrupt([&] { return truncate(entry.path, bytes); }) == 0;
+}
+
+VFS::FileSize LocalFileSystemPosix::Size(const FileEntryData& entry) const {
+    struct stat status;
+    return GetStatus(entry.path, &status) ? static_cast<UInt64>(status.st_size) : 0;
+}
+
+bool LocalFileSystemPosix::Exists(const FileEntryData& entry) const {
+    return RepeatOnInterrupt([&] { return access(entry.path, F_OK); }) == 0;
+}
+
+bool LocalFileSystemPosix::IsDir(const FileEntryData& entry) const {
+    struct stat status;
+    return GetStatus(entry.path, &status) && S_ISDIR(status.st_mode);
+}
+
+bool LocalFileSystemPosix::IsFile(const FileEntryData& entry) const {
+    struct stat status;
+    return GetStatus(entry.path, &status) && !S_ISDIR(status.st_mode);
+}
+
+bool LocalFileSystemPosix::CreateAsDir(FileEntryData& entry) {
+    const int result = RepeatOnInterrupt([&] { return mkdir(entry.path, kNewFolderMode); });
+    entry.lastError = FileSystemErrorFromErrno(result == 0 ? 0 : errno);
+    return result == 0;
+}
+
+bool LocalFileSystemPosix::CreateAsFile(FileEntryData& entry) {
+    if (Exists(entry)) return false;
+    const int descriptor = PlatformOpen(entry.path, GetOpenFlags(kFilePermissionWrite), kNewFileMode);
+    if (descriptor == kNoDescriptor) return false;
+    (void)PlatformClose(descriptor); // nothing was written
+    return true;
+}
