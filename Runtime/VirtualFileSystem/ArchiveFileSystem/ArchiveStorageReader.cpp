@@ -1,0 +1,295 @@
+// The reader's set-up and tear-down: opening the file, loading what describes the archive, learning the directory of a
+// ZarvoWeb archive, and the use count.
+#include "Runtime/VirtualFileSystem/ArchiveFileSystem/ArchiveStorageReader.h"
+
+#include "Runtime/Utilities/Format.h"
+#include "Runtime/Utilities/LogAssert.h"
+#include "Runtime/VirtualFileSystem/MemoryFileSystem/MemoryFile.h"
+#include "Runtime/VirtualFileSystem/MemoryFileSystem/MultiBlocksMemoryFileData.h"
+#include "Runtime/VirtualFileSystem/MemoryFileSystem/SingleBlockMemoryFileData.h"
+
+using namespace ArchiveStorageHeader;
+
+static_assert(kHeaderShortRead == 1 && kHeaderNotAnArchive == -1, "the reader passes the parsers' codes on");
+
+constexpr UInt64 kMaxFilePosition = ~UInt64{0} >> 1;
+
+// The legacy size field that follows the LZMA properties.
+constexpr UInt32 kLzmaSizeFieldSize = 8;
+constexpr UInt32 kMinSizeWithLzmaSizeField = 9;
+
+ArchiveStorageReader::ArchiveStorageReader(MemLabelId memLabel)
+    : ThreadSharedObject(memLabel),
+      m_Header(memLabel),
+      m_BlocksInfo(memLabel),
+      m_DirectoryInfo(memLabel),
+      m_UncompressedBlocksOffsets(memLabel),
+      m_CompressedBlocksOffsets(memLabel),
+      m_CachedBlocks(memLabel),
+      m_Label(memLabel) {}
+
+ArchiveStorageReader::~ArchiveStorageReader() {
+    Delete(m_DirectoryFile, m_Label);
+    for (CachedBlock* block : m_CachedBlocks) {
+        DeinitCachedBlock(block);
+        Delete(block, m_Label);
+    }
+    for (std::atomic<IDecompressor*>& decompressor : m_Decompressors)
+        Delete(decompressor.load(), m_Label);
+    (void)m_File.Close(); // opened for reading: nothing is lost
+}
+
+int ArchiveStorageReader::Initialize(const core::string& path, VFS::FileSize offset) {
+    if (path.size() > kMaxPathLength) {
+        // An entry would cut the path and name another file.
+        ReportError(Format("Unable to open archive file: %s", path.c_str()).c_str());
+        return kHeaderNotAnArchive;
+    }
+    FileSystemEntry entry(path);
+    return Initialize(entry, offset, true, true);
+}
+
+int ArchiveStorageReader::Initialize(FileSystemEntry& entry, VFS::FileSize offset, bool canReleaseStorage,
+                                     bool reportErrors) {
+    m_FileEntry = entry;
+    m_LastModified = entry.LastModified();
+    if (entry.lastError == kFileSystemErrorNotSupported) m_CheckModificationTime = false;
+    m_ReleaseStorageWhenUnused = canReleaseStorage;
+    if (!MakeStorageUsed(reportErrors)) return kHeaderNotAnArchive;
+
+    const int result = ReadHeader(offset.Cast<UInt64>());
+    if (result != kHeaderOk) {
+        if (result == kHeaderNotAnArchive && reportErrors)
+            ReportError(Format("Unable to read header from archive file: %s", entry.Path()).c_str());
+        MakeStorageUnused();
+        return result;
+    }
+    const FileSystemError timeError = m_FileEntry.lastError;
+    if (timeError != kFileSystemErrorNone && timeError != kFileSystemErrorNotSupported)
+        ReportFailedCheck(Format("Unexpected FileSystemError code %i after call to FileSystemEntry::LastModified() \n",
+                                 static_cast<int>(timeError))
+                              .c_str());
+    BuildOffsetTables();
+    return kHeaderOk;
+}
+
+void ArchiveStorageReader::BuildOffsetTables() {
+    const size_t count = m_BlocksInfo.storageBlocks.size();
+    m_UncompressedBlocksOffsets.resize_uninitialized(count + 1, kResizeExact);
+    m_CompressedBlocksOffsets.resize_uninitialized(count + 1, kResizeExact);
+    m_UncompressedBlocksOffsets[0] = 0;
+    m_CompressedBlocksOffsets[0] = 0;
+    for (size_t index = 0; index < count; ++index) {
+        const StorageBlock& block = m_BlocksInfo.storageBlocks[index];
+        m_UncompressedBlocksOffsets[index + 1] = m_UncompressedBlocksOffsets[index] + block.uncompressedSize;
+        m_CompressedBlocksOffsets[index + 1] = m_CompressedBlocksOffsets[index] + block.compressedSize;
+    }
+}
+
+int ArchiveStorageReader::ReadHeader(UInt64 offset) {
+    // Where this seek fails the signature can't be read either.
+    (void)m_File.Seek(VFS::FileOffset(VFS::FileSize(offset)), kFileOriginBegin);
+    if (ReadHeaderSignature(m_File, m_Header) != kHeaderOk) return kHeaderNotAnArchive;
+
+    int result;
+    if (m_Header.signature == kSignatureArchive || m_Header.signature == kSignatureRaw) {
+        result = ReadAll(m_File, m_Header, m_BlocksInfo, m_DirectoryInfo);
+        m_DirectoryReady = result == kHeaderOk;
+    } else if (m_Header.signature == kSignatureWeb) {
+        result = ReadHeaderAndBlocksInfo_ZarvoWebAndZarvoRaw(m_File, m_Header, m_BlocksInfo);
+        m_DirectoryReady = false;
+    } else {
+        result = ReadBlockBasedHeader(offset);
+    }
+    if (result != kHeaderOk) return result;
+
+    const UInt64 dataOffset = GetDataOffset(m_Header);
+    if (offset > kMaxFilePosition - dataOffset) return kHeaderShortRead;
+    m_DataOffset = dataOffset + offset;
+    if (!m_File.Seek(VFS::FileOffset(VFS::FileSize(m_DataOffset)), kFileOriginBegin)) return kHeaderShortRead;
+
+    if (m_Header.signature == kSignatureWeb && !m_BlocksInfo.storageBlocks.empty()) {
+        UInt32& compressedSize = m_BlocksInfo.storageBlocks[0].compressedSize;
+        if (compressedSize >= kMinSizeWithLzmaSizeField) {
+            m_HideLzmaSizeField = true;
+            compressedSize -= kLzmaSizeFieldSize;
+        }
+    }
+    return kHeaderOk;
+}
+
+int ArchiveStorageReader::ReadBlockBasedHeader(UInt64 offset) {
+    if (const HeaderResult result = ArchiveStorageHeader::ReadHeader(m_File, m_Header); result != kHeaderOk)
+        return result;
+
+    const UInt64 sectionOffset = GetBlocksInfoOffset(m_Header);
+    if (sectionOffset > kMaxFilePosition || offset > kMaxFilePosition - sectionOffset) {
+        VFS::ReportValueTooLarge();
+        return kHeaderShortRead;
+    }
+    if (!m_File.Seek(VFS::FileOffset(VFS::FileSize(sectionOffset + offset)), kFileOriginBegin)) return kHeaderShortRead;
+
+    const auto type = static_cast<CompressionType>(m_Header.flags & kArchiveCompressionTypeMask);
+    if (type != kCompressionNone) return ReadCompressedBlocksInfo(type);
+    Check(m_Header.compressedBlocksInfoSize == m_Header.uncompressedBlocksInfoSize,
+          "Archive file has invalid uncompressed header size!");
+    return ReadBlocksInfoSection(m_File);
+}
+
+// Reads the block list and, where the header says so, the directory behind it.
+int ArchiveStorageReader::ReadBlocksInfoSection(FileAccessor& file) {
+    HeaderResult result = ReadBlocksInfo(file, m_Header, m_BlocksInfo);
+    if (result == kHeaderOk && (m_Header.flags & kArchiveDirectoryInBlocksInfo) != 0)
+        result = ReadDirectoryInfo(file, m_Header, m_DirectoryInfo);
+    m_DirectoryReady = result == kHeaderOk;
+    return result;
+}
+
+namespace {
+
+// A buffer for the time of a call: on the stack when it is small. A size of 0 gives none.
+class ScratchBuffer : private NonCopyable {
+public:
+    explicit ScratchBuffer(size_t size) {
+        if (size == 0) return;
+        m_Data = size < sizeof(m_Stack)
+                     ? m_Stack
+                     : malloc_internal(size, 1, kMemLabelGeneral, kAllocateOptionNone, __FILE__, __LINE__);
+    }
+    ~ScratchBuffer() {
+        if (m_Data != m_Stack) free_alloc_internal(m_Data, kMemLabelGeneral, __FILE__, __LINE__);
+    }
+
+    void* Data() { return m_Data; }
+
+private:
+    void* m_Data = nullptr;
+    char m_Stack[2000];
+};
+
+// LZ4 can't make more of a byte than this: a header that promises more is damaged.
+constexpr UInt64 kMaxLz4Expansion = 255;
+
+bool IsPossibleSize(CompressionType type, UInt64 compressedSize, UInt64 uncompressedSize) {
+    const bool isLz4 = type == kCompressionLz4 || type == kCompressionLz4HC;
+    return !isLz4 || uncompressedSize <= compressedSize * kMaxLz4Expansion;
+}
+
+} // namespace
+
+int ArchiveStorageReader::ReadCompressedBlocksInfo(CompressionType type) {
+    IDecompressor* decompressor = CreateDecompressor(type, kMemLabelGeneral);
+    if (decompressor == nullptr) return kHeaderNotAnArchive;
+    struct DeleteAtEnd {
+        ~DeleteAtEnd() { Delete(decompressor, kMemLabelGeneral); }
+        IDecompressor* decompressor;
+    } const deleteAtEnd{decompressor};
+
+    const size_t compressedSize = m_Header.compressedBlocksInfoSize;
+    const size_t uncompressedSize = m_Header.uncompressedBlocksInfoSize;
+    if (!IsPossibleSize(type, compressedSize, uncompressedSize)) return kHeaderShortRead;
+
+    ScratchBuffer compressed(compressedSize);
+    if (compressedSize != 0) {
+        UInt64 delivered = 0;
+        if (compressed.Data() == nullptr || !m_File.Read(compressedSize, compressed.Data(), &delivered) ||
+            delivered != compressedSize)
+            return kHeaderShortRead;
+    }
+    ScratchBuffer uncompressed(uncompressedSize);
+    if (uncompressed.Data() == nullptr && uncompressedSize != 0) return kHeaderShortRead;
+    size_t consumed = compressedSize;
+    size_t produced = uncompressedSize;
+    if (!decompressor->DecompressMemory(compressed.Data(), &consumed, uncompressed.Data(), &produced) ||
+        produced != uncompressedSize)
+        return kHeaderShortRead;
+
+    FileSystemEntry section = MemoryFile::CreateFileSystemEntry(kMemLabelGeneral, kFilePermissionRead,
+                                                                uncompressed.Data(), uncompressedSize, false);
+    FileAccessor sectionFile;
+    if (!sectionFile.Open(section, kFilePermissionRead)) return kHeaderShortRead;
+    return ReadBlocksInfoSection(sectionFile);
+}
+
+bool ArchiveStorageReader::MakeStorageUsed(bool reportErrors) {
+    Mutex::AutoLock lock(m_StorageLock);
+    if (m_StorageUseCount++ == 0 && !m_File.Open(m_FileEntry, kFilePermissionRead)) {
+        if (reportErrors) ReportError(Format("Unable to open archive file: %s", m_FileEntry.Path()).c_str());
+        return false;
+    }
+    if (!m_CheckModificationTime) return true;
+    const DateTime lastModified = m_FileEntry.LastModified();
+    if (m_FileEntry.lastError != kFileSystemErrorNone)
+        ReportFailedCheck(Format("Unexpected FileSystemError code %i after call to FileSystemEntry::LastModified() \n",
+                                 static_cast<int>(m_FileEntry.lastError))
+                              .c_str());
+    if (lastModified == m_LastModified) return true;
+    if (reportErrors)
+        ReportError(Format("Archive file was modified while it was opened, and can no longer be accessed: %s",
+                           m_FileEntry.Path())
+                        .c_str());
+    return false;
+}
+
+void ArchiveStorageReader::MakeStorageUnused() {
+    if (!m_ReleaseStorageWhenUnused) return;
+    {
+        Mutex::AutoLock lock(m_StorageLock);
+        Check(m_StorageUseCount >= 1, "ArchiveStorageReader has mismatched MakeStorageUsed/MakeStorageUnused calls");
+        if (m_StorageUseCount-- != 1) return;
+        (void)m_File.Close(); // opened for reading: nothing is lost
+    }
+    EmptyCache();
+}
+
+bool ArchiveStorageReader::CanDirectoryBecomeReady() const {
+    return m_DirectoryScanner.CanCompleteWithin(m_UncompressedBlocksOffsets.back());
+}
+
+void ArchiveStorageReader::TryToReadDirectoryFromBlockData(UInt64 from, const void* data, size_t size) {
+    const UInt64 collected = m_DirectoryFile != nullptr ? m_DirectoryFile->Size().Cast<UInt64>() : 0;
+    if (collected > from) return;
+    // Only bytes that follow one another from the stream's start are scanned: a gap would read as an empty directory.
+    const bool follows = from == collected && from == m_DirectoryScanner.Position();
+    const bool isComplete = follows && m_DirectoryScanner.Scan(static_cast<const UInt8*>(data), size);
+    // What can't end in a directory is not collected.
+    if (!CanDirectoryBecomeReady()) return;
+
+    if (isComplete && m_DirectoryFile == nullptr) {
+        // The whole directory lies in the caller's buffer, and is read in place.
+        auto* contents =
+            New<SingleBlockMemoryFileData>(kMemLabelGeneral, kMemLabelGeneral, const_cast<void*>(data), size, false);
+        if (contents == nullptr) return;
+        MemoryFile file(kMemLabelGeneral, contents, kFilePermissionRead);
+        contents->Release();
+        m_DirectoryReady = TryReadDirectoryInfoFromFile(&file);
+        if (m_DirectoryReady) return;
+    }
+
+    if (m_DirectoryFile == nullptr) {
+        auto* contents = New<MultiBlocksMemoryFileData>(m_Label, m_Label, MultiBlocksMemoryFileData::kDefaultBlockSize);
+        if (contents == nullptr) return;
+        m_DirectoryFile = New<MemoryFile>(m_Label, m_Label, contents, kFilePermissionReadWrite);
+        contents->Release();
+        if (m_DirectoryFile == nullptr) return;
+    }
+    UInt64 written = 0;
+    if (!m_DirectoryFile->Write(VFS::FileSize(from), size, data, &written) || written != size) return;
+    if (!isComplete) return;
+    m_DirectoryReady = TryReadDirectoryInfoFromFile(m_DirectoryFile);
+    if (!m_DirectoryReady) return;
+    Delete(m_DirectoryFile, m_Label);
+    m_DirectoryFile = nullptr;
+}
+
+bool ArchiveStorageReader::TryReadDirectoryInfoFromFile(IFile* file) {
+    FileEntryData data;
+    data.accessorHandler = New<IFileAdapter>(kMemLabelGeneral, file, kMemLabelGeneral, false);
+    if (data.accessorHandler == nullptr) return false;
+    FileSystemEntry entry(data);
+    FileAccessor accessor;
+    // An open memory file can be opened, and its start sought.
+    (void)accessor.Open(entry, kFilePermissionRead);
+    (void)accessor.Seek(0, kFileOriginBegin);
+    return ReadDirectoryInfo(accessor, m_Header, m_DirectoryInfo) == kHeaderOk;
+}

@@ -1,0 +1,193 @@
+// An archive as one readable stream of uncompressed data. The reader opens the file, loads header, block list and
+// directory, and serves any range of the stream, decompressing blocks on demand and keeping them in a small cache.
+//
+//   ArchiveStorageReader reader(kMemLabelFileSystem);
+//   if (reader.Initialize(core::string("archive.zarvo"), 0) != 0) return;
+//   for (const ArchiveStorageHeader::Node& node : reader.GetDirectoryInfo().nodes) {
+//       UInt64 count = 0;                                     // may be less than asked: go on from there
+//       reader.Read(node.offset, node.size, buffer, &count);
+//   }
+//
+// Threads: once Initialize has returned 0, Read, MakeStorageUsed and MakeStorageUnused may be called from any thread.
+// While IsDirectoryReady is false (a ZarvoWeb archive keeps its directory inside the compressed data), reads are made
+// by one thread, from the start of the stream in order, until it is true. The object is shared by reference count.
+//
+// Locks: m_StorageLock guards the open file, m_CacheLock the list of cached blocks. No operation holds both, neither is
+// held while data is decompressed, and m_CacheLock is never held while the file is read.
+#pragma once
+
+#include "Runtime/Core/Containers/DynamicArray.h"
+#include "Runtime/Core/Containers/String.h"
+#include "Runtime/Core/SharedObject.h"
+#include "Runtime/Threads/Mutex.h"
+#include "Runtime/Threads/ThreadAnnotations.h"
+#include "Runtime/Utilities/Compression/Compression.h"
+#include "Runtime/VirtualFileSystem/ArchiveFileSystem/ArchiveStorageHeader.h"
+#include "Runtime/VirtualFileSystem/ArchiveFileSystem/LegacyDirectoryScanner.h"
+#include "Runtime/VirtualFileSystem/IFile.h"
+#include "Runtime/VirtualFileSystem/VirtualFileSystem.h"
+
+#include <atomic>
+
+class MemoryFile;
+
+class ArchiveStorageReader : public ThreadSharedObject<ArchiveStorageReader> {
+public:
+    // An idle reader. Everything that it allocates for itself carries label.
+    explicit ArchiveStorageReader(MemLabelId label);
+    virtual ~ArchiveStorageReader();
+
+    // Opens the archive that starts at byte offset of the file and loads what describes it. 0 on success; -1 when the
+    // file can't be used as an archive; 1 when a seek, a read or the decompression of the blocks info failed. A reader
+    // whose Initialize failed may only be destroyed.
+    [[nodiscard]] int Initialize(const core::string& path, VFS::FileSize offset);
+
+    // canReleaseStorage: whether MakeStorageUnused may close the file. reportErrors: whether a file that can't be
+    // opened, has been changed or has an unreadable header is reported as an error.
+    [[nodiscard]] int Initialize(FileSystemEntry& entry, VFS::FileSize offset, bool canReleaseStorage,
+                                 bool reportErrors);
+
+    // Brackets a time of use: the file is open while there are more calls of the first than of the second (Initialize
+    // counts as one call of MakeStorageUsed). False when the file can't be opened or has been changed since Initialize;
+    // the call is to be balanced all the same. When the last use ends the cache is emptied, too: no read may be under
+    // way then.
+    [[nodiscard]] bool MakeStorageUsed(bool reportErrors);
+    void MakeStorageUnused();
+
+    // Copies up to size bytes of the data stream, from position from on, into buffer, and stores the number delivered
+    // in *read. True when at least one byte was delivered, or when size is 0 and from lies inside the stream. A range
+    // that passes the stream's end is refused whole. *read may be less than size when an archive is damaged or cut
+    // short; on false it is unchanged or 0.
+    bool Read(VFS::FileSize from, UInt64 size, void* buffer, UInt64* read, FileReadFlags flags = kFileReadFlagsNone);
+
+    const ArchiveStorageHeader::Header& GetHeader() const { return m_Header; }
+    const ArchiveStorageHeader::DirectoryInfo& GetDirectoryInfo() const { return m_DirectoryInfo; }
+
+    // Whether GetDirectoryInfo holds the archive's directory.
+    bool IsDirectoryReady() const { return m_DirectoryReady.load(std::memory_order_acquire); }
+
+    // False once what has been read shows that the stream holds no directory: reading on is then of no use. By the
+    // thread that makes the reads.
+    bool CanDirectoryBecomeReady() const;
+
+private:
+    friend struct ArchiveStorageReaderTestAccess;
+
+    // Decompressed data of one block: the whole of a chunk block, or a window of a streamed one.
+    //
+    // State                beingWritten  bufferReaders  what may happen
+    // idle                 0             0              shared (chunk), owned (streamed), claimed as a victim
+    // claimed for filling  1             1              filled: shared or owned; failed: idle with no block
+    // shared (chunk)       0             n > 0          more readers join, the last that leaves makes it idle
+    // owned (streamed)     1             1              its owner copies and moves the window; then idle
+    // a chunk's waiters    1             n > 1          join while it is filled, and wait for the filler
+    //
+    // A record with readers is never pointed at another block; only its filler (or owner), whose fill has failed,
+    // makes it name none.
+    struct CachedBlock {
+        explicit CachedBlock(MemLabelId label) : buffer(label), compressedBuffer(label) {}
+
+        UInt32 blockIndex = kNoBlock;
+        UInt32 blockOffset = ~UInt32{0}; // of buffer's first byte, in the block's data
+        dynamic_array<UInt8> buffer;
+        std::atomic<SInt32> bufferReaders{0};
+        std::atomic<SInt32> beingWritten{1};   // a new record is its maker's
+        UInt32 lastAccess = 0;                 // a smaller stamp is less recently used
+        void* streamState = nullptr;           // of a streamed block whose kind can be streamed
+        dynamic_array<UInt8> compressedBuffer; // stored bytes: a whole chunk, or a piece of a stream
+        UInt32 compressedPos = 0;              // streamed: what of compressedBuffer has been consumed
+        UInt32 compressedLoaded = 0;           // streamed: how many of the block's stored bytes have been loaded
+    };
+
+    enum CacheResult : SInt32 {
+        kCacheResultReadError = -2,
+        kCacheResultDecompressError = -1, // or no decompressor, or the wrong size
+        kCacheResultOk = 0,
+        kCacheResultIncomplete = 1, // stored bytes, or the stream, ended early
+    };
+
+    // Delivers stored bytes to one Read call: straight from the file, or, when the call spans blocks, out of a window
+    // that is read ahead. Positions are relative to m_DataOffset.
+    class BatchingFileReader {
+    public:
+        BatchingFileReader(ArchiveStorageReader* reader, UInt64 batchSize, UInt64 startPos, UInt64 endPos);
+        bool Read(void* destination, UInt64 position, UInt64 size, UInt64* delivered);
+
+    private:
+        ArchiveStorageReader* m_Reader;
+        UInt64 m_BatchSize; // 0: no window
+        UInt64 m_StartPos;  // the call may read [m_StartPos, m_EndPos)
+        UInt64 m_EndPos;
+        UInt64 m_LoadedWindowStart = 0;
+        UInt64 m_LoadedWindowEnd = 0;
+        dynamic_array<UInt8> m_Buffer;
+    };
+
+    static constexpr UInt32 kNoBlock = ~UInt32{0};
+    static constexpr UInt32 kStreamWindowSize = 65'536; // of output, and of the input pieces that it is made from
+    static constexpr UInt64 kBatchSize = 4'194'304;
+
+    // Set-up, in ArchiveStorageReader.cpp. Runs while no other thread uses the reader, so it takes no lock.
+    int ReadHeader(UInt64 offset) VARNEX_NO_THREAD_SAFETY_ANALYSIS;
+    int ReadBlockBasedHeader(UInt64 offset) VARNEX_NO_THREAD_SAFETY_ANALYSIS;
+    int ReadCompressedBlocksInfo(CompressionType type) VARNEX_NO_THREAD_SAFETY_ANALYSIS;
+    int ReadBlocksInfoSection(FileAccessor& file);
+    void BuildOffsetTables();
+    void TryToReadDirectoryFromBlockData(UInt64 from, const void* data, size_t size);
+    bool TryReadDirectoryInfoFromFile(IFile* file);
+
+    // The block cache, in ArchiveStorageReaderCache.cpp.
+    CachedBlock* AcquireCachedBlock(UInt32 blockIndex, UInt32 offsetInBlock);
+    CachedBlock* AcquireAndPrefillUnusedBlock(UInt32 blockIndex, CacheResult* result, BatchingFileReader* reader);
+    CachedBlock* ClaimVictim() VARNEX_REQUIRES(m_CacheLock);
+    void InvalidateCachedBlock(CachedBlock* block);
+    void ReleaseCachedBlock(CachedBlock* block, bool isStreamed);
+    void ReinitCachedBlock(CachedBlock* block, UInt32 blockIndex);
+    void DeinitCachedBlock(CachedBlock* block);
+    CacheResult FillStreamCachedBlock(CachedBlock* block, UInt64 maxSize, BatchingFileReader* reader);
+    CacheResult FillChunkCachedBlock(CachedBlock* block, BatchingFileReader* reader);
+    void StampCachedBlock(CachedBlock* block);
+    void EmptyCache();
+    IDecompressor* GetDecompressor(CompressionType type);
+    CompressionType GetBlockType(UInt32 blockIndex) const;
+    bool IsBlockStreamed(UInt32 blockIndex) const;
+
+    // Reads, in ArchiveStorageReaderRead.cpp.
+    bool FindBlock(UInt64 position, UInt32* blockIndex) const;
+    bool ReadCompleteBlock(UInt32 blockIndex, void* destination, UInt64* delivered, BatchingFileReader* batch);
+    bool ReadBlock(UInt32 blockIndex, UInt64 offsetInBlock, UInt64 size, void* destination, UInt64* delivered,
+                   BatchingFileReader* batch);
+    CacheResult CopyFromCachedBlock(CachedBlock* record, UInt64 offsetInBlock, UInt64 size, void* destination,
+                                    UInt64* delivered, BatchingFileReader* batch);
+    bool ReadFromStorage(UInt64 position, UInt64 size, void* destination, UInt64* delivered);
+
+    ArchiveStorageHeader::Header m_Header;
+    ArchiveStorageHeader::BlocksInfo m_BlocksInfo;
+    ArchiveStorageHeader::DirectoryInfo m_DirectoryInfo;
+
+    // Block count + 1 entries each, once initialised: where block i starts in the data stream, and where its stored
+    // bytes start, relative to m_DataOffset; the last entry is the end.
+    dynamic_array<UInt64> m_UncompressedBlocksOffsets;
+    dynamic_array<UInt64> m_CompressedBlocksOffsets;
+
+    MemoryFile* m_DirectoryFile = nullptr; // owned; the start of the stream, until a directory can be parsed from it
+    LegacyDirectoryScanner m_DirectoryScanner;
+    std::atomic<bool> m_DirectoryReady{false};
+    FileSystemEntry m_FileEntry;
+    FileAccessor m_File VARNEX_GUARDED_BY(m_StorageLock);
+    bool m_ReleaseStorageWhenUnused = true;
+    UInt64 m_DataOffset = 0; // in the file, of the first stored byte of block 0
+    SInt32 m_StorageUseCount VARNEX_GUARDED_BY(m_StorageLock) = 0;
+    Mutex m_StorageLock;
+
+    // ZarvoWeb: stored positions are counted as if the 8 bytes behind the 5 bytes of LZMA properties were not there.
+    bool m_HideLzmaSizeField = false;
+
+    bool m_CheckModificationTime = true;
+    DateTime m_LastModified;
+    dynamic_array<CachedBlock*> m_CachedBlocks VARNEX_GUARDED_BY(m_CacheLock);
+    Mutex m_CacheLock;
+    std::atomic<UInt32> m_AccessCounter{0};
+    std::atomic<IDecompressor*> m_Decompressors[kCompressionCount] = {}; // owned; made on first use
+    MemLabelId m_Label;
+};

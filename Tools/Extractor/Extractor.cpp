@@ -1,0 +1,160 @@
+#include "Tools/Extractor/Extractor.h"
+
+#include "Runtime/Utilities/FileUtilities.h"
+#include "Runtime/Utilities/LogAssert.h"
+#include "Runtime/Utilities/PathNameUtility.h"
+#include "Runtime/VirtualFileSystem/ArchiveFileSystem/ArchiveStorageReader.h"
+
+#include <algorithm>
+#include <cstring>
+#include <string>
+
+namespace {
+
+using ArchiveStorageHeader::Node;
+
+constexpr UInt64 kTransferSize = 65'536;
+
+// Where entries go. A stored path decides what is made below the output folder, and never where that folder is.
+class OutputFolder {
+public:
+    explicit OutputFolder(const char* archivePath) : m_Path(std::string(archivePath) + "_data") {
+        // A leading "~" is part of the name here, not the home folder.
+        if (m_Path[0] == '~') m_Path.insert(0, "./");
+        m_AbsoluteLength = PathToAbsolutePath(m_Path.c_str()).size();
+        if (m_Path.size() > kMaxPathLength) return;
+        FileSystemEntry entry(m_Path.c_str());
+        // It may be there already; if it could not be made, every entry says so.
+        (void)entry.CreateAsDir();
+    }
+
+    core::string Join(core::string_ref path) const {
+        core::string joined(kMemLabelGeneral);
+        AppendPathNameImpl(m_Path.c_str(), path, '/', joined);
+        return joined;
+    }
+
+    // Whether an entry of this path may be made: one that would leave the folder, or whose path would be cut to
+    // another one's, may not.
+    bool Accepts(core::string_ref path) const {
+        if (HasParentComponent(path)) return false;
+        const size_t joinedLength = Join(path).size();
+        const size_t absoluteLength = m_AbsoluteLength + (joinedLength - m_Path.size());
+        return std::max(joinedLength, absoluteLength) <= kMaxPathLength;
+    }
+
+private:
+    // Entries turn backslashes into "/", so they separate components here too.
+    static bool HasParentComponent(core::string_ref path) {
+        size_t start = 0;
+        for (size_t index = 0; index <= path.size(); ++index) {
+            if (index != path.size() && path[index] != '/' && path[index] != '\\') continue;
+            if (path.substr(start, index - start) == "..") return true;
+            start = index + 1;
+        }
+        return false;
+    }
+
+    std::string m_Path;
+    size_t m_AbsoluteLength;
+};
+
+void PrintHeader(const ArchiveStorageHeader::Header& header) {
+    printf_console("  stream version: %d\n", static_cast<int>(header.version));
+    printf_console("  zarvo version: %s\n", header.engineVersion.c_str());
+    printf_console("  zarvo revision: %s\n", header.engineRevision.c_str());
+    printf_console("  data size: %llu bytes\n", header.size);
+}
+
+// Reads the stream from its start until the reader has met the directory in it.
+bool PullDirectory(ArchiveStorageReader& reader, dynamic_array<UInt8>& buffer) {
+    UInt64 position = 0;
+    while (!reader.IsDirectoryReady()) {
+        UInt64 delivered = 0;
+        if (!reader.Read(position, kTransferSize, buffer.data(), &delivered)) return false;
+        if (!reader.CanDirectoryBecomeReady()) return false; // and no later read would change that
+        position += delivered;
+    }
+    return true;
+}
+
+bool CopyNode(ArchiveStorageReader& reader, const Node& node, FileAccessor& file, dynamic_array<UInt8>& buffer) {
+    UInt64 copied = 0;
+    while (copied < node.size) {
+        UInt64 delivered = 0;
+        const UInt64 wanted = std::min(node.size - copied, kTransferSize);
+        if (!reader.Read(node.offset + copied, wanted, buffer.data(), &delivered)) {
+            printf_console("ERROR: failed to decompress file %s\n", node.path.c_str());
+            return false;
+        }
+        UInt64 written = 0;
+        if (!file.Write(delivered, buffer.data(), &written) || written != delivered) {
+            printf_console("ERROR: failed to write file %s\n", node.path.c_str());
+            return false;
+        }
+        copied += delivered;
+    }
+    // Some file systems report only here that the bytes did not fit.
+    if (!file.Close()) {
+        printf_console("ERROR: failed to write file %s\n", node.path.c_str());
+        return false;
+    }
+    return true;
+}
+
+bool ExtractFolder(const Node& node, const OutputFolder& output) {
+    if (output.Accepts(node.path) && CreateDirectoryRecursive(output.Join(node.path))) return true;
+    printf_console("ERROR: failed to create directory %s\n", node.path.c_str());
+    return false;
+}
+
+bool ExtractFile(ArchiveStorageReader& reader, const Node& node, const OutputFolder& output,
+                 dynamic_array<UInt8>& buffer) {
+    if (!output.Accepts(node.path)) {
+        printf_console("ERROR: failed to create file %s\n", node.path.c_str());
+        return false;
+    }
+    bool isOk = true;
+    const core::string parent(DeleteLastPathNameComponent(node.path), kMemLabelGeneral);
+    if (!CreateDirectoryRecursive(output.Join(parent))) {
+        printf_console("ERROR: failed to create directory %s\n", parent.c_str());
+        isOk = false;
+    }
+    FileAccessor file;
+    if (!file.Open(output.Join(node.path).c_str(), kFilePermissionWrite)) {
+        printf_console("ERROR: failed to create file %s\n", node.path.c_str());
+        return false;
+    }
+    return CopyNode(reader, node, file, buffer) && isOk;
+}
+
+} // namespace
+
+bool ExtractArchive(const char* archivePath) {
+    ArchiveStorageReader reader(kMemLabelFileSystem);
+    // An entry would cut a longer path, and another file would be read.
+    if (strlen(archivePath) > kMaxPathLength || reader.Initialize(core::string(archivePath), 0) != 0) {
+        printf_console("ERROR: can't read or not a zarvo web file\n");
+        return false;
+    }
+    PrintHeader(reader.GetHeader());
+
+    dynamic_array<UInt8> buffer(kMemLabelGeneral);
+    buffer.resize_uninitialized(kTransferSize, kResizeExact);
+    if (!PullDirectory(reader, buffer)) {
+        printf_console("ERROR: failed to parse files information\n");
+        return false;
+    }
+
+    printf_console("  creating folder '%s_data'\n", archivePath);
+    const OutputFolder output(archivePath);
+    bool isAllOk = true;
+    for (size_t index = 0; index < reader.GetDirectoryInfo().nodes.size(); ++index) {
+        const Node& node = reader.GetDirectoryInfo().nodes[index];
+        const bool isFolder = (node.flags & ArchiveStorageHeader::kNodeDirectory) != 0;
+        const bool isOk = isFolder ? ExtractFolder(node, output) : ExtractFile(reader, node, output, buffer);
+        isAllOk = isAllOk && isOk;
+    }
+    if (isAllOk) printf_console("All ok!\n");
+    return isAllOk;
+}
