@@ -40,7 +40,8 @@ public:
 
     // Goes on with the stream. In: *srcSize bytes of further input, room for *dstSize bytes. Out, on success: *srcSize
     // is what was consumed (offer the rest again, first, at the next call) and *dstSize what was produced.
-    // isLastInput: no input follows what is offered. After a failure every call fails until the state is reset.
+    // isLastInput: no input follows what is offered. Once the decoder has reported an error, every call fails until the
+    // state is reset.
     [[nodiscard]] virtual bool DecompressStream(void* state, const void* src, size_t* srcSize, void* dst,
                                                 size_t* dstSize, bool isLastInput) const = 0;
 };

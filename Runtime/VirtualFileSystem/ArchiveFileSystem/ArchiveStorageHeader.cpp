@@ -93,10 +93,8 @@ HeaderResult ReadHeaderSignature(FileAccessor& file, Header& header) {
         header.signature = kSignature;
         header.flags |= kArchiveWebSignatureHeader;
     }
-    // The next read fails where this seek does.
-    (void)file.Seek(afterSignature, kFileOriginBegin);
     header.flags &= ~kTypeAndDirectoryMask;
-    return kHeaderOk;
+    return file.Seek(afterSignature, kFileOriginBegin) ? kHeaderOk : kHeaderNotAnArchive;
 }
 
 // Offset           Size    Field

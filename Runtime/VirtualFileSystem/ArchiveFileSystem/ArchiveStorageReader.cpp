@@ -87,8 +87,7 @@ void ArchiveStorageReader::BuildOffsetTables() {
 }
 
 int ArchiveStorageReader::ReadHeader(UInt64 offset) {
-    // Where this seek fails the signature can't be read either.
-    (void)m_File.Seek(VFS::FileOffset(VFS::FileSize(offset)), kFileOriginBegin);
+    if (!m_File.Seek(VFS::FileOffset(VFS::FileSize(offset)), kFileOriginBegin)) return kHeaderNotAnArchive;
     if (ReadHeaderSignature(m_File, m_Header) != kHeaderOk) return kHeaderNotAnArchive;
 
     int result;

@@ -1,0 +1,214 @@
+#include "Tests/Support/ArchiveWriter.h"
+
+#include "Tests/Support/ArchiveFrames.h"
+
+#include <algorithm>
+#include <cstdio>
+#include <cstdlib>
+#include <filesystem>
+#include <fstream>
+#include <functional>
+
+// The archive is made in three parts: what stands before the data (head), the data, what stands behind it (tail). The
+// data is made first, since the sizes of the stored blocks stand in one of the other two.
+
+namespace {
+
+constexpr UInt64 kLzmaPropertiesSize = 5;
+
+void Require(bool isTrue, const std::string& message) {
+    if (isTrue) return;
+    fprintf(stderr, "ArchiveWriter: %s\n", message.c_str());
+    abort();
+}
+
+// The data stream: the entries' bytes one after another, behind the legacy directory where there is one. It is read
+// from its start to its end, once.
+class DataStream {
+public:
+    DataStream(const ArchiveDescription& description, GivenFields& given) : m_Description(description) {
+        m_Size = Place(0);
+        if (!HasLegacyDirectory(description.layout)) return;
+        // Its size does not depend on where the entries lie; its contents do.
+        m_Size = Place(MakeLegacyDirectory(given, m_Nodes).Size());
+        m_Pending = MakeLegacyDirectory(given, m_Nodes).Bytes();
+    }
+
+    UInt64 Size() const { return m_Size; }
+    const std::vector<PlacedNode>& Nodes() const { return m_Nodes; }
+
+    // The next bytes of the stream.
+    std::string Read(UInt64 size) {
+        std::string piece;
+        while (piece.size() < size) {
+            if (m_Taken == m_Pending.size()) LoadPending(size - piece.size());
+            const size_t count = std::min<size_t>(size - piece.size(), m_Pending.size() - m_Taken);
+            piece.append(m_Pending, m_Taken, count);
+            m_Taken += count;
+        }
+        return piece;
+    }
+
+private:
+    // Places the entries from offset on; the end of the last one.
+    UInt64 Place(UInt64 offset) {
+        m_Nodes.clear();
+        for (const ArchiveEntry& entry : m_Description.entries) {
+            const UInt64 size = EntrySize(entry);
+            if (entry.listed) m_Nodes.push_back({&entry, offset, size});
+            offset += size;
+        }
+        return offset;
+    }
+
+    static UInt64 EntrySize(const ArchiveEntry& entry) {
+        if (entry.sourceFile.empty()) return entry.bytes.size();
+        std::error_code error;
+        const UInt64 size = std::filesystem::file_size(entry.sourceFile, error);
+        Require(!error, "no size of " + entry.sourceFile);
+        return size;
+    }
+
+    void LoadPending(UInt64 wanted) {
+        m_Pending.clear();
+        m_Taken = 0;
+        if (m_File.is_open()) {
+            m_Pending.resize(wanted);
+            m_File.read(m_Pending.data(), static_cast<std::streamsize>(wanted));
+            m_Pending.resize(static_cast<size_t>(m_File.gcount()));
+            if (m_Pending.empty()) m_File.close();
+            return;
+        }
+        Require(m_NextEntry < m_Description.entries.size(), "the blocks need more bytes than the entries have");
+        const ArchiveEntry& entry = m_Description.entries[m_NextEntry++];
+        if (entry.sourceFile.empty()) {
+            m_Pending = entry.bytes;
+        } else {
+            m_File.open(entry.sourceFile, std::ios::binary);
+            Require(m_File.is_open(), "can't open " + entry.sourceFile);
+        }
+    }
+
+    const ArchiveDescription& m_Description;
+    std::vector<PlacedNode> m_Nodes;
+    UInt64 m_Size = 0;
+    size_t m_NextEntry = 0;
+    std::string m_Pending; // loaded
+    size_t m_Taken = 0;    // of it
+    std::ifstream m_File;  // of the entry before m_NextEntry
+};
+
+CompressionType TypeOf(const ArchiveDescription& description, const ArchiveBlock& block) {
+    if (description.layout == ArchiveLayout::kWeb) return kCompressionLzma;
+    if (description.layout == ArchiveLayout::kRaw) return kCompressionNone;
+    return block.type.value_or(description.type);
+}
+
+using Sink = std::function<void(const std::string& bytes)>;
+
+// Stores the stream block by block.
+std::vector<StoredBlock> StoreBlocks(const ArchiveDescription& description, DataStream& stream, const Sink& sink) {
+    std::vector<ArchiveBlock> cut = description.blocks;
+    UInt64 position = 0;
+    for (const ArchiveBlock& block : cut)
+        position += block.size;
+    const bool isWhole = description.chunkSize == 0 || HasLegacyDirectory(description.layout);
+    while (position < stream.Size()) {
+        const UInt64 left = stream.Size() - position;
+        cut.push_back({.size = isWhole ? left : std::min(description.chunkSize, left)});
+        position += cut.back().size;
+    }
+
+    std::vector<StoredBlock> stored;
+    for (const ArchiveBlock& block : cut) {
+        const CompressionType type = TypeOf(description, block);
+        const std::string plain = stream.Read(block.size);
+        std::string bytes = block.stored ? *block.stored : Compress(type, plain, description.lzma);
+        // The legacy stream has the size of its data, least significant byte first, behind the properties.
+        if (description.layout == ArchiveLayout::kWeb && !block.stored) {
+            std::string sizeField;
+            for (int byte = 0; byte < 8; ++byte)
+                sizeField.push_back(static_cast<char>(plain.size() >> (8 * byte)));
+            bytes.insert(kLzmaPropertiesSize, sizeField);
+        }
+        sink(bytes);
+        stored.push_back({block.size, bytes.size(), type, block.streamed.value_or(description.streamed)});
+    }
+    return stored;
+}
+
+// Makes all parts; the data goes to the sink.
+Frame MakeParts(const ArchiveDescription& description, GivenFields& given, const Sink& sink) {
+    DataStream stream(description, given);
+    const std::vector<StoredBlock> blocks = StoreBlocks(description, stream, sink);
+    Frame frame = MakeFrame(description, given, blocks, stream.Nodes());
+    for (const auto& [name, value] : description.fields)
+        Require(given.stored.count(name) != 0, "no field is named " + name);
+    return frame;
+}
+
+void AppendFile(std::ofstream& output, const std::string& path) {
+    std::ifstream input(path, std::ios::binary);
+    std::string piece(1 << 20, '\0');
+    while (input.read(piece.data(), static_cast<std::streamsize>(piece.size())), input.gcount() > 0)
+        output.write(piece.data(), input.gcount());
+}
+
+} // namespace
+
+BuiltArchive BuildArchive(const ArchiveDescription& description) {
+    BuiltArchive built;
+    GivenFields given{description.fields};
+    std::string data;
+    const Frame frame = MakeParts(description, given, [&](const std::string& bytes) { data += bytes; });
+
+    DataStream stream(description, given);
+    if (description.layout == ArchiveLayout::kRaw)
+        MakeLegacyDirectory(given, stream.Nodes()).PutFieldsAt(frame.head.Size(), &built.fields);
+    built.stream = stream.Read(stream.Size());
+    built.bytes = frame.head.Bytes() + data + frame.tail.Bytes();
+    frame.head.PutFieldsAt(0, &built.fields);
+    frame.tail.PutFieldsAt(frame.head.Size() + data.size(), &built.fields);
+    built.headerSize = frame.headerSize;
+    built.sectionOffset = frame.sectionOffset;
+    built.sectionSize = frame.sectionSize;
+    built.dataOffset = frame.head.Size();
+    return built;
+}
+
+void WriteArchive(const ArchiveDescription& description, const std::string& outputFile) {
+    // The data is written first and its sizes stand before it, so it waits in a file of its own.
+    const std::string dataFile = outputFile + ".data";
+    GivenFields given{description.fields};
+    std::ofstream data(dataFile, std::ios::binary | std::ios::trunc);
+    const Frame frame = MakeParts(description, given, [&](const std::string& bytes) { data << bytes; });
+    data.close();
+    Require(!data.fail(), "can't write " + dataFile);
+
+    std::ofstream output(outputFile, std::ios::binary | std::ios::trunc);
+    output << frame.head.Bytes();
+    AppendFile(output, dataFile);
+    output << frame.tail.Bytes();
+    output.close();
+    Require(!output.fail(), "can't write " + outputFile);
+    std::error_code error;
+    Require(std::filesystem::remove(dataFile, error), "can't remove " + dataFile);
+}
+
+void PackFolder(const std::string& folder, const std::string& outputFile, ArchiveDescription form) {
+    std::map<std::string, bool> isFolderByPath;
+    std::error_code error;
+    std::filesystem::recursive_directory_iterator entry(folder, error), end;
+    for (; !error && entry != end; entry.increment(error))
+        isFolderByPath[entry->path().string()] = entry->is_directory();
+    Require(!error, "can't list " + folder);
+
+    for (const auto& [path, isFolder] : isFolderByPath) {
+        const std::string relative = path.substr(folder.size() + 1);
+        if (isFolder)
+            form.entries.push_back({.path = relative, .flags = kFolderEntry});
+        else
+            form.entries.push_back({.path = relative, .sourceFile = path});
+    }
+    WriteArchive(form, outputFile);
+}
