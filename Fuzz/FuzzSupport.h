@@ -1,0 +1,60 @@
+// What the fuzz targets share. A target states a property and holds it with FuzzCheck, which is never compiled out.
+// Parameters are drawn from the end of the input, so that its front stays a valid sample.
+#pragma once
+
+#include "Runtime/Core/SourceLocation.h"
+#include "Runtime/Core/Types.h"
+#include "Runtime/VirtualFileSystem/MemoryFileSystem/MemoryFile.h"
+#include "Runtime/VirtualFileSystem/VirtualFileSystem.h"
+
+#include <cstdint>
+#include <cstdio>
+#include <cstdlib>
+
+#include <vector>
+
+inline void FuzzCheck(bool condition, SourceLocation where = SourceLocation::current()) {
+    if (condition) return;
+    fprintf(stderr, "property broken at %s:%u\n", where.file, static_cast<unsigned>(where.line));
+    abort();
+}
+
+// The input, with parameters taken off its end.
+class FuzzInput {
+public:
+    FuzzInput(const std::uint8_t* data, size_t size) : m_Data(data), m_Size(size) {}
+
+    // A number below bound (which is not 0), drawn from up to four bytes at the end.
+    UInt64 TakeBelow(UInt64 bound) {
+        UInt64 value = 0;
+        for (int count = 0; count < 4 && m_Size != 0; ++count)
+            value = value << 8 | m_Data[--m_Size];
+        return value % bound;
+    }
+
+    const std::uint8_t* data() const { return m_Data; }
+    size_t size() const { return m_Size; }
+
+private:
+    const std::uint8_t* m_Data;
+    size_t m_Size;
+};
+
+// An accessor over the bytes, which must outlive it. Closed when destroyed.
+class FuzzFile {
+public:
+    FuzzFile(const std::uint8_t* data, size_t size)
+        : m_Entry(MemoryFile::CreateFileSystemEntry(kMemLabelGeneral, kFilePermissionRead,
+                                                    const_cast<std::uint8_t*>(data), size, false)) {
+        FuzzCheck(file.Open(m_Entry, kFilePermissionRead));
+    }
+
+private:
+    FileSystemEntry m_Entry;
+
+public:
+    FileAccessor file;
+};
+
+// Sends what the log sink prints to /dev/null. Call once.
+void SilenceConsole();
