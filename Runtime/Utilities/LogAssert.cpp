@@ -211,7 +211,8 @@ void DebugStringToFilePostprocessedStacktrace(const DebugStringToFileData& data)
     EndWithNewline(&message);
     if (HasStackTraceForConsole(type, data)) {
         core::string stackTrace = ConsoleText(data.stackTrace);
-        if (stackTrace[0] == '\n') stackTrace = core::string(stackTrace.c_str() + 1, MemLabelId(kMemLabelGeneral));
+        if (stackTrace.c_str()[0] == '\n')
+            stackTrace = core::string(stackTrace.c_str() + 1, MemLabelId(kMemLabelGeneral));
         EndWithNewline(&stackTrace);
         if (HasSourcePositionForConsole(data))
             print("%s%s\n(Filename: %s Line: %i)\n\n", message.c_str(), stackTrace.c_str(), data.file, data.line);

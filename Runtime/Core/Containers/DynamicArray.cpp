@@ -23,7 +23,8 @@ void* dynamic_array_data::reserve(size_t capacity, size_t elementSize, size_t al
     if (!owns_data()) {
         if (capacity != 0)
             buffer = malloc_internal(byteCount, alignment, label, kAllocateOptionNone, __FILE__, __LINE__);
-        if (const size_t kept = std::min(size, capacity); buffer != nullptr && kept != 0)
+        // An array that was refused memory has a size and no elements.
+        if (const size_t kept = std::min(size, capacity); buffer != nullptr && data != nullptr && kept != 0)
             memcpy(buffer, data, kept * elementSize);
     } else {
         if (static_cast<SInt64>(capacity) < 0)
