@@ -5,6 +5,10 @@
 //   object->AddRef();    // a second holder
 //   object->Release();   // and so on: the last one frees it under its label
 //
+//   count    AddRef    Release
+//   1        2         0: destroyed, by the thread that released it; what all holders did before comes before that
+//   n > 1    n + 1     n - 1
+//
 // AddRef and Release may be called from any thread by a thread that holds a reference.
 #pragma once
 

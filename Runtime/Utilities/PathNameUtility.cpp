@@ -3,7 +3,8 @@
 using core::string_ref;
 
 void AppendPathNameImpl(string_ref base, string_ref tail, char separator, core::string& out) {
-    out.reserve(base.size() + tail.size() + 1);
+    // Half a path would name something else.
+    if (out.grow(base.size() + tail.size() + 1) == nullptr) return;
     out += base;
     if (!base.empty() && !tail.empty()) {
         const bool isBaseEnded = base[base.size() - 1] == separator;

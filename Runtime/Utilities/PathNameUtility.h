@@ -7,7 +7,8 @@
 #include "Runtime/Core/Containers/StringRef.h"
 
 // Joins base and tail into out, which must be empty. Exactly one separator stands at the seam (a tail that starts with
-// two keeps one); an empty part adds nothing. "." and ".." stay as they are.
+// two keeps one); an empty part adds nothing. "." and ".." stay as they are. out stays
+// empty when memory is refused.
 void AppendPathNameImpl(core::basic_string_ref<char> base, core::basic_string_ref<char> tail, char separator,
                         core::basic_string<char>& out);
 

@@ -54,7 +54,7 @@ public:
     bool CreateAsFile(FileEntryData& entry) override;
     bool CreateAsDir(FileEntryData& entry) override; // the last component alone
     // A link is deleted, never what it leads to. What can't be deleted is left; so are children whose path an entry
-    // would cut.
+    // would change: one that it cuts, and a name with a backslash.
     bool Delete(FileEntryData& entry, bool recursive) override;
     bool Target(const FileEntryData& entry, FileSystemEntry& target) const override;
     // Advisory, per descriptor. Opens the entry (creating, or emptying a file that can't be opened to read) when it is

@@ -105,14 +105,17 @@ bool LocalFileSystemPosix::Delete(FileEntryData& entry, bool recursive) {
     if (!IsDir(entry) || IsSymLink(entry)) return RepeatOnInterrupt([&] { return unlink(entry.path); }) == 0;
     if (recursive) {
         const size_t length = strlen(entry.path);
-        const size_t prefixLength = length != 0 && entry.path[length - 1] == '/' ? length : length + 1;
+        const size_t prefixLength = entry.path[length - 1] == '/' ? length : length + 1;
         dynamic_block_array<FileEntryInfo, 32> children(kMemLabelFileList);
         (void)Enumerate(entry.path, &children, false, nullptr, kFileEnumerationAll); // rmdir tells what is left
         for (size_t index = 0; index < children.size(); ++index) {
+            const char* const path = children[index].path;
             // A path that was cut before its name is that of this folder. One that was cut in its name is that of no
             // other child than those that are deleted anyway.
-            if (strlen(children[index].path) <= prefixLength) continue;
-            FileSystemEntry child{core::string_ref(children[index].path)};
+            if (strlen(path) <= prefixLength) continue;
+            // An entry takes a backslash for a separator: the name "..\x" would be a path out of this folder.
+            if (strchr(path + prefixLength, '\\') != nullptr) continue;
+            FileSystemEntry child{core::string_ref(path)};
             (void)child.handler->Delete(child, true); // rmdir tells what is left
         }
     }
@@ -207,12 +210,13 @@ bool LocalFileSystemPosix::Copy(FileEntryData& from, FileEntryData& to) {
     const UInt64 size = sourceEntry.accessorHandler->Size(sourceEntry).Cast<UInt64>();
     dynamic_array<UInt8> buffer(kMemLabelGeneral);
     buffer.resize_uninitialized(static_cast<size_t>(std::min(size, kTransferSize)), kResizeExact);
-    for (UInt64 total = 0; total < size;) {
+    UInt64 total = 0;
+    while (total < size) {
         UInt64 count = 0;
         UInt64 written = 0;
         if (!source.Read(buffer.size(), buffer.data(), &count)) return false;
         if (!target.Write(count, buffer.data(), &written) || written != count) return false;
         total += written;
     }
-    return SynchronizeMode(from, to);
+    return total == size && SynchronizeMode(from, to); // not if it grew meanwhile
 }

@@ -29,7 +29,7 @@ core::string LocalFileSystemPosix::ToAbsolute(string_ref path) const {
         return expanded;
     }
     core::string absolute(kMemLabelGeneral);
-    AppendPathNameImpl(currentDirectory, path, '/', absolute);
+    AppendPathNameImpl(GetFileSystem()->CurrentDirectory(), path, '/', absolute);
     return absolute;
 }
 
@@ -198,7 +198,7 @@ bool LocalFileSystemPosix::Enumerate(const char* path, dynamic_block_array<FileE
     if (!folder.IsOpen()) return false;
 
     core::string working(path, kMemLabelGeneral);
-    if (working.empty() || working.back() != '/') working += '/';
+    if (working.back() != '/') working += '/';
     const size_t prefixLength = working.size();
     while (const char* name = folder.Next()) {
         working.resize(prefixLength);

@@ -139,13 +139,12 @@ bool FileSystemEntry::FolderExists() const {
 }
 
 FileAccessor::~FileAccessor() {
-    if (!opened || entry.accessorHandler == nullptr) return;
-    (void)entry.accessorHandler->Close(entry); // who needs the answer has closed it before
-    openSucceeded = false;
+    (void)Close(); // who needs the answer has closed it before
 }
 
 bool FileAccessor::Open(FileSystemEntry& target, FilePermission permission, FileAutoBehavior behavior) {
-    entry = target;
+    Unbind(entry);
+    CopyBinding(entry, target);
     entry.handlerState = nullptr;
     opened = true;
     openSucceeded = entry.accessorHandler != nullptr && entry.accessorHandler->Open(entry, permission, behavior);

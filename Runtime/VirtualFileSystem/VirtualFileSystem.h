@@ -83,7 +83,7 @@ public:
 };
 
 // An open file: closed when destroyed. Close it before opening it again.
-class FileAccessor : private NonCopyable {
+class FileAccessor {
 public:
     FileAccessor() = default;
     virtual ~FileAccessor();
@@ -108,7 +108,7 @@ public:
     bool Close();
 
 private:
-    FileSystemEntry entry;
+    FileEntryData entry;
     bool opened = false;        // an open was attempted
     bool openSucceeded = false; // the handler's answer to it
 };

@@ -204,6 +204,8 @@ void PackFolder(const std::string& folder, const std::string& outputFile, Archiv
     Require(!error, "can't list " + folder);
 
     for (const auto& [path, isFolder] : isFolderByPath) {
+        // The legacy layouts have no nodes for folders.
+        if (isFolder && HasLegacyDirectory(form.layout)) continue;
         const std::string relative = path.substr(folder.size() + 1);
         if (isFolder)
             form.entries.push_back({.path = relative, .flags = kFolderEntry});

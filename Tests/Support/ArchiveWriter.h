@@ -98,5 +98,6 @@ BuiltArchive BuildArchive(const ArchiveDescription& description);
 // Writes the archive to a file. Only one block, the section and what the description itself holds are in memory.
 void WriteArchive(const ArchiveDescription& description, const std::string& outputFile);
 
-// An archive of every file and folder below a folder, in the order of their paths; form gives all but the entries.
+// An archive of every file and folder below a folder, in the order of their paths; form gives all but the entries. The
+// legacy layouts hold files only.
 void PackFolder(const std::string& folder, const std::string& outputFile, ArchiveDescription form);

@@ -18,29 +18,32 @@ constexpr UInt64 kTransferSize = 65'536;
 // Where entries go. A stored path decides what is made below the output folder, and never where that folder is.
 class OutputFolder {
 public:
-    explicit OutputFolder(const char* archivePath) : m_Path(std::string(archivePath) + "_data") {
+    explicit OutputFolder(const char* archivePath) {
         // A leading "~" is part of the name here, not the home folder.
-        if (m_Path[0] == '~') m_Path.insert(0, "./");
+        if (archivePath[0] == '~') m_Path = "./";
+        m_Path += archivePath;
+        m_Path += "_data";
         m_AbsoluteLength = PathToAbsolutePath(m_Path.c_str()).size();
-        if (m_Path.size() > kMaxPathLength) return;
+    }
+
+    // False when an entry would cut the folder's path. A folder that can't be made is no failure yet: it may be there
+    // already, and if it is not, every entry says so.
+    bool Create() const {
+        if (m_Path.size() > kMaxPathLength) return false;
         FileSystemEntry entry(m_Path.c_str());
-        // It may be there already; if it could not be made, every entry says so.
         (void)entry.CreateAsDir();
+        return true;
     }
 
-    core::string Join(core::string_ref path) const {
-        core::string joined(kMemLabelGeneral);
-        AppendPathNameImpl(m_Path.c_str(), path, '/', joined);
-        return joined;
-    }
-
-    // Whether an entry of this path may be made: one that would leave the folder, or whose path would be cut to
-    // another one's, may not.
-    bool Accepts(core::string_ref path) const {
+    // The path of an entry on disk. False for one that would leave the folder, or whose path, as it is or absolute,
+    // would be cut to another one's.
+    bool Resolve(core::string_ref path, core::string* joined) const {
         if (HasParentComponent(path)) return false;
-        const size_t joinedLength = Join(path).size();
-        const size_t absoluteLength = m_AbsoluteLength + (joinedLength - m_Path.size());
-        return std::max(joinedLength, absoluteLength) <= kMaxPathLength;
+        joined->clear();
+        AppendPathNameImpl(m_Path.c_str(), path, '/', *joined);
+        if (joined->size() < m_Path.size()) return false; // memory was refused
+        const size_t absoluteLength = m_AbsoluteLength + (joined->size() - m_Path.size());
+        return std::max(joined->size(), absoluteLength) <= kMaxPathLength;
     }
 
 private:
@@ -103,25 +106,28 @@ bool CopyNode(ArchiveStorageReader& reader, const Node& node, FileAccessor& file
 }
 
 bool ExtractFolder(const Node& node, const OutputFolder& output) {
-    if (output.Accepts(node.path) && CreateDirectoryRecursive(output.Join(node.path))) return true;
+    core::string path(kMemLabelGeneral);
+    if (output.Resolve(node.path, &path) && CreateDirectoryRecursive(path)) return true;
     printf_console("ERROR: failed to create directory %s\n", node.path.c_str());
     return false;
 }
 
 bool ExtractFile(ArchiveStorageReader& reader, const Node& node, const OutputFolder& output,
                  dynamic_array<UInt8>& buffer) {
-    if (!output.Accepts(node.path)) {
+    core::string path(kMemLabelGeneral);
+    if (!output.Resolve(node.path, &path)) {
         printf_console("ERROR: failed to create file %s\n", node.path.c_str());
         return false;
     }
     bool isOk = true;
     const core::string parent(DeleteLastPathNameComponent(node.path), kMemLabelGeneral);
-    if (!CreateDirectoryRecursive(output.Join(parent))) {
+    core::string parentPath(kMemLabelGeneral);
+    if (!output.Resolve(parent, &parentPath) || !CreateDirectoryRecursive(parentPath)) {
         printf_console("ERROR: failed to create directory %s\n", parent.c_str());
         isOk = false;
     }
     FileAccessor file;
-    if (!file.Open(output.Join(node.path).c_str(), kFilePermissionWrite)) {
+    if (!file.Open(path.c_str(), kFilePermissionWrite)) {
         printf_console("ERROR: failed to create file %s\n", node.path.c_str());
         return false;
     }
@@ -140,15 +146,17 @@ bool ExtractArchive(const char* archivePath) {
     PrintHeader(reader.GetHeader());
 
     dynamic_array<UInt8> buffer(kMemLabelGeneral);
-    buffer.resize_uninitialized(kTransferSize, kResizeExact);
-    if (!PullDirectory(reader, buffer)) {
+    if (!buffer.resize_uninitialized(kTransferSize, kResizeExact) || !PullDirectory(reader, buffer)) {
         printf_console("ERROR: failed to parse files information\n");
         return false;
     }
 
     printf_console("  creating folder '%s_data'\n", archivePath);
     const OutputFolder output(archivePath);
-    bool isAllOk = true;
+    bool isAllOk = output.Create();
+    // Every entry says so, too; without entries somebody has to.
+    if (!isAllOk && reader.GetDirectoryInfo().nodes.empty())
+        printf_console("ERROR: failed to create directory %s_data\n", archivePath);
     for (size_t index = 0; index < reader.GetDirectoryInfo().nodes.size(); ++index) {
         const Node& node = reader.GetDirectoryInfo().nodes[index];
         const bool isFolder = (node.flags & ArchiveStorageHeader::kNodeDirectory) != 0;

@@ -23,19 +23,17 @@ void* dynamic_array_data::reserve(size_t capacity, size_t elementSize, size_t al
     if (!owns_data()) {
         if (capacity != 0)
             buffer = malloc_internal(byteCount, alignment, label, kAllocateOptionNone, __FILE__, __LINE__);
-        // An array that was refused memory has a size and no elements.
-        if (const size_t kept = std::min(size, capacity); buffer != nullptr && data != nullptr && kept != 0)
+        if (const size_t kept = std::min(size, capacity); buffer != nullptr && kept != 0)
             memcpy(buffer, data, kept * elementSize);
     } else {
         if (static_cast<SInt64>(capacity) < 0)
             ReportFailedCheck(Format("Dynamic array capacity overflow: 0x%llx", UInt64{capacity}).c_str());
         buffer = realloc_internal(data, byteCount, alignment, label, kAllocateOptionNone, __FILE__, __LINE__);
-        // Refused, the old buffer is still there, but nobody would find it again.
-        if (buffer == nullptr && byteCount != 0) free_buffer();
     }
+    // Refused: the old buffer is still there, and stays.
+    if (buffer == nullptr && byteCount != 0) return data;
     data = buffer;
-    // Without memory there is no capacity, so that a later and smaller request is tried afresh.
-    capacityWord = buffer == nullptr && byteCount != 0 ? kNotOwned : capacity * 2;
+    capacityWord = capacity * 2;
     return buffer;
 }
 

@@ -6,8 +6,9 @@
 //   auto window = dynamic_array<UInt8>::wrap(destination, 0, room, kMemLabelFileSystem);
 //
 // Growth moves elements byte by byte without calling anything of theirs, so an element must hold no pointer to itself
-// (core::string does not). Elements that can be constructed from a MemLabelId get the array's label. Memory that is
-// refused leaves data() null: whoever sizes an array by a number from outside tests it.
+// (core::string does not). Elements that can be constructed from a MemLabelId get the array's label. When memory is
+// refused the array stays as it was: whoever sizes one by a number from outside looks at the answer. Adding single
+// elements has no answer, and needs the memory.
 // An array belongs to one thread at a time.
 #pragma once
 
@@ -81,6 +82,7 @@ public:
     dynamic_array(const dynamic_array& other) : dynamic_array(other.m_Array.label) {
         if (other.size() == 0) return;
         resize_buffer_nocheck(other.size(), kResizeExact);
+        if (capacity() < other.size()) return; // refused: the copy stays empty
         if constexpr (std::is_trivially_copyable_v<T>) {
             memcpy(m_Array.data, other.m_Array.data, other.size() * sizeof(T));
         } else {
@@ -145,21 +147,25 @@ public:
         --m_Array.size;
     }
 
-    // Added elements are value-initialised.
-    void resize_initialized(size_t size, ResizePolicy policy = kResizeDouble) {
+    // Added elements are value-initialised. False, and nothing has changed, when memory is refused.
+    bool resize_initialized(size_t size, ResizePolicy policy = kResizeDouble) {
         const size_t oldSize = m_Array.size;
         if (size > capacity()) resize_buffer_nocheck(size, policy);
+        if (size > capacity()) return false;
         m_Array.size = size;
         destroy(size, oldSize);
         for (size_t i = oldSize; i < size; ++i)
             construct(data() + i);
+        return true;
     }
 
-    // Added elements hold whatever the memory held.
-    void resize_uninitialized(size_t size, ResizePolicy policy = kResizeDouble) {
+    // The same, but added elements hold whatever the memory held.
+    bool resize_uninitialized(size_t size, ResizePolicy policy = kResizeDouble) {
         static_assert(std::is_trivially_copyable_v<T> && std::is_trivially_destructible_v<T>);
         if (size > capacity()) resize_buffer_nocheck(size, policy);
+        if (size > capacity()) return false;
         m_Array.size = size;
+        return true;
     }
 
     // Changes the capacity whatever the size is; a capacity below the size is the caller's fault.

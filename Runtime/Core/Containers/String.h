@@ -73,6 +73,7 @@ public:
     operator ref() const { return ref(data(), size()); }
 
     // Room for count characters, exactly that if the buffer has to change; returns where the text is written.
+    // Null, and nothing has changed, when memory is refused.
     T* grow(size_t count) { return m_Storage.grow(count); }
     void reserve(size_t count) { m_Storage.grow(count); }
 

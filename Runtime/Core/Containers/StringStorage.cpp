@@ -12,6 +12,7 @@ T* StringStorageDefault<T>::grow(size_t count) {
     if (is_heap()) {
         T* buffer = static_cast<T*>(realloc_internal(load<T*>(kPointerOffset), count + 1, kBufferAlignment, m_Label,
                                                      kAllocateOptionNone, __FILE__, __LINE__));
+        if (buffer == nullptr) return nullptr;
         store(kPointerOffset, buffer);
         store(kCapacityOffset, count);
         return buffer;
@@ -27,6 +28,7 @@ T* StringStorageDefault<T>::grow(size_t count) {
     }
     T* buffer =
         static_cast<T*>(malloc_internal(count + 1, kBufferAlignment, m_Label, kAllocateOptionNone, __FILE__, __LINE__));
+    if (buffer == nullptr) return nullptr;
     memcpy(buffer, text, textSize);
     buffer[textSize] = T{};
     store_words(buffer, count, textSize);
@@ -44,6 +46,7 @@ void StringStorageDefault<T>::append(const T* text, size_t count) {
         const bool isOwnText = is_own_text(text);
         const size_t offset = isOwnText ? static_cast<size_t>(text - data()) : 0;
         buffer = grow(std::max(newSize, is_inline() ? kFirstSpillCapacity : 2 * capacity()));
+        if (buffer == nullptr) return;
         if (isOwnText) text = buffer + offset;
     }
     memmove(buffer + oldSize, text, count);
@@ -62,6 +65,7 @@ void StringStorageDefault<T>::assign(const T* text, size_t count) {
         set_size_and_terminate(0); // growing then need not keep the old text
     }
     T* buffer = grow(count);
+    if (buffer == nullptr) return;
     if (count != 0) memcpy(buffer, text, count);
     set_size_and_terminate(count);
 }
@@ -98,6 +102,7 @@ void StringStorageDefault<T>::resize(size_t count) {
         return;
     }
     T* buffer = grow(count);
+    if (buffer == nullptr) return;
     if (count > oldSize) memset(buffer + oldSize, 0, count - oldSize);
     set_size_and_terminate(count);
 }

@@ -20,8 +20,12 @@ template <typename T>
 }
 
 // Reads a string up to its NUL, or to the end of the file once there is a character, and leaves the position just past
-// what was read. Any length.
+// what was read. Any length. A read that fails behind the first characters counts as the end of the file.
 [[nodiscard]] bool ReadString(FileAccessor& file, core::string* out);
+
+// Reads a node's path by way of scratch, which is used for one path after another: *path then takes no more memory than
+// it needs, and none when it is short.
+[[nodiscard]] bool ReadPath(FileAccessor& file, core::string* scratch, core::string* path);
 
 // Moves past size bytes that nothing here uses. They must be there.
 [[nodiscard]] bool SkipBytes(FileAccessor& file, size_t size);

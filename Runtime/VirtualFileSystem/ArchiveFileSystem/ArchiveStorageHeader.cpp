@@ -32,7 +32,7 @@ bool ReadBytes(FileAccessor& file, void* buffer, size_t size) {
 
 bool ReadString(FileAccessor& file, core::string* out) {
     out->clear();
-    if (out->capacity() <= kStringPieceSize) out->grow(kStringPieceSize);
+    if (out->capacity() <= kStringPieceSize && out->grow(kStringPieceSize) == nullptr) return false;
     const UInt64 start = file.Position().Cast<UInt64>();
     char piece[kStringPieceSize];
     size_t terminatorLength = 0;
@@ -40,17 +40,24 @@ bool ReadString(FileAccessor& file, core::string* out) {
         UInt64 actual = 0;
         if (!file.Read(sizeof(piece), piece, &actual) || actual == 0) {
             if (out->empty()) return false;
-            break;
+            break; // a failed read ends the text as the file's end does: what is read next fails, too
         }
-        const char* terminator = static_cast<const char*>(memchr(piece, '\0', static_cast<size_t>(actual)));
+        const size_t count = static_cast<size_t>(actual);
+        const void* terminator = memchr(piece, '\0', count);
         const size_t length =
-            terminator != nullptr ? static_cast<size_t>(terminator - piece) : static_cast<size_t>(actual);
+            terminator != nullptr ? static_cast<size_t>(static_cast<const char*>(terminator) - piece) : count;
         if (terminator != nullptr) terminatorLength = 1;
         while (out->size() + length > out->capacity())
-            out->grow(2 * (out->capacity() + 1));
+            if (out->grow(2 * (out->capacity() + 1)) == nullptr) return false;
         out->append(piece, length);
     }
     return file.Seek(VFS::FileOffset(VFS::FileSize(start + out->size() + terminatorLength)), kFileOriginBegin);
+}
+
+bool ReadPath(FileAccessor& file, core::string* scratch, core::string* path) {
+    if (!ReadString(file, scratch)) return false;
+    *path = *scratch;
+    return path->size() == scratch->size();
 }
 
 bool SkipBytes(FileAccessor& file, size_t size) {
@@ -97,8 +104,8 @@ HeaderResult ReadHeaderSignature(FileAccessor& file, Header& header) {
     return file.Seek(afterSignature, kFileOriginBegin) ? kHeaderOk : kHeaderNotAnArchive;
 }
 
-// Offset           Size    Field
-// 0                8       signature (9 for "ZarvoWeb")
+// Offset           Size    Field (under the ZarvoWeb signature, offsets from 8 on are one more)
+// 0                8       signature
 // 8                4       version
 // 12               Lv + 1  engineVersion
 // 13 + Lv          Lr + 1  engineRevision
@@ -166,7 +173,7 @@ HeaderResult ReadBlocksInfo(FileAccessor& file, const Header&, BlocksInfo& block
     UInt32 count = 0;
     if (!ReadBigEndian(file, &count)) return kHeaderShortRead;
     if (!CanHoldEntries(file, count, kStoredBlockSize)) return kHeaderShortRead;
-    blocks.storageBlocks.resize_initialized(count, kResizeExact);
+    if (!blocks.storageBlocks.resize_initialized(count, kResizeExact)) return kHeaderShortRead;
     for (StorageBlock& block : blocks.storageBlocks) {
         if (!ReadBigEndian(file, &block.uncompressedSize)) return kHeaderShortRead;
         if (!ReadBigEndian(file, &block.compressedSize)) return kHeaderShortRead;
@@ -182,12 +189,13 @@ HeaderResult ReadBlocksInfo(FileAccessor& file, const Header&, BlocksInfo& block
 // 20          variable  path
 HeaderResult ReadNodes(FileAccessor& file, UInt32 count, DirectoryInfo& directory) {
     if (!CanHoldEntries(file, count, kStoredNodeMinSize)) return kHeaderShortRead;
-    directory.nodes.resize_initialized(count, kResizeExact);
+    if (!directory.nodes.resize_initialized(count, kResizeExact)) return kHeaderShortRead;
+    core::string path(kMemLabelGeneral);
     for (Node& node : directory.nodes) {
         if (!ReadBigEndian(file, &node.offset)) return kHeaderShortRead;
         if (!ReadBigEndian(file, &node.size)) return kHeaderShortRead;
         if (!ReadBigEndian(file, &node.flags)) return kHeaderShortRead;
-        if (!ReadString(file, &node.path)) return kHeaderShortRead;
+        if (!ReadPath(file, &path, &node.path)) return kHeaderShortRead;
     }
     return kHeaderOk;
 }

@@ -54,7 +54,7 @@ HeaderResult ReadHeaderAndBlocksInfo_ZarvoWebAndZarvoRaw(FileAccessor& file, Hea
 
     header.compressedBlocksInfoSize = header.uncompressedBlocksInfoSize;
     header.flags = 0;
-    blocks.storageBlocks.resize_initialized(1, kResizeExact);
+    if (!blocks.storageBlocks.resize_initialized(1, kResizeExact)) return kHeaderShortRead;
     StorageBlock& block = blocks.storageBlocks[0];
     block.uncompressedSize = uncompressedSize;
     block.compressedSize = compressedSize;
@@ -79,11 +79,12 @@ HeaderResult ReadDirectoryInfo_ZarvoWebAndZarvoRaw(FileAccessor& file, const Hea
     UInt32 count = 0;
     if (!ReadBigEndian(file, &count)) return kHeaderShortRead;
     if (!CanHoldEntries(file, count, kStoredLegacyNodeMinSize)) return kHeaderShortRead;
-    directory.nodes.resize_initialized(count, kResizeExact);
+    if (!directory.nodes.resize_initialized(count, kResizeExact)) return kHeaderShortRead;
+    core::string path(kMemLabelGeneral);
     for (Node& node : directory.nodes) {
         UInt32 offset = 0;
         UInt32 size = 0;
-        if (!ReadString(file, &node.path)) return kHeaderShortRead;
+        if (!ReadPath(file, &path, &node.path)) return kHeaderShortRead;
         if (!ReadBigEndian(file, &offset)) return kHeaderShortRead;
         if (!ReadBigEndian(file, &size)) return kHeaderShortRead;
         node.offset = offset;
@@ -102,7 +103,7 @@ static UInt32 GetBlockSize(UInt64 start, UInt64 end) { return VFS::FileSize(end 
 // 16 x (B + 1)    running stored position P 8, CompressionType 4, streamed word 4 (bit 0 counts)
 static HeaderResult ReadRunningPositions(FileAccessor& file, UInt32 count, BlocksInfo& blocks) {
     if (!CanHoldEntries(file, UInt64{count} + 1, kStoredRunningPositionsSize)) return kHeaderShortRead;
-    blocks.storageBlocks.resize_initialized(count, kResizeExact);
+    if (!blocks.storageBlocks.resize_initialized(count, kResizeExact)) return kHeaderShortRead;
 
     UInt64 previous = 0;
     if (!ReadBigEndian(file, &previous)) return kHeaderShortRead;
@@ -113,7 +114,7 @@ static HeaderResult ReadRunningPositions(FileAccessor& file, UInt32 count, Block
         previous = position;
     }
 
-    for (UInt32 index = 0; index <= count; ++index) {
+    for (UInt64 index = 0; index <= count; ++index) {
         UInt64 position = 0;
         UInt32 type = 0;
         UInt32 streamed = 0;

@@ -14,10 +14,6 @@ static_assert(kHeaderShortRead == 1 && kHeaderNotAnArchive == -1, "the reader pa
 
 constexpr UInt64 kMaxFilePosition = ~UInt64{0} >> 1;
 
-// The legacy size field that follows the LZMA properties.
-constexpr UInt32 kLzmaSizeFieldSize = 8;
-constexpr UInt32 kMinSizeWithLzmaSizeField = 9;
-
 ArchiveStorageReader::ArchiveStorageReader(MemLabelId memLabel)
     : ThreadSharedObject(memLabel),
       m_Header(memLabel),
@@ -57,7 +53,8 @@ int ArchiveStorageReader::Initialize(FileSystemEntry& entry, VFS::FileSize offse
     m_ReleaseStorageWhenUnused = canReleaseStorage;
     if (!MakeStorageUsed(reportErrors)) return kHeaderNotAnArchive;
 
-    const int result = ReadHeader(offset.Cast<UInt64>());
+    int result = ReadHeader(offset.Cast<UInt64>());
+    if (result == kHeaderOk && !BuildOffsetTables()) result = kHeaderShortRead;
     if (result != kHeaderOk) {
         if (result == kHeaderNotAnArchive && reportErrors)
             ReportError(Format("Unable to read header from archive file: %s", entry.Path()).c_str());
@@ -69,14 +66,13 @@ int ArchiveStorageReader::Initialize(FileSystemEntry& entry, VFS::FileSize offse
         ReportFailedCheck(Format("Unexpected FileSystemError code %i after call to FileSystemEntry::LastModified() \n",
                                  static_cast<int>(timeError))
                               .c_str());
-    BuildOffsetTables();
     return kHeaderOk;
 }
 
-void ArchiveStorageReader::BuildOffsetTables() {
+bool ArchiveStorageReader::BuildOffsetTables() {
     const size_t count = m_BlocksInfo.storageBlocks.size();
-    m_UncompressedBlocksOffsets.resize_uninitialized(count + 1, kResizeExact);
-    m_CompressedBlocksOffsets.resize_uninitialized(count + 1, kResizeExact);
+    if (!m_UncompressedBlocksOffsets.resize_uninitialized(count + 1, kResizeExact)) return false;
+    if (!m_CompressedBlocksOffsets.resize_uninitialized(count + 1, kResizeExact)) return false;
     m_UncompressedBlocksOffsets[0] = 0;
     m_CompressedBlocksOffsets[0] = 0;
     for (size_t index = 0; index < count; ++index) {
@@ -84,6 +80,7 @@ void ArchiveStorageReader::BuildOffsetTables() {
         m_UncompressedBlocksOffsets[index + 1] = m_UncompressedBlocksOffsets[index] + block.uncompressedSize;
         m_CompressedBlocksOffsets[index + 1] = m_CompressedBlocksOffsets[index] + block.compressedSize;
     }
+    return true;
 }
 
 int ArchiveStorageReader::ReadHeader(UInt64 offset) {
@@ -109,7 +106,8 @@ int ArchiveStorageReader::ReadHeader(UInt64 offset) {
 
     if (m_Header.signature == kSignatureWeb && !m_BlocksInfo.storageBlocks.empty()) {
         UInt32& compressedSize = m_BlocksInfo.storageBlocks[0].compressedSize;
-        if (compressedSize >= kMinSizeWithLzmaSizeField) {
+        // The field is there only where there is more than the field itself.
+        if (compressedSize > kLzmaSizeFieldSize) {
             m_HideLzmaSizeField = true;
             compressedSize -= kLzmaSizeFieldSize;
         }
@@ -262,7 +260,7 @@ void ArchiveStorageReader::TryToReadDirectoryFromBlockData(UInt64 from, const vo
         MemoryFile file(kMemLabelGeneral, contents, kFilePermissionRead);
         contents->Release();
         m_DirectoryReady = TryReadDirectoryInfoFromFile(&file);
-        if (m_DirectoryReady) return;
+        return;
     }
 
     if (m_DirectoryFile == nullptr) {

@@ -12,6 +12,13 @@
 // While IsDirectoryReady is false (a ZarvoWeb archive keeps its directory inside the compressed data), reads are made
 // by one thread, from the start of the stream in order, until it is true. The object is shared by reference count.
 //
+// States by operations (n: calls of MakeStorageUsed less those of MakeStorageUnused; Initialize counts as one):
+//
+//            MakeStorageUsed           MakeStorageUnused                              Read
+//   n < 1    n + 1; at 0 opens         reported, n - 1                                fails at the file
+//   n = 1    n + 1                     n 0, closes the file, then empties the cache   delivers
+//   n > 1    n + 1                     n - 1                                          delivers
+//
 // Locks: m_StorageLock guards the open file, m_CacheLock the list of cached blocks. No operation holds both, neither is
 // held while data is decompressed, and m_CacheLock is never held while the file is read.
 #pragma once
@@ -45,7 +52,7 @@ public:
     // canReleaseStorage: whether MakeStorageUnused may close the file. reportErrors: whether a file that can't be
     // opened, has been changed or has an unreadable header is reported as an error.
     [[nodiscard]] int Initialize(FileSystemEntry& entry, VFS::FileSize offset, bool canReleaseStorage,
-                                 bool reportErrors);
+                                 bool reportErrors) VARNEX_NO_THREAD_SAFETY_ANALYSIS; // no other thread uses it yet
 
     // Brackets a time of use: the file is open while there are more calls of the first than of the second (Initialize
     // counts as one call of MakeStorageUsed). False when the file can't be opened or has been changed since Initialize;
@@ -66,8 +73,8 @@ public:
     // Whether GetDirectoryInfo holds the archive's directory.
     bool IsDirectoryReady() const { return m_DirectoryReady.load(std::memory_order_acquire); }
 
-    // False once what has been read shows that the stream holds no directory: reading on is then of no use. By the
-    // thread that makes the reads.
+    // False once what has been read shows that the stream holds no directory: reading on is then of no use. Once
+    // Initialize has returned 0; by the thread that makes the reads.
     bool CanDirectoryBecomeReady() const;
 
 private:
@@ -75,15 +82,21 @@ private:
 
     // Decompressed data of one block: the whole of a chunk block, or a window of a streamed one.
     //
-    // State                beingWritten  bufferReaders  what may happen
-    // idle                 0             0              shared (chunk), owned (streamed), claimed as a victim
-    // claimed for filling  1             1              filled: shared or owned; failed: idle with no block
-    // shared (chunk)       0             n > 0          more readers join, the last that leaves makes it idle
-    // owned (streamed)     1             1              its owner copies and moves the window; then idle
-    // a chunk's waiters    1             n > 1          join while it is filled, and wait for the filler
+    // States by operations (w: beingWritten, r: bufferReaders):
     //
-    // A record with readers is never pointed at another block; only its filler (or owner), whose fill has failed,
-    // makes it name none.
+    //                       acquire of its block    victim scan     release or end of fill      EmptyCache
+    //   idle     w 0, r 0   chunk: r 1, shared      w 1, r 1,       (not held)                  freed
+    //                       streamed: w 1, r 1,     filling another
+    //                       owned                   block
+    //   filling  w 1, r 1   chunk: r + 1, then      skipped         filled: owned, or a chunk   kept
+    //                       waits for w 0                           w 0, shared; failed: names
+    //                       streamed: skipped                       no block, r - 1, w 0
+    //   shared   w 0, r n   r + 1                   given back      r - 1                       kept
+    //   owned    w 1, r 1   skipped                 skipped         r 0, w 0                    kept
+    //
+    // Acquiring, scanning, naming a block or none, and stamps are done under m_CacheLock; the rest of a record is its
+    // filler's (or owner's), and once it is shared only read. A record with readers is never pointed at another block;
+    // only its filler (or owner), whose fill has failed, makes it name none. Those who waited for it see that.
     struct CachedBlock {
         explicit CachedBlock(MemLabelId label) : buffer(label), compressedBuffer(label) {}
 
@@ -126,21 +139,26 @@ private:
     static constexpr UInt32 kNoBlock = ~UInt32{0};
     static constexpr UInt32 kStreamWindowSize = 65'536; // of output, and of the input pieces that it is made from
     static constexpr UInt64 kBatchSize = 4'194'304;
+    static constexpr UInt32 kLzmaPropertiesSize = 5;
+    static constexpr UInt32 kLzmaSizeFieldSize = 8; // behind the properties, in ZarvoWeb archives
+    static constexpr UInt64 kNotBroken = ~UInt64{0};
 
     // Set-up, in ArchiveStorageReader.cpp. Runs while no other thread uses the reader, so it takes no lock.
     int ReadHeader(UInt64 offset) VARNEX_NO_THREAD_SAFETY_ANALYSIS;
     int ReadBlockBasedHeader(UInt64 offset) VARNEX_NO_THREAD_SAFETY_ANALYSIS;
     int ReadCompressedBlocksInfo(CompressionType type) VARNEX_NO_THREAD_SAFETY_ANALYSIS;
     int ReadBlocksInfoSection(FileAccessor& file);
-    void BuildOffsetTables();
+    [[nodiscard]] bool BuildOffsetTables();
     void TryToReadDirectoryFromBlockData(UInt64 from, const void* data, size_t size);
     bool TryReadDirectoryInfoFromFile(IFile* file);
 
     // The block cache, in ArchiveStorageReaderCache.cpp.
     CachedBlock* AcquireCachedBlock(UInt32 blockIndex, UInt32 offsetInBlock);
     CachedBlock* AcquireAndPrefillUnusedBlock(UInt32 blockIndex, CacheResult* result, BatchingFileReader* reader);
+    CachedBlock* FindChunk(UInt32 blockIndex) VARNEX_REQUIRES(m_CacheLock);
+    CachedBlock* ClaimStream(UInt32 blockIndex, UInt32 offsetInBlock) VARNEX_REQUIRES(m_CacheLock);
     CachedBlock* ClaimVictim() VARNEX_REQUIRES(m_CacheLock);
-    void InvalidateCachedBlock(CachedBlock* block);
+    CachedBlock* AddCachedBlock() VARNEX_REQUIRES(m_CacheLock);
     void ReleaseCachedBlock(CachedBlock* block, bool isStreamed);
     void ReinitCachedBlock(CachedBlock* block, UInt32 blockIndex);
     void DeinitCachedBlock(CachedBlock* block);
@@ -148,6 +166,8 @@ private:
     CacheResult FillChunkCachedBlock(CachedBlock* block, BatchingFileReader* reader);
     void StampCachedBlock(CachedBlock* block);
     void EmptyCache();
+    void NoteBrokenBlock(UInt32 blockIndex, UInt64 brokenFrom);
+    UInt64 GetBrokenFrom(UInt32 blockIndex);
     IDecompressor* GetDecompressor(CompressionType type);
     CompressionType GetBlockType(UInt32 blockIndex) const;
     bool IsBlockStreamed(UInt32 blockIndex) const;
@@ -160,6 +180,7 @@ private:
     CacheResult CopyFromCachedBlock(CachedBlock* record, UInt64 offsetInBlock, UInt64 size, void* destination,
                                     UInt64* delivered, BatchingFileReader* batch);
     bool ReadFromStorage(UInt64 position, UInt64 size, void* destination, UInt64* delivered);
+    bool IsBehindStorageEnd(UInt64 position);
 
     ArchiveStorageHeader::Header m_Header;
     ArchiveStorageHeader::BlocksInfo m_BlocksInfo;
@@ -173,7 +194,7 @@ private:
     MemoryFile* m_DirectoryFile = nullptr; // owned; the start of the stream, until a directory can be parsed from it
     LegacyDirectoryScanner m_DirectoryScanner;
     std::atomic<bool> m_DirectoryReady{false};
-    FileSystemEntry m_FileEntry;
+    FileSystemEntry m_FileEntry VARNEX_GUARDED_BY(m_StorageLock); // queries of it leave a code in it
     FileAccessor m_File VARNEX_GUARDED_BY(m_StorageLock);
     bool m_ReleaseStorageWhenUnused = true;
     UInt64 m_DataOffset = 0; // in the file, of the first stored byte of block 0
@@ -186,6 +207,13 @@ private:
     bool m_CheckModificationTime = true;
     DateTime m_LastModified;
     dynamic_array<CachedBlock*> m_CachedBlocks VARNEX_GUARDED_BY(m_CacheLock);
+
+    // Blocks whose data is known to be damaged, so that not every file in them pays for finding out: for each block,
+    // the start of the first window that can't be decoded (in a stream, the whole size where only a decoding in one
+    // window has failed). Empty until a block has failed.
+    dynamic_array<UInt64> m_BrokenFrom VARNEX_GUARDED_BY(m_CacheLock);
+    std::atomic<bool> m_HasBrokenBlocks{false};
+
     Mutex m_CacheLock;
     std::atomic<UInt32> m_AccessCounter{0};
     std::atomic<IDecompressor*> m_Decompressors[kCompressionCount] = {}; // owned; made on first use

@@ -42,29 +42,37 @@ void ArchiveStorageReader::StampCachedBlock(CachedBlock* block) {
     block->lastAccess = m_AccessCounter.fetch_add(1, std::memory_order_relaxed);
 }
 
+ArchiveStorageReader::CachedBlock* ArchiveStorageReader::FindChunk(UInt32 blockIndex) {
+    for (CachedBlock* block : m_CachedBlocks)
+        if (block->blockIndex == blockIndex) return block;
+    return nullptr;
+}
+
+// The idle record of a streamed block from which the offset is reached soonest, claimed: the one whose window starts
+// last of those that start at or before it. The stream goes on from there.
+ArchiveStorageReader::CachedBlock* ArchiveStorageReader::ClaimStream(UInt32 blockIndex, UInt32 offsetInBlock) {
+    CachedBlock* nearest = nullptr;
+    for (CachedBlock* block : m_CachedBlocks) {
+        if (block->blockIndex != blockIndex || !TryToClaim(block->beingWritten)) continue;
+        if (block->blockOffset > offsetInBlock || (nearest != nullptr && block->blockOffset <= nearest->blockOffset)) {
+            block->beingWritten.exchange(0);
+            continue;
+        }
+        if (nearest != nullptr) nearest->beingWritten.exchange(0);
+        nearest = block;
+    }
+    return nearest;
+}
+
 ArchiveStorageReader::CachedBlock* ArchiveStorageReader::AcquireCachedBlock(UInt32 blockIndex, UInt32 offsetInBlock) {
     const bool isStreamed = IsBlockStreamed(blockIndex);
-    CachedBlock* found = nullptr;
     m_CacheLock.Lock();
-    for (CachedBlock* block : m_CachedBlocks) {
-        if (block->blockIndex != blockIndex) continue;
-        if (!isStreamed) {
-            found = block;
-            break;
-        }
-        if (!TryToClaim(block->beingWritten)) continue;
-        // In the window, or right behind it, where the stream goes on.
-        if (block->blockOffset <= offsetInBlock && offsetInBlock - block->blockOffset <= block->buffer.size()) {
-            Check(block->bufferReaders.load() == 0,
-                  "Assertion failed on expression: 'AtomicCompareExchange(&block->bufferReaders, 0, 0)'");
-            block->bufferReaders.fetch_add(1);
-            found = block;
-            break;
-        }
-        block->beingWritten.exchange(0);
-    }
-
-    if (found != nullptr && !isStreamed) {
+    CachedBlock* found = isStreamed ? ClaimStream(blockIndex, offsetInBlock) : FindChunk(blockIndex);
+    if (found != nullptr && isStreamed) {
+        Check(found->bufferReaders.load() == 0,
+              "Assertion failed on expression: 'AtomicCompareExchange(&block->bufferReaders, 0, 0)'");
+        found->bufferReaders.fetch_add(1);
+    } else if (found != nullptr) {
         // As a reader first: the record can't be pointed at another block while this thread waits for its filler.
         found->bufferReaders.fetch_add(1);
         m_CacheLock.Unlock();
@@ -103,35 +111,41 @@ ArchiveStorageReader::CachedBlock* ArchiveStorageReader::ClaimVictim() {
     return victim;
 }
 
+// A new record, claimed; null when memory is refused.
+ArchiveStorageReader::CachedBlock* ArchiveStorageReader::AddCachedBlock() {
+    if (m_CachedBlocks.size() == m_CachedBlocks.capacity()) m_CachedBlocks.grow();
+    if (m_CachedBlocks.size() == m_CachedBlocks.capacity()) return nullptr;
+    CachedBlock* block = New<CachedBlock>(m_Label, m_Label);
+    if (block == nullptr) return nullptr;
+    StampCachedBlock(block);
+    m_CachedBlocks.push_back(block);
+    return block;
+}
+
 ArchiveStorageReader::CachedBlock*
 ArchiveStorageReader::AcquireAndPrefillUnusedBlock(UInt32 blockIndex, CacheResult* result, BatchingFileReader* reader) {
     CachedBlock* record;
     {
         Mutex::AutoLock lock(m_CacheLock);
         record = ClaimVictim();
-        const bool isNew = record == nullptr;
-        if (isNew) {
-            record = New<CachedBlock>(m_Label, m_Label);
-            if (record == nullptr) {
-                if (result != nullptr) *result = kCacheResultDecompressError;
-                return nullptr;
-            }
-            StampCachedBlock(record);
+        if (record == nullptr) record = AddCachedBlock();
+        if (record == nullptr) {
+            *result = kCacheResultDecompressError;
+            return nullptr;
         }
         ReinitCachedBlock(record, blockIndex);
-        if (isNew) m_CachedBlocks.push_back(record);
         Check(record->beingWritten.load() == 1, "ArchiveStorage block must be marked as being written!");
         Check(record->bufferReaders.load() == 0, "ArchiveStorage block must have no readers before write!");
         record->bufferReaders.exchange(1);
     }
 
     const bool isStreamed = IsBlockStreamed(blockIndex);
-    const CacheResult filled =
+    *result =
         isStreamed ? FillStreamCachedBlock(record, kStreamWindowSize, reader) : FillChunkCachedBlock(record, reader);
-    if (result != nullptr) *result = filled;
-
-    if (isStreamed ? filled < kCacheResultOk : filled != kCacheResultOk) {
-        InvalidateCachedBlock(record);
+    if (isStreamed ? *result < kCacheResultOk : *result != kCacheResultOk) {
+        // A half-filled record must not be taken for data of its block: readers that wait see that it names none.
+        Mutex::AutoLock lock(m_CacheLock);
+        ReinitCachedBlock(record, kNoBlock);
         record->bufferReaders.fetch_sub(1);
         record->beingWritten.exchange(0);
         return nullptr;
@@ -141,13 +155,6 @@ ArchiveStorageReader::AcquireAndPrefillUnusedBlock(UInt32 blockIndex, CacheResul
         record->beingWritten.exchange(0);
     }
     return record;
-}
-
-// After a failed fill, by its filler: a half-filled record must not be taken for data of its block, and a stream that
-// has failed must not be gone on with. Readers that wait for the record see that it names no block.
-void ArchiveStorageReader::InvalidateCachedBlock(CachedBlock* block) {
-    Mutex::AutoLock lock(m_CacheLock);
-    ReinitCachedBlock(block, kNoBlock);
 }
 
 // Ends the use that one of the two acquire operations began.
@@ -206,6 +213,24 @@ void ArchiveStorageReader::EmptyCache() {
     m_CachedBlocks.resize_initialized(kept);
 }
 
+// Remembers that a block's data can't be decoded from some place on. Only what would fail in the same way, and as
+// silently, every time is noted.
+void ArchiveStorageReader::NoteBrokenBlock(UInt32 blockIndex, UInt64 brokenFrom) {
+    Mutex::AutoLock lock(m_CacheLock);
+    if (m_BrokenFrom.empty()) {
+        if (!m_BrokenFrom.resize_uninitialized(m_BlocksInfo.storageBlocks.size(), kResizeExact)) return;
+        std::fill(m_BrokenFrom.begin(), m_BrokenFrom.end(), kNotBroken);
+        m_HasBrokenBlocks = true;
+    }
+    m_BrokenFrom[blockIndex] = std::min(m_BrokenFrom[blockIndex], brokenFrom);
+}
+
+UInt64 ArchiveStorageReader::GetBrokenFrom(UInt32 blockIndex) {
+    if (!m_HasBrokenBlocks) return kNotBroken;
+    Mutex::AutoLock lock(m_CacheLock);
+    return m_BrokenFrom[blockIndex];
+}
+
 // Produces the next window of a streamed block: up to maxSize bytes that follow the window before.
 ArchiveStorageReader::CacheResult ArchiveStorageReader::FillStreamCachedBlock(CachedBlock* block, UInt64 maxSize,
                                                                               BatchingFileReader* reader) {
@@ -216,11 +241,12 @@ ArchiveStorageReader::CacheResult ArchiveStorageReader::FillStreamCachedBlock(Ca
 
     block->blockOffset += static_cast<UInt32>(block->buffer.size());
     const size_t want = static_cast<size_t>(std::min<UInt64>(stored.uncompressedSize - block->blockOffset, maxSize));
-    block->buffer.resize_uninitialized(want, kResizeExact);
-    if (block->buffer.data() == nullptr && want != 0) {
+    if (!block->buffer.resize_uninitialized(want, kResizeExact)) {
         block->buffer.clear();
         return kCacheResultDecompressError;
     }
+    // A whole block that fails in one window says nothing of where.
+    const UInt64 brokenFrom = maxSize <= kStreamWindowSize ? block->blockOffset : stored.uncompressedSize;
     const bool reachesBlockEnd = block->blockOffset + UInt64{want} == stored.uncompressedSize;
 
     size_t produced = 0;
@@ -229,13 +255,13 @@ ArchiveStorageReader::CacheResult ArchiveStorageReader::FillStreamCachedBlock(Ca
         if (block->compressedPos >= block->compressedBuffer.size()) {
             const UInt32 piece = std::min(stored.compressedSize - block->compressedLoaded, kStreamWindowSize);
             block->compressedPos = 0;
-            block->compressedBuffer.resize_uninitialized(piece, kResizeExact);
+            const bool hasRoom = block->compressedBuffer.resize_uninitialized(piece, kResizeExact);
             if (piece != 0) {
+                const UInt64 position = storedStart + block->compressedLoaded;
                 UInt64 delivered = 0;
-                if (block->compressedBuffer.data() == nullptr ||
-                    !reader->Read(block->compressedBuffer.data(), storedStart + block->compressedLoaded, piece,
-                                  &delivered)) {
+                if (!hasRoom || !reader->Read(block->compressedBuffer.data(), position, piece, &delivered)) {
                     block->compressedBuffer.clear();
+                    if (IsBehindStorageEnd(position)) NoteBrokenBlock(block->blockIndex, brokenFrom);
                     result = kCacheResultReadError;
                     break;
                 }
@@ -256,6 +282,7 @@ ArchiveStorageReader::CacheResult ArchiveStorageReader::FillStreamCachedBlock(Ca
         size_t room = want - produced;
         if (!decompressor->DecompressStream(block->streamState, source, &available, block->buffer.data() + produced,
                                             &room, isAllLoaded && reachesBlockEnd)) {
+            if (block->streamState != nullptr) NoteBrokenBlock(block->blockIndex, brokenFrom);
             result = kCacheResultDecompressError;
             break;
         }
@@ -282,11 +309,9 @@ ArchiveStorageReader::CacheResult ArchiveStorageReader::FillChunkCachedBlock(Cac
 
     const bool isStoredAsIs = stored.compressedSize == stored.uncompressedSize;
     dynamic_array<UInt8>& loaded = isStoredAsIs ? block->buffer : block->compressedBuffer;
-    block->buffer.resize_uninitialized(stored.uncompressedSize, kResizeExact);
-    loaded.resize_uninitialized(stored.compressedSize, kResizeExact);
-    const bool hasMemory = (block->buffer.data() != nullptr || stored.uncompressedSize == 0) &&
-                           (loaded.data() != nullptr || stored.compressedSize == 0);
-    if (!hasMemory) return kCacheResultDecompressError;
+    if (!block->buffer.resize_uninitialized(stored.uncompressedSize, kResizeExact) ||
+        !loaded.resize_uninitialized(stored.compressedSize, kResizeExact))
+        return kCacheResultDecompressError;
 
     UInt64 delivered = 0;
     if (!reader->Read(loaded.data(), storedStart, stored.compressedSize, &delivered)) return kCacheResultReadError;
@@ -295,8 +320,12 @@ ArchiveStorageReader::CacheResult ArchiveStorageReader::FillChunkCachedBlock(Cac
         size_t consumed = stored.compressedSize;
         size_t produced = stored.uncompressedSize;
         if (!decompressor->DecompressMemory(loaded.data(), &consumed, block->buffer.data(), &produced) ||
-            produced != stored.uncompressedSize)
+            produced != stored.uncompressedSize) {
+            // Sizes that LZ4 does not take are reported each time.
+            if (std::max(stored.uncompressedSize, stored.compressedSize) < 0x7FFFFFFF)
+                NoteBrokenBlock(block->blockIndex, 0);
             return kCacheResultDecompressError;
+        }
     }
     block->blockOffset = 0;
     return kCacheResultOk;

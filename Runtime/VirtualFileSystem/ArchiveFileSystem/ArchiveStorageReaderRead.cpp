@@ -8,9 +8,6 @@
 
 using namespace ArchiveStorageHeader;
 
-constexpr UInt64 kLzmaPropertiesSize = 5;
-constexpr UInt64 kHiddenLzmaSizeFieldSize = 8;
-
 // The block that holds a position of the stream; false when the position lies behind the stream's end.
 bool ArchiveStorageReader::FindBlock(UInt64 position, UInt32* blockIndex) const {
     if (position >= m_UncompressedBlocksOffsets.back()) return false;
@@ -70,13 +67,14 @@ bool ArchiveStorageReader::ReadCompleteBlock(UInt32 blockIndex, void* destinatio
     if (GetBlockType(blockIndex) == kCompressionNone)
         return batch->Read(destination, m_CompressedBlocksOffsets[blockIndex], uncompressedSize, delivered);
 
+    if (GetBrokenFrom(blockIndex) != kNotBroken) return false;
     CachedBlock temporary(kMemLabelGeneral);
     temporary.buffer = dynamic_array<UInt8>::wrap(static_cast<UInt8*>(destination), uncompressedSize, uncompressedSize,
                                                   kMemLabelGeneral);
     ReinitCachedBlock(&temporary, blockIndex);
     const CacheResult result = IsBlockStreamed(blockIndex) ? FillStreamCachedBlock(&temporary, uncompressedSize, batch)
                                                            : FillChunkCachedBlock(&temporary, batch);
-    if (result == kCacheResultOk && delivered != nullptr) *delivered = uncompressedSize;
+    if (result == kCacheResultOk) *delivered = uncompressedSize;
     DeinitCachedBlock(&temporary);
     return result >= kCacheResultOk;
 }
@@ -87,6 +85,10 @@ bool ArchiveStorageReader::ReadBlock(UInt32 blockIndex, UInt64 offsetInBlock, UI
     if (GetBlockType(blockIndex) == kCompressionNone)
         return batch->Read(destination, m_CompressedBlocksOffsets[blockIndex] + offsetInBlock, size, delivered);
 
+    if (offsetInBlock >= GetBrokenFrom(blockIndex)) {
+        *delivered = 0;
+        return false;
+    }
     CacheResult result = kCacheResultOk;
     CachedBlock* record = AcquireCachedBlock(blockIndex, static_cast<UInt32>(offsetInBlock));
     if (record == nullptr) record = AcquireAndPrefillUnusedBlock(blockIndex, &result, batch);
@@ -95,8 +97,11 @@ bool ArchiveStorageReader::ReadBlock(UInt32 blockIndex, UInt64 offsetInBlock, UI
         return result >= kCacheResultOk;
     }
     result = CopyFromCachedBlock(record, offsetInBlock, size, destination, delivered, batch);
-    // A stream that has failed can't be gone on with: the next reader starts it anew.
-    if (result < kCacheResultOk) InvalidateCachedBlock(record);
+    if (result < kCacheResultOk) {
+        // A stream that has failed can't be gone on with: the next reader starts it anew.
+        Mutex::AutoLock lock(m_CacheLock);
+        ReinitCachedBlock(record, kNoBlock);
+    }
     ReleaseCachedBlock(record, IsBlockStreamed(blockIndex));
     return result >= kCacheResultOk;
 }
@@ -130,7 +135,7 @@ ArchiveStorageReader::CacheResult ArchiveStorageReader::CopyFromCachedBlock(Cach
             break;
         }
     }
-    if (delivered != nullptr) *delivered = copied;
+    *delivered = copied;
     return result;
 }
 
@@ -143,7 +148,7 @@ bool ArchiveStorageReader::ReadFromStorage(UInt64 position, UInt64 size, void* d
     Mutex::AutoLock lock(m_StorageLock);
     if (m_HideLzmaSizeField) {
         if (position < kLzmaPropertiesSize && size != 0) {
-            const UInt64 wanted = std::min(kLzmaPropertiesSize - position, size);
+            const UInt64 wanted = std::min<UInt64>(kLzmaPropertiesSize - position, size);
             if (!m_File.Read(VFS::FileSize(filePosition), wanted, to, &firstPart)) return false;
             to += firstPart;
             size -= firstPart;
@@ -154,12 +159,19 @@ bool ArchiveStorageReader::ReadFromStorage(UInt64 position, UInt64 size, void* d
                 return true;
             }
         }
-        filePosition += kHiddenLzmaSizeFieldSize;
+        filePosition += kLzmaSizeFieldSize;
     }
     UInt64 got = 0;
     const bool isRead = m_File.Read(VFS::FileSize(filePosition), size, to, &got);
     if (isRead) *delivered = firstPart + got;
     return isRead;
+}
+
+// Whether the file has no stored byte at or behind this position.
+bool ArchiveStorageReader::IsBehindStorageEnd(UInt64 position) {
+    if (m_HideLzmaSizeField && position >= kLzmaPropertiesSize) position += kLzmaSizeFieldSize;
+    Mutex::AutoLock lock(m_StorageLock);
+    return m_File.Seek(0, kFileOriginEnd) && m_File.Position() <= VFS::FileSize(m_DataOffset + position);
 }
 
 ArchiveStorageReader::BatchingFileReader::BatchingFileReader(ArchiveStorageReader* reader, UInt64 batchSize,
@@ -179,10 +191,9 @@ bool ArchiveStorageReader::BatchingFileReader::Read(void* destination, UInt64 po
     while (remaining != 0) {
         if (current >= m_LoadedWindowEnd) {
             const UInt64 length = std::min(m_BatchSize, m_EndPos - current);
-            m_Buffer.resize_uninitialized(static_cast<size_t>(length), kResizeExact);
+            if (!m_Buffer.resize_uninitialized(static_cast<size_t>(length), kResizeExact)) return false;
             UInt64 got = 0;
-            if (m_Buffer.data() == nullptr || !m_Reader->ReadFromStorage(current, length, m_Buffer.data(), &got))
-                return false;
+            if (!m_Reader->ReadFromStorage(current, length, m_Buffer.data(), &got)) return false;
             m_LoadedWindowStart = current;
             m_LoadedWindowEnd = current + got;
             if (got < remaining && got < length) remaining = got; // the file has ended

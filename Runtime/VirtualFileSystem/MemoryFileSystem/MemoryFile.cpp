@@ -4,23 +4,7 @@
 #include "Runtime/VirtualFileSystem/MemoryFileSystem/MultiBlocksMemoryFileData.h"
 #include "Runtime/VirtualFileSystem/MemoryFileSystem/SingleBlockMemoryFileData.h"
 
-namespace {
-
-constexpr char kSourceName[] = "./Runtime/VirtualFileSystem/MemoryFileSystem/MemoryFile";
-
-constexpr UInt64 kUnreachable = ~UInt64{0};
-
-// The position that lies distance after base, or before it; kUnreachable where that is no position.
-UInt64 GetPositionAfter(UInt64 base, SInt64 distance) {
-    const UInt64 target = base + static_cast<UInt64>(distance);
-    return (distance < 0) == (target < base) ? target : kUnreachable;
-}
-UInt64 GetPositionBefore(UInt64 base, SInt64 distance) {
-    const UInt64 target = base - static_cast<UInt64>(distance);
-    return (distance > 0) == (target < base) ? target : kUnreachable;
-}
-
-} // namespace
+static constexpr char kSourceName[] = "./Runtime/VirtualFileSystem/MemoryFileSystem/MemoryFile";
 
 MemoryFile::MemoryFile(MemLabelId memLabel, MemoryFileData* contents, FilePermission filePermission)
     : data(contents), permission(filePermission), label(memLabel) {
@@ -85,14 +69,17 @@ bool MemoryFile::Write(UInt64 size, const void* in, UInt64* written) {
 bool MemoryFile::Seek(VFS::FileOffset offset, FileOrigin origin) {
     if (data == nullptr) return false;
     const UInt64 end = data->Size().Cast<UInt64>();
-    UInt64 target = kUnreachable;
-    if (origin == kFileOriginBegin)
+    UInt64 target = 0;
+    bool isPosition = false; // a sum that wraps is none
+    if (origin == kFileOriginBegin) {
         target = offset.Cast<UInt64>();
-    else if (origin == kFileOriginCurrent)
-        target = GetPositionAfter(position, offset.Cast<SInt64>());
-    else if (origin == kFileOriginEnd)
-        target = GetPositionBefore(end, offset.Cast<SInt64>());
-    if (target > end) return false;
+        isPosition = true;
+    } else if (origin == kFileOriginCurrent) {
+        isPosition = !__builtin_add_overflow(position, offset.Cast<SInt64>(), &target);
+    } else if (origin == kFileOriginEnd) {
+        isPosition = !__builtin_sub_overflow(end, offset.Cast<SInt64>(), &target);
+    }
+    if (!isPosition || target > end) return false;
     position = target;
     return true;
 }

@@ -3,7 +3,11 @@
 // that grows without copying).
 //
 // Reference counted: made with one reference, which is the maker's. Any thread; every operation holds the object's
-// lock. Lock keeps it until Unlock, so that one thread can work on the whole contents while the others wait.
+// lock. Lock keeps it until Unlock, so that one thread can work on the whole contents while the others wait:
+//
+//                          operation or Lock by the keeper    by another thread    Unlock by the keeper
+//   nobody keeps it        (no keeper)                        goes on              (not allowed)
+//   kept n times over      goes on; Lock: n + 1               waits                n - 1; at 0 the next one goes on
 #pragma once
 
 #include "Runtime/Core/Containers/DynamicArray.h"

@@ -36,8 +36,6 @@ public:
     MemoryFileData* Clone() const override;
 
 private:
-    friend struct MultiBlocksMemoryFileDataInspector; // tests look at the slots
-
     bool ReserveSlots(UInt64 lastSlot) VARNEX_REQUIRES(mutex);
     UInt8* GetFirstBlock() const VARNEX_REQUIRES(mutex) { return blocks.empty() ? nullptr : blocks[0]; }
     UInt8* GetOrMakeBlock(UInt64 slot) VARNEX_REQUIRES(mutex);

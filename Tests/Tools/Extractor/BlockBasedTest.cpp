@@ -1,7 +1,5 @@
 #include "Tests/Tools/Extractor/ExtractorTest.h"
 
-#include <algorithm>
-
 namespace {
 
 // Files of every size that matters, a folder with nothing in it, and one file deep in folders that no entry lists.

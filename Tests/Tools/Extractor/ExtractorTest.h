@@ -7,7 +7,6 @@
 #include "Tests/Support/RunVarnex.h"
 #include "Tests/Support/TemporaryFolder.h"
 
-#include <cerrno>
 #include <cstring>
 #include <gtest/gtest.h>
 #include <random>
@@ -42,12 +41,6 @@ inline std::string FolderRefused(const std::string& path, [[maybe_unused]] int e
     const std::string reason;
 #endif
     return "CreateDirectory '" + path + "' failed: " + reason + " (current dir: " + currentDirectory + ")\n";
-}
-
-// What CreateDirectory says of a folder that the system refuses. Only the macOS back end gives the system's reason.
-inline std::string Refused(const std::string& path, int error, const std::string& currentFolder) {
-    const std::string reason = std::string(VARNEX_BINARY).ends_with("WithOSXBackEnd") ? strerror(error) : "";
-    return "CreateDirectory '" + path + "' failed: " + reason + " (current dir: " + currentFolder + ")\n";
 }
 
 struct Outcome {

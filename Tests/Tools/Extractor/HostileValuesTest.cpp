@@ -52,7 +52,9 @@ TEST(HostileValues, InAnyFieldAreSurvived) {
                 EXPECT_EQ(outcome.transcript.status == 0, outcome.transcript.output.ends_with(kAllOk));
                 for (const auto& [path, content] : outcome.tree)
                     EXPECT_TRUE(path == "a.zarvo_data" || path.starts_with("a.zarvo_data/")) << path;
-                if (!kIsSanitized) EXPECT_LE(peakKilobytes, 64 * 1'024);
+                if (!kIsSanitized) {
+                    EXPECT_LE(peakKilobytes, 64 * 1'024);
+                }
             }
         }
     }

@@ -109,7 +109,7 @@ TEST(NodePath, FolderThatTheSystemRefusesIsReportedTwice) {
     const std::string name(256, 'n'); // one more than a component may have
     const std::string bytes = BuildArchive(OneNode(name, true)).bytes;
     const std::string messages =
-        Refused(folder / "a.zarvo_data/" + name, ENAMETOOLONG, folder.Path()) + kFolderFailed + name + "\n";
+        FolderRefused(folder / "a.zarvo_data/" + name, ENAMETOOLONG, folder.Path()) + kFolderFailed + name + "\n";
     ExpectOutcome(1, Report(7, bytes.size(), messages), OutputTree({}), Extract(folder, bytes));
 }
 
@@ -161,6 +161,12 @@ TEST(ArchivePath, IsNeverCut) {
         if (row.isRead) output.replace(output.find("a.zarvo_data"), 7, path);
         EXPECT_EQ((Transcript{.status = 1, .output = output}), RunVarnex({path}, {.workingDirectory = folder.Path()}));
         EXPECT_EQ("", Differences({{"a.zarvo", bytes}}, ReadFolderTree(folder.Path())));
+
+        // Without entries, the folder itself is what can't be made.
+        WriteFile(folder / "a.zarvo", BuildArchive({}).bytes);
+        const std::string message = "ERROR: failed to create directory " + path + "_data\n";
+        const Transcript empty = RunVarnex({path}, {.workingDirectory = folder.Path()});
+        EXPECT_EQ(row.isRead, empty.output.ends_with(message)) << empty;
     }
 }
 

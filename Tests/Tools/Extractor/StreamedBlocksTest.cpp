@@ -1,7 +1,5 @@
 #include "Tests/Tools/Extractor/ExtractorTest.h"
 
-#include <algorithm>
-
 namespace {
 
 struct Filling {
@@ -146,13 +144,29 @@ TEST(StreamedBlocks, DamageSpoilsOnlyWhatLiesBehindIt) {
     ExpectOutcome(1, Report(7, built.bytes.size(), Failures({2, 4, 5})), OutputTree(contents), Extract(built.bytes));
 }
 
+// The second window gets its first bytes from a good input piece and fails in the next one: those bytes stay lost.
+TEST(StreamedBlocks, WindowThatFailedInItsMiddleIsNotReadFromAgain) {
+    ArchiveDescription archive = Streamed(false);
+    archive.chunkSize = 0;
+    const std::string stream = Incompressible(300'000);
+    archive.entries = {{.bytes = stream, .listed = false}};
+    AddRanges({{0, 10}, {70'000, 10}, {70'000, 10}, {70'010, 10}, {10, 10}}, &archive);
+    BuiltArchive built = BuildArchive(archive);
+    built.bytes.replace(built.dataOffset + 131'072 + 10, 300, std::string(300, '\xFF'));
+    ExpectOutcome(
+        1, Report(7, built.bytes.size(), Failures({1, 2, 3})),
+        OutputTree({{"0", stream.substr(0, 10)}, {"1", ""}, {"2", ""}, {"3", ""}, {"4", stream.substr(10, 10)}}),
+        Extract(built.bytes));
+}
+
 TEST(StreamedBlocks, TooShortForTheirPropertiesOrTheirDataFail) {
     const std::string stored = CompressLzma(Incompressible(1'000));
     for (const size_t storedSize : std::vector<size_t>{0, 1, 4, 5, 8, 9, 10}) {
         SCOPED_TRACE(storedSize);
         ArchiveDescription archive = Streamed(false);
-        archive.entries = {{.path = "0", .bytes = Incompressible(1'000)}, {.path = "1", .bytes = "text"}};
-        archive.blocks = {{.size = 1'000, .stored = stored.substr(0, storedSize)}, {.size = 4}};
+        // The file goes on in the block behind, whose bytes must not take the place of those that are missing.
+        archive.entries = {{.path = "0", .bytes = Incompressible(1'500)}, {.path = "1", .bytes = "text"}};
+        archive.blocks = {{.size = 1'000, .stored = stored.substr(0, storedSize)}, {.size = 504}};
         const BuiltArchive built = BuildArchive(archive);
         ExpectOutcome(1, Report(7, built.bytes.size(), Failures({0})), OutputTree({{"0", ""}, {"1", "text"}}),
                       Extract(built.bytes));

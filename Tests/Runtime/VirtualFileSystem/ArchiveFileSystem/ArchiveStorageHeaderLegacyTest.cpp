@@ -94,7 +94,8 @@ TEST(LegacyHeader, VersionAndLevelsDecideWhatIsRead) {
         Records records(row.signature);
         records.header.size = 99;
         BytesFile file(bytes);
-        ASSERT_EQ(row.result, ReadHeaderAndBlocksInfo_ZarvoWebAndZarvoRaw(file.accessor, records.header, records.blocks));
+        ASSERT_EQ(row.result,
+                  ReadHeaderAndBlocksInfo_ZarvoWebAndZarvoRaw(file.accessor, records.header, records.blocks));
         if (row.result != 0) continue;
         EXPECT_EQ(bytes.size(), file.Position());
         EXPECT_EQ(row.version, records.header.version);
@@ -112,8 +113,8 @@ TEST(LegacyHeader, VersionAndLevelsDecideWhatIsRead) {
             const std::string cut = bytes.substr(0, length);
             BytesFile cutFile(cut);
             Records cutRecords(row.signature);
-            EXPECT_EQ(1, ReadHeaderAndBlocksInfo_ZarvoWebAndZarvoRaw(cutFile.accessor, cutRecords.header,
-                                                                    cutRecords.blocks))
+            EXPECT_EQ(
+                1, ReadHeaderAndBlocksInfo_ZarvoWebAndZarvoRaw(cutFile.accessor, cutRecords.header, cutRecords.blocks))
                 << "cut at " << length;
         }
     }
@@ -121,8 +122,16 @@ TEST(LegacyHeader, VersionAndLevelsDecideWhatIsRead) {
 
 TEST(LegacyDirectory, ExtensionsDecideTheNodeFlags) {
     const std::pair<const char*, UInt32> kCases[] = {
-        {"level0", 4}, {"sharedassets0.assets", 4}, {"a/b.c/x.sharedAssets", 4}, {"dir.x/level1", 4}, {"name.", 4},
-        {"", 4},       {"data.resource", 0},        {"x.ASSETS", 0},             {".profile", 0},     {"a.assets.txt", 0},
+        {"level0", 4},
+        {"sharedassets0.assets", 4},
+        {"a/b.c/x.sharedAssets", 4},
+        {"dir.x/level1", 4},
+        {"name.", 4},
+        {"", 4},
+        {"data.resource", 0},
+        {"x.ASSETS", 0},
+        {".profile", 0},
+        {"a.assets.txt", 0},
     };
     BigEndianBytes bytes;
     bytes.U32(std::size(kCases));

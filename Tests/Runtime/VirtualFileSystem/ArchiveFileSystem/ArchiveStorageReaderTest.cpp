@@ -16,8 +16,9 @@ struct BlockKind {
     bool isStreamed;
 };
 const BlockKind kBlockKinds[] = {
-    {"stored", kCompressionNone, false}, {"LZMA", kCompressionLzma, false}, {"LZ4", kCompressionLz4, false},
-    {"LZ4HC", kCompressionLz4HC, false}, {"streamed", kCompressionNone, true}, {"LZMA streamed", kCompressionLzma, true},
+    {"stored", kCompressionNone, false},  {"LZMA", kCompressionLzma, false},
+    {"LZ4", kCompressionLz4, false},      {"LZ4HC", kCompressionLz4HC, false},
+    {"streamed", kCompressionNone, true}, {"LZMA streamed", kCompressionLzma, true},
 };
 
 ArchiveDescription Describe(std::string contents, const BlockKind& kind, UInt64 chunkSize) {
@@ -59,7 +60,8 @@ TEST(ArchiveReader, RangesOutsideTheStreamAreRefusedWhole) {
     ASSERT_EQ(0, archive.result);
     const UInt64 kMax = ~UInt64{0};
     const std::pair<UInt64, UInt64> kRefused[] = {
-        {1'000, 0}, {1'000, 1}, {999, 2}, {0, 1'001}, {10, kMax}, {999, kMax}, {kMax, 1}, {kMax, kMax}, {1, UInt64{1} << 32},
+        {1'000, 0},  {1'000, 1}, {999, 2},     {0, 1'001},           {10, kMax},
+        {999, kMax}, {kMax, 1},  {kMax, kMax}, {1, UInt64{1} << 32},
     };
     for (const auto& [from, size] : kRefused) {
         UInt64 count = 77;
@@ -141,14 +143,55 @@ TEST(ArchiveReader, ADamagedBlockFailsAloneAndEveryTime) {
     }
 }
 
+namespace {
+
+// Counts the stored bytes that are read.
+class ReadCounter : public FaultyFileSystem {
+public:
+    using FaultyFileSystem::Read;
+    bool Read(FileEntryData& entry, UInt64 size, void* buffer, UInt64* actual, FileReadFlags flags) override {
+        bytes += size;
+        return FaultyFileSystem::Read(entry, size, buffer, actual, flags);
+    }
+    UInt64 bytes = 0;
+};
+
+} // namespace
+
+// Files that lie apart in one stream cost one decoding of it, and files behind its damage, or behind the end of a file
+// that was cut, none at all.
+TEST(ArchiveReader, AStreamIsNotDecodedAgainForEveryFileInIt) {
+    TemporaryFolder folder;
+    const BuiltArchive built = BuildArchive(Describe(SampleText(2'000'000), kBlockKinds[5], 0));
+    const UInt64 storedSize = built.bytes.size();
+    std::string damaged = built.bytes;
+    damaged[damaged.size() / 2] = static_cast<char>(~damaged[damaged.size() / 2]);
+    std::string cut = built.bytes.substr(0, built.bytes.size() / 2);
+    for (const std::string& bytes : {built.bytes, damaged, cut}) {
+        const std::string path = folder / "archive";
+        WriteFile(path, bytes);
+        ReadCounter counter;
+        ArchiveStorageReader reader(kMemLabelFileSystem);
+        ASSERT_EQ(0, reader.Initialize(core::string(path.c_str()), 0));
+        counter.bytes = 0;
+        std::string piece(100, '\0');
+        UInt64 count = 0;
+        for (UInt64 from = 0; from < 2'000'000 - 100; from += 5'000) {
+            if (!reader.Read(from, 100, piece.data(), &count)) continue;
+            EXPECT_EQ(built.stream.substr(static_cast<size_t>(from), 100), piece);
+        }
+        EXPECT_LT(counter.bytes, storedSize + storedSize / 2);
+    }
+}
+
 // The file ends exactly where a block starts, or inside it: no byte at all is a failed read.
 TEST(ArchiveReader, CutFilesAreToldApart) {
     TemporaryFolder folder;
     const BuiltArchive built = BuildArchive(Describe(SampleText(100'000), kBlockKinds[1], 50'000));
     const size_t second = static_cast<size_t>(built.dataOffset) +
                           Compress(kCompressionLzma, std::string_view(built.stream).substr(0, 50'000)).size();
-    const std::pair<size_t, int> kCases[] = {{second, -2}, {second + 1, 1}, {built.bytes.size() - 1, 1},
-                                             {built.bytes.size(), 0}};
+    const std::pair<size_t, int> kCases[] = {
+        {second, -2}, {second + 1, 1}, {built.bytes.size() - 1, 1}, {built.bytes.size(), 0}};
     for (const auto& [length, expected] : kCases) {
         const std::string path = folder / "cut";
         WriteFile(path, built.bytes.substr(0, length));
@@ -167,6 +210,20 @@ TEST(ArchiveReader, StreamsThatEndEarlyDeliverWhatTheyHold) {
     ASSERT_EQ(0, archive.result);
     EXPECT_EQ(archive.built.stream.substr(190'000), archive.Read(190'000, 60'000));
     EXPECT_EQ("refused", archive.Read(210'000, 10));
+}
+
+// Properties may name a dictionary of 4 GiB: it is asked for, and only what is decoded is touched.
+TEST(ArchiveReader, ADictionaryLargerThanTheDataChangesNothing) {
+    const std::string text = SampleText(100'000);
+    std::string stored = CompressLzma(text);
+    stored.replace(1, 4, 4, '\xFF');
+    for (bool isStreamed : {false, true}) {
+        ArchiveDescription description = Describe(text, kBlockKinds[1], 0);
+        description.blocks = {{.size = text.size(), .streamed = isStreamed, .stored = stored}};
+        OpenedArchive archive(description);
+        ASSERT_EQ(0, archive.result);
+        EXPECT_EQ(text.substr(70'000, 20'000), archive.Read(70'000, 20'000));
+    }
 }
 
 TEST(ArchiveReader, KindsWithoutADecoderFailAndSaySo) {
@@ -308,7 +365,8 @@ TEST(ArchiveReader, AFileThatHasChangedIsRefused) {
     };
     const std::string kModified =
         "Archive file was modified while it was opened, and can no longer be accessed: " + path + "\n";
-    const std::string kUnexpected = "Unexpected FileSystemError code 14 after call to FileSystemEntry::LastModified() \n";
+    const std::string kUnexpected =
+        "Unexpected FileSystemError code 14 after call to FileSystemEntry::LastModified() \n";
     const Case kCases[] = {
         {kFileSystemErrorNone, false, "", true, ""},
         {kFileSystemErrorNone, true, "", false, kModified},

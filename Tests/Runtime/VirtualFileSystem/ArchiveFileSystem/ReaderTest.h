@@ -5,8 +5,8 @@
 #include "Runtime/VirtualFileSystem/MemoryFileSystem/MemoryFile.h"
 #include "Tests/Support/ArchiveWriter.h"
 
+#include <algorithm>
 #include <gtest/gtest.h>
-
 #include <string>
 
 // A view into the reader, for what its callers can't see.
@@ -23,6 +23,23 @@ struct ArchiveStorageReaderTestAccess {
         for (Reader::CachedBlock* block : reader.m_CachedBlocks)
             if (block->beingWritten.load() != 0 || block->bufferReaders.load() != 0) return false;
         return true;
+    }
+    // How many uses of records there are now, and how many of them the record with the most has.
+    struct Uses {
+        SInt32 total = 0, most = 0;
+    };
+    static Uses CountUses(Reader& reader) {
+        Mutex::AutoLock lock(reader.m_CacheLock);
+        Uses uses;
+        for (Reader::CachedBlock* block : reader.m_CachedBlocks) {
+            const SInt32 readers = block->bufferReaders.load();
+            uses.total += readers;
+            uses.most = std::max(uses.most, readers);
+        }
+        return uses;
+    }
+    static const IDecompressor* GetDecompressor(Reader& reader, CompressionType type) {
+        return reader.GetDecompressor(type);
     }
     // The CacheResult of filling a record with a block, which is released again.
     static int Fill(Reader& reader, UInt32 blockIndex) {
@@ -44,10 +61,17 @@ class OpenedArchive {
 public:
     explicit OpenedArchive(const ArchiveDescription& description) : OpenedArchive(BuildArchive(description)) {}
     explicit OpenedArchive(BuiltArchive archive)
+        : OpenedArchive(std::move(archive), [](std::string& bytes) {
+              return MemoryFile::CreateFileSystemEntry(kMemLabelGeneral, kFilePermissionRead, bytes.data(),
+                                                       bytes.size(), false);
+          }) {}
+    // Through an entry that a function makes of the archive's bytes.
+    template <typename MakeEntry>
+    OpenedArchive(BuiltArchive archive, MakeEntry makeEntry)
         : built(std::move(archive)),
-          m_Entry(MemoryFile::CreateFileSystemEntry(kMemLabelGeneral, kFilePermissionRead, built.bytes.data(),
-                                                    built.bytes.size(), false)),
-          reader(kMemLabelFileSystem), result(reader.Initialize(m_Entry, 0, true, true)) {}
+          m_Entry(makeEntry(built.bytes)),
+          reader(kMemLabelFileSystem),
+          result(reader.Initialize(m_Entry, 0, true, true)) {}
 
     // The bytes that one call delivers; "refused" when it answers false.
     std::string Read(UInt64 from, UInt64 size, FileReadFlags flags = kFileReadFlagsNone) {
