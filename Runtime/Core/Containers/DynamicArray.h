@@ -12,6 +12,7 @@
 // An array belongs to one thread at a time.
 #pragma once
 
+#include "Footing/Process.h"
 #include "Runtime/Allocator/Allocator.h"
 #include "Runtime/Core/Types.h"
 #include "Runtime/Utilities/LogAssert.h"
@@ -47,10 +48,12 @@ struct dynamic_array_data {
     // Twice the capacity, or 1.
     void* grow(size_t elementSize, size_t alignment);
 
-    // Grows when one more element does not fit.
+    // Grows when one more element does not fit. Memory that is refused ends the process: the element would be written
+    // past the buffer.
     void make_room_for_one(size_t elementSize, size_t alignment) {
         Check(size + 1 > size, "Assertion failed on expression: 'newSize > m_size'");
         if (size + 1 > capacity()) grow(elementSize, alignment);
+        if (size + 1 > capacity()) C99Api::Footing_Process_Abort(ZarvoClassic::Footing_ErrorCode_OutOfMemory);
     }
 
     // Frees the buffer, which must be owned; neither the elements nor the fields are touched.
