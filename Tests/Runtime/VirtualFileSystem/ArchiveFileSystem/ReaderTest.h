@@ -38,6 +38,7 @@ struct ArchiveStorageReaderTestAccess {
         }
         return uses;
     }
+    static void EmptyCache(Reader& reader) { reader.EmptyCache(); }
     static const IDecompressor* GetDecompressor(Reader& reader, CompressionType type) {
         return reader.GetDecompressor(type);
     }
@@ -48,7 +49,10 @@ struct ArchiveStorageReaderTestAccess {
         Reader::CacheResult result = Reader::kCacheResultOk;
         Reader::CachedBlock* record = reader.AcquireAndPrefillUnusedBlock(blockIndex, &result, &batch);
         EXPECT_EQ(record == nullptr, reader.IsBlockStreamed(blockIndex) ? result < 0 : result != 0);
-        if (record != nullptr) reader.ReleaseCachedBlock(record, reader.IsBlockStreamed(blockIndex));
+        if (record == nullptr) return result;
+        reader.EmptyCache(); // frees what is not in use
+        EXPECT_EQ(1u, CachedBlockCount(reader));
+        reader.ReleaseCachedBlock(record, reader.IsBlockStreamed(blockIndex));
         return result;
     }
     static bool ReadStored(Reader& reader, UInt64 position, UInt64 size, void* destination, UInt64* delivered) {

@@ -1,0 +1,110 @@
+// How much faster two threads read different blocks through one reader than one thread does: ReaderScaling
+//
+// For each kind of block and way of reading it prints the best of some rounds, which alternate between one thread and
+// two, and their ratio. The rows "decoder alone" read nothing: they say what ratio the machine itself allows. What is
+// read is compared with the source.
+#include "Runtime/VirtualFileSystem/ArchiveFileSystem/ArchiveStorageReader.h"
+#include "Tests/Support/ArchiveWriter.h"
+#include "Tests/Support/TemporaryFolder.h"
+
+#include <algorithm>
+#include <chrono>
+#include <cstdio>
+#include <cstring>
+#include <thread>
+
+namespace {
+
+constexpr UInt64 kBlockSize = 131'072;
+constexpr UInt64 kBlocks = 64;
+constexpr int kRounds = 15;
+
+// Text that compresses to about a third.
+std::string MakeText() {
+    std::string text;
+    for (UInt64 seed = 1; text.size() < kBlocks * kBlockSize; seed = seed * 6364136223846793005u + 1442695040888963407u)
+        text += "line " + std::to_string(seed >> 40) + " of the text\n";
+    text.resize(kBlocks * kBlockSize);
+    return text;
+}
+
+// Bytes a second by that many threads; work(block) handles one block and says whether it came out right. Each thread
+// handles every block, from another one on, so that two never handle the same at once.
+template <typename Work>
+double Measure(UInt64 threadCount, Work work) {
+    const auto start = std::chrono::steady_clock::now();
+    std::vector<std::thread> threads;
+    for (UInt64 index = 0; index < threadCount; ++index)
+        threads.emplace_back([=] {
+            for (UInt64 count = 0; count < kBlocks; ++count) {
+                if (work((count + index * kBlocks / threadCount) % kBlocks)) continue;
+                fprintf(stderr, "a block came out wrong\n");
+                abort();
+            }
+        });
+    for (std::thread& thread : threads)
+        thread.join();
+    const std::chrono::duration<double> seconds = std::chrono::steady_clock::now() - start;
+    return static_cast<double>(threadCount * kBlocks * kBlockSize) / seconds.count();
+}
+
+template <typename Work>
+void Compare(const char* kind, const char* way, Work work) {
+    double one = 0, two = 0;
+    for (int round = 0; round < kRounds; ++round) {
+        one = std::max(one, Measure(1, work));
+        two = std::max(two, Measure(2, work));
+    }
+    printf("%-8s %-22s %9.1f MB/s %9.1f MB/s   ratio %.2f\n", kind, way, one / 1e6, two / 1e6, two / one);
+}
+
+void CompareKind(const char* kind, CompressionType type, bool isStreamed) {
+    TemporaryFolder folder;
+    const std::string path = folder / "archive";
+    const std::string text = MakeText();
+    ArchiveDescription description;
+    description.entries = {{.path = "a", .bytes = text}};
+    description.chunkSize = kBlockSize;
+    description.type = type;
+    description.streamed = isStreamed;
+    WriteFile(path, BuildArchive(description).bytes);
+    ArchiveStorageReader reader(kMemLabelFileSystem);
+    if (reader.Initialize(core::string(path.c_str()), 0) != 0) abort();
+
+    auto read = [&](UInt64 from, UInt64 size) {
+        thread_local std::string bytes(kBlockSize, '\0');
+        UInt64 count = 0;
+        return reader.Read(from, size, bytes.data(), &count) && count == size &&
+               memcmp(bytes.data(), text.data() + from, size) == 0;
+    };
+    Compare(kind, "whole blocks", [&](UInt64 block) { return read(block * kBlockSize, kBlockSize); });
+    Compare(kind, "16 parts of each", [&](UInt64 block) {
+        constexpr UInt64 kPart = kBlockSize / 16;
+        for (UInt64 from = block * kBlockSize; from < (block + 1) * kBlockSize; from += kPart)
+            if (!read(from, kPart)) return false;
+        return true;
+    });
+
+    IDecompressor* decompressor = CreateDecompressor(type, kMemLabelGeneral);
+    if (decompressor == nullptr) return;
+    std::vector<std::string> stored;
+    for (UInt64 block = 0; block < kBlocks; ++block)
+        stored.push_back(Compress(type, std::string_view(text).substr(block * kBlockSize, kBlockSize)));
+    Compare(kind, "decoder alone", [&](UInt64 block) {
+        thread_local std::string bytes(kBlockSize, '\0');
+        size_t consumed = stored[block].size(), produced = kBlockSize;
+        return decompressor->DecompressMemory(stored[block].data(), &consumed, bytes.data(), &produced) &&
+               memcmp(bytes.data(), text.data() + block * kBlockSize, kBlockSize) == 0;
+    });
+    Delete(decompressor, kMemLabelGeneral);
+}
+
+} // namespace
+
+int main() {
+    printf("%-31s %14s %14s\n", "", "one thread", "two threads");
+    CompareKind("LZMA", kCompressionLzma, false);
+    CompareKind("streamed", kCompressionLzma, true);
+    CompareKind("LZ4", kCompressionLz4, false);
+    CompareKind("stored", kCompressionNone, false);
+}

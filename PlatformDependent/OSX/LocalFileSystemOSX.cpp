@@ -1,0 +1,160 @@
+#include "PlatformDependent/OSX/LocalFileSystemOSX.h"
+
+#include "PlatformDependent/OSX/Platform.h"
+#include "PlatformDependent/OSX/StringConversions.h"
+#include "Runtime/Threads/Mutex.h"
+#include "Runtime/Utilities/FileUtilities.h"
+#include "Runtime/Utilities/Format.h"
+#include "Runtime/Utilities/PathNameUtility.h"
+#include "Runtime/VirtualFileSystem/VirtualFileSystem.h"
+
+#include <cerrno>
+#include <cstring>
+
+namespace {
+
+constexpr char kSourceName[] = "PlatformDependent/OSX/LocalFileSystemOSX";
+constexpr char kUserDataFolder[] = "Library/Zarvo";
+constexpr char kUserCacheFolder[] = "Library/Caches/com.zarvo3d.ZarvoEditor"; // named after the editor's bundle
+constexpr size_t kErrorTextSize = 2048;
+
+// The fields that the status answers, the hidden flag aside.
+constexpr UInt32 kStatusQuery = kFileEntryQuerySize | kFileEntryQueryLastModified | kFileEntryQueryDirectory |
+                                kFileEntryQuerySymLink | kFileEntryQueryReadOnly;
+static_assert(kStatusQuery == 0x334);
+
+// strerror_r has two forms: one answers a status and fills the buffer, the other answers the text.
+[[maybe_unused]] const char* ErrorText(int, const char* buffer) { return buffer; }
+[[maybe_unused]] const char* ErrorText(const char* text, const char*) { return text; }
+
+core::basic_string<char> HomeFolder() { return MakeString(NSHomeDirectory()); }
+
+} // namespace
+
+LocalFileSystemOSX::~LocalFileSystemOSX() = default;
+
+bool LocalFileSystemOSX::IsHidden(const FileEntryData& entry) const {
+    PlatformStatus status;
+    return PlatformStat(entry.path, &status) == 0 && (status.st_flags & UF_HIDDEN) != 0;
+}
+
+bool LocalFileSystemOSX::SetFlags(FileEntryData& entry, UInt32 mask, UInt32 flags) {
+    PlatformStatus status;
+    if (PlatformStat(entry.path, &status) != 0) return false;
+    UInt32 newFlags = status.st_flags;
+    if (mask & kFileEntryIsHidden) newFlags &= ~UF_HIDDEN;
+    if (flags & kFileEntryIsHidden) newFlags |= UF_HIDDEN;
+    if (newFlags == status.st_flags || chflags(entry.path, newFlags) == 0) return true;
+    AssertImplementation(0, kSourceName, __LINE__, -1,
+                         Format("Failed to change file flags for '%s'. errno: %i", entry.path, errno).c_str());
+    return false;
+}
+
+bool LocalFileSystemOSX::CreateAsFile(FileEntryData& entry) {
+    const AutoreleasePool pool;
+    NSString* path = NSString_stringWithUTF8String(entry.path);
+    if (NSFileManager_fileExistsAtPath(path)) return false;
+    return NSFileManager_createFileAtPath(path);
+}
+
+bool LocalFileSystemOSX::MoveToTrash(FileEntryData& entry) {
+    NSURL* url = NSURL_URLByResolvingSymlinksInPath(NSURL_fileURLWithPath(MakeNSString(entry.path)));
+    const core::basic_string_ref<char> resolved = NSURL_fileSystemRepresentation(url);
+    if (resolved.length() > kMaxPathLength) return false; // cut, it would name something else
+    strcpy_truncate(entry.path, resolved.data(), sizeof(entry.path), resolved.length());
+    if (!IsPathCreated(entry.path)) return false;
+
+    const core::basic_string<char> path = PathToAbsolutePath(entry.path);
+    int tag = 0;
+    // What counts is whether the path is gone, not what the workspace says.
+    (void)NSWorkspace_performFileOperation(NSWorkspaceRecycleOperation, MakeNSString(DeleteLastPathNameComponent(path)),
+                                           MakeNSString(""),
+                                           NSArray_arrayWithObject(MakeNSString(GetLastPathNameComponent(path))), &tag);
+    if (IsPathCreated(path)) (void)DeleteFileOrDirectory(path); // the test below tells
+    return !IsPathCreated(path);
+}
+
+bool LocalFileSystemOSX::Target(const FileEntryData& entry, FileSystemEntry& target) const {
+    const core::basic_string<char> path =
+        MakeString(NSString_stringByResolvingSymlinksInPath(MakeNSString(entry.path)));
+    if (path.length() > kMaxPathLength) return false; // cut, it would name something else
+    target = FileSystemEntry(path);
+    return true;
+}
+
+bool LocalFileSystemOSX::Copy(FileEntryData& from, FileEntryData& to) {
+    const AutoreleasePool pool;
+    NSString* source = NSString_stringWithUTF8String(ToAbsolute(from.path).c_str());
+    NSString* destination = NSString_stringWithUTF8String(ToAbsolute(to.path).c_str());
+    return NSFileManager_copyItemAtPath(NSString_stringByResolvingSymlinksInPath(source), destination);
+}
+
+FileEntryInfoQueryFlags LocalFileSystemOSX::GetFileEntryInfo(const FileEntryData& entry, FileEntryInfo& info,
+                                                             FileEntryInfoQueryFlags query) const {
+    FileEntryInfoQueryFlags answer = kFileEntryQueryNone;
+    if (query & kFileEntryQueryExists) {
+        if (!Exists(entry)) return kFileEntryQueryNone;
+        answer = kFileEntryQueryExists;
+    }
+    if ((query & (kStatusQuery | kFileEntryQueryHidden)) == 0) return answer;
+    PlatformStatus status;
+    if (PlatformStat(entry.path, &status) != 0) return answer;
+    if (query & kStatusQuery) answer = answer | LocalFileSystemPosix::GetFileEntryInfo(entry, status, info, query);
+    if (query & kFileEntryQueryHidden) {
+        info.flags = static_cast<UInt8>(info.flags & ~kFileEntryIsHidden);
+        if (status.st_flags & UF_HIDDEN) info.flags |= kFileEntryIsHidden;
+        answer = answer | kFileEntryQueryHidden;
+    }
+    return answer;
+}
+
+core::basic_string<char> LocalFileSystemOSX::GetApplicationPath() const {
+    static core::basic_string<char> appPath(kMemLabelPathString);
+    static Mutex appPathLock;
+    const Mutex::AutoLock lock(appPathLock);
+    if (appPath.empty()) {
+        const AutoreleasePool pool;
+        appPath = MakeString(NSBundle_bundlePath());
+    }
+    return core::basic_string<char>(appPath, kMemLabelPathString);
+}
+
+core::basic_string<char> LocalFileSystemOSX::GetApplicationFolder() const {
+    const core::basic_string<char> application = GetApplicationPath();
+    return core::basic_string<char>(DeleteLastPathNameComponent(application), kMemLabelGeneral);
+}
+
+core::basic_string<char> LocalFileSystemOSX::GetApplicationManagedPath() const {
+    return AppendPathName(GetApplicationContentsPath(), "Managed");
+}
+
+core::basic_string<char> LocalFileSystemOSX::GetApplicationContentsPath() const {
+    return AppendPathName(GetApplicationPath(), "Contents");
+}
+
+core::basic_string<char> LocalFileSystemOSX::GetExecutablePath() const {
+    const AutoreleasePool pool;
+    return MakeString(NSBundle_executablePath());
+}
+
+core::basic_string<char> LocalFileSystemOSX::GetUserAppCacheFolder() const {
+    core::basic_string<char> folder(kMemLabelGeneral);
+    AppendPathNameImpl(HomeFolder(), kUserCacheFolder, '/', folder);
+    return folder;
+}
+
+core::basic_string<char> LocalFileSystemOSX::GetUserAppDataFolder() const {
+    return AppendPathName(HomeFolder(), kUserDataFolder);
+}
+
+core::basic_string<char> LocalFileSystemOSX::GetSharedApplicationDataFolder() const {
+    const AutoreleasePool pool;
+    return MakeString(NSArray_firstObject(
+        NSSearchPathForDirectoriesInDomains(NSApplicationSupportDirectory, NSLocalDomainMask, true)));
+}
+
+core::basic_string<char> LocalFileSystemOSX::LastErrorMessage() {
+    char buffer[kErrorTextSize] = {};
+    const char* text = ErrorText(strerror_r(errno, buffer, sizeof(buffer)), buffer);
+    return core::basic_string<char>(text, kMemLabelPathString);
+}

@@ -1,0 +1,144 @@
+// getattrlistbulk over this system's own listing of a folder. The position lies in the descriptor, as on the platform:
+// an entry whose record does not fit is returned to by seeking the descriptor back.
+#include "PlatformDependent/OSX/Standin/Faults.h"
+#include "PlatformDependent/OSX/Standin/FileFlags.h"
+
+#include <algorithm>
+#include <cerrno>
+#include <cstring>
+#include <dirent.h>
+#include <fcntl.h>
+#include <string>
+#include <sys/syscall.h>
+#include <unistd.h>
+
+namespace {
+
+constexpr size_t kListingSize = 32768;
+constexpr size_t kLongestListedName = 512; // room for any one entry of the system's listing
+constexpr size_t kRecordAlignment = 8;
+
+constexpr uint32_t kKnownCommon =
+    ATTR_CMN_RETURNED_ATTRS | ATTR_CMN_NAME | ATTR_CMN_OBJTYPE | ATTR_CMN_MODTIME | ATTR_CMN_FLAGS | ATTR_CMN_ERROR;
+constexpr uint32_t kNeededCommon = ATTR_CMN_RETURNED_ATTRS | ATTR_CMN_NAME;
+
+vtype TypeOf(mode_t mode) {
+    switch (mode & S_IFMT) {
+    case S_IFREG: return VREG;
+    case S_IFDIR: return VDIR;
+    case S_IFBLK: return VBLK;
+    case S_IFCHR: return VCHR;
+    case S_IFLNK: return VLNK;
+    case S_IFSOCK: return VSOCK;
+    case S_IFIFO: return VFIFO;
+    default: return VNON;
+    }
+}
+
+template <typename T>
+void Append(std::string& record, const T& value) {
+    record.append(reinterpret_cast<const char*>(&value), sizeof(value));
+}
+
+template <typename T>
+void Overwrite(std::string& record, size_t offset, const T& value) {
+    memcpy(record.data() + offset, &value, sizeof(value));
+}
+
+// The record of one entry of the folder, with the attributes that request names.
+std::string MakeRecord(int descriptor, const char* name, const attrlist& request) {
+    struct stat status;
+    int error = fstatat(descriptor, name, &status, AT_SYMLINK_NOFOLLOW) == 0 ? 0 : errno;
+    if (gStandinFaults.entryErrorName == name) error = EIO;
+    const bool altered = gStandinFaults.alteredName == name;
+
+    uint32_t common = request.commonattr & ~ATTR_CMN_ERROR;
+    uint32_t file = request.fileattr;
+    if (error != 0) {
+        common = ATTR_CMN_NAME | ATTR_CMN_ERROR;
+        file = 0;
+    } else if (S_ISDIR(status.st_mode)) {
+        file = 0;
+    }
+    if (altered) {
+        common &= ~gStandinFaults.missingCommon;
+        file &= ~gStandinFaults.missingFile;
+    }
+
+    std::string record;
+    Append(record, uint32_t{0}); // the length, known at the end
+    Append(record, attribute_set_t{common & ~ATTR_CMN_RETURNED_ATTRS, 0, 0, file, 0});
+    if (common & ATTR_CMN_ERROR) Append(record, static_cast<uint32_t>(error));
+    const size_t nameReference = record.size();
+    if (common & ATTR_CMN_NAME) Append(record, attrreference_t{});
+    if (common & ATTR_CMN_OBJTYPE) Append(record, static_cast<uint32_t>(TypeOf(status.st_mode)));
+    if (common & ATTR_CMN_MODTIME) Append(record, status.st_mtim);
+    if (common & ATTR_CMN_FLAGS) {
+        const std::string path = "/proc/self/fd/" + std::to_string(descriptor) + "/" + name;
+        Append(record, S_ISLNK(status.st_mode) ? 0 : FileFlagsOf(path.c_str())); // links have none of their own
+    }
+    if (file & ATTR_FILE_TOTALSIZE) Append(record, static_cast<int64_t>(status.st_size));
+    if (common & ATTR_CMN_NAME) {
+        const auto length = static_cast<uint32_t>(strlen(name) + 1);
+        Overwrite(record, nameReference, attrreference_t{static_cast<int32_t>(record.size() - nameReference), length});
+        record.append(name, length);
+    }
+    record.resize((record.size() + kRecordAlignment - 1) / kRecordAlignment * kRecordAlignment);
+    auto length = static_cast<uint32_t>(record.size());
+    if (altered && gStandinFaults.cut) length = gStandinFaults.cutLength;
+    Overwrite(record, 0, length);
+    // A record that is cut is followed by the next one; a length that says nothing true leaves the record whole.
+    if (length >= sizeof(length) && length < record.size()) record.resize(length);
+    return record;
+}
+
+int Fail(int error) {
+    errno = error;
+    return -1;
+}
+
+} // namespace
+
+int getattrlistbulk(int descriptor, void* list, void* buffer, size_t size, uint64_t options) {
+    const auto& request = *static_cast<const attrlist*>(list);
+    if (request.bitmapcount != ATTR_BIT_MAP_COUNT || (request.commonattr & kNeededCommon) != kNeededCommon ||
+        (request.commonattr & ~kKnownCommon) != 0 || request.volattr != 0 || request.dirattr != 0 ||
+        (request.fileattr & ~ATTR_FILE_TOTALSIZE) != 0 || request.forkattr != 0 || options != 0)
+        return Fail(EINVAL);
+    if (gStandinFaults.callsTooSmall > 0) {
+        --gStandinFaults.callsTooSmall;
+        return Fail(ERANGE);
+    }
+
+    int count = 0;
+    size_t used = 0;
+    off_t position = lseek(descriptor, 0, SEEK_CUR); // of the next entry; a bad descriptor is found by the listing
+    alignas(dirent64) char listing[kListingSize];
+    for (;;) {
+        // Not many more entries than there is room for: what is read in vain is read again.
+        const size_t listingSize = std::clamp((size - used) / 2, kLongestListedName, sizeof(listing));
+        const long length = syscall(SYS_getdents64, descriptor, listing, listingSize);
+        if (length < 0) return -1;
+        if (length == 0) return count;
+        for (long at = 0; at < length;) {
+            const auto& entry = *reinterpret_cast<const dirent64*>(listing + at);
+            at += entry.d_reclen;
+            const std::string name = entry.d_name;
+            if (name != "." && name != "..") {
+                const bool failing = gStandinFaults.recordsBeforeListingError == 0;
+                const std::string record = MakeRecord(descriptor, name.c_str(), request);
+                if (failing || record.size() > size - used) {
+                    lseek(descriptor, position, SEEK_SET);
+                    if (count > 0) return count;
+                    if (failing) gStandinFaults.recordsBeforeListingError = -1;
+                    return Fail(failing ? gStandinFaults.listingError : ERANGE);
+                }
+                if (gStandinFaults.recordsBeforeListingError > 0) --gStandinFaults.recordsBeforeListingError;
+                memcpy(static_cast<char*>(buffer) + used, record.data(), record.size());
+                used += record.size();
+                ++count;
+            }
+            position = entry.d_off;
+        }
+    }
+}

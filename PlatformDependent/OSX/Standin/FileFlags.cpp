@@ -1,0 +1,74 @@
+// File flags, which this system's files do not have. A file's flags are an extended attribute of it, as decimal digits.
+// What can't have one (pipes, devices, files on systems without extended attributes, files that even their owner may
+// not write) is kept in a table, for as long as the process lives.
+#include "PlatformDependent/OSX/Standin/FileFlags.h"
+
+#include "PlatformDependent/OSX/Standin/Faults.h"
+
+#include <cerrno>
+#include <cstdlib>
+#include <fcntl.h>
+#include <map>
+#include <mutex>
+#include <string>
+#include <sys/xattr.h>
+#include <tuple>
+#include <unistd.h>
+
+namespace {
+
+constexpr char kAttribute[] = "user.zarvo.flags";
+
+// Device, inode and time of birth: a file that gets a freed inode is another one.
+using FileIdentity = std::tuple<uint32_t, uint32_t, uint64_t, int64_t, uint32_t>;
+
+std::mutex gTableLock;
+std::map<FileIdentity, uint32_t> gTable; // guarded by gTableLock
+
+bool IdentityOf(const char* path, FileIdentity* identity) {
+    struct statx status;
+    if (statx(AT_FDCWD, path, 0, STATX_INO | STATX_BTIME, &status) != 0) return false;
+    *identity = {status.stx_dev_major, status.stx_dev_minor, status.stx_ino, status.stx_btime.tv_sec,
+                 status.stx_btime.tv_nsec};
+    return true;
+}
+
+} // namespace
+
+uint32_t FileFlagsOf(const char* path) {
+    char digits[16] = {};
+    if (getxattr(path, kAttribute, digits, sizeof(digits) - 1) > 0)
+        return static_cast<uint32_t>(strtoul(digits, nullptr, 10));
+    const std::lock_guard lock(gTableLock);
+    FileIdentity identity;
+    if (gTable.empty() || !IdentityOf(path, &identity)) return 0;
+    const auto found = gTable.find(identity);
+    return found != gTable.end() ? found->second : 0;
+}
+
+int PlatformStat(const char* path, PlatformStatus* status) {
+    if (stat(path, status) != 0) return -1;
+    status->st_flags = FileFlagsOf(path);
+    return 0;
+}
+
+int chflags(const char* path, uint32_t flags) {
+    struct stat status;
+    FileIdentity identity;
+    if (stat(path, &status) != 0 || !IdentityOf(path, &identity)) return -1;
+    const bool allowed = geteuid() == 0 || geteuid() == status.st_uid;
+    if (gStandinFaults.chflagsError != 0 || !allowed) {
+        errno = gStandinFaults.chflagsError != 0 ? gStandinFaults.chflagsError : EPERM;
+        return -1;
+    }
+
+    const std::lock_guard lock(gTableLock);
+    gTable.erase(identity);
+    if (flags == 0) {
+        (void)removexattr(path, kAttribute); // there may be none
+        return 0;
+    }
+    const std::string digits = std::to_string(flags);
+    if (setxattr(path, kAttribute, digits.data(), digits.size(), 0) != 0) gTable[identity] = flags;
+    return 0;
+}

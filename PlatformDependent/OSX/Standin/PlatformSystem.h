@@ -1,0 +1,73 @@
+// The system calls of the platform that this system lacks, under their own names: file status with file flags, chflags
+// and getattrlistbulk. See Platform.h for what stands here on a Mac. Any thread.
+#pragma once
+
+#include <cstddef>
+#include <cstdint>
+#include <ctime>
+#include <sys/stat.h>
+
+// File flags. They are kept with the file, in an extended attribute, or where the file can't have one, in this process.
+constexpr uint32_t UF_HIDDEN = 0x8000;
+
+struct PlatformStatus : stat {
+    uint32_t st_flags;
+};
+
+// stat with the file's flags: follows links; 0, or -1 with errno.
+int PlatformStat(const char* path, PlatformStatus* status);
+
+// Replaces the flags of the file, following links; 0, or -1 with errno (EPERM unless the caller owns the file).
+int chflags(const char* path, uint32_t flags);
+
+// Kinds of file in a bulk record.
+enum vtype : uint32_t { VNON, VREG, VDIR, VBLK, VCHR, VLNK, VSOCK, VFIFO };
+
+constexpr uint16_t ATTR_BIT_MAP_COUNT = 5;
+constexpr uint32_t ATTR_CMN_NAME = 0x1;
+constexpr uint32_t ATTR_CMN_OBJTYPE = 0x8;
+constexpr uint32_t ATTR_CMN_MODTIME = 0x400;
+constexpr uint32_t ATTR_CMN_FLAGS = 0x40000;
+constexpr uint32_t ATTR_CMN_ERROR = 0x20000000;
+constexpr uint32_t ATTR_CMN_RETURNED_ATTRS = 0x80000000;
+constexpr uint32_t ATTR_FILE_TOTALSIZE = 0x2;
+
+// The attributes asked for.
+struct attrlist {
+    uint16_t bitmapcount;
+    uint16_t reserved;
+    uint32_t commonattr;
+    uint32_t volattr;
+    uint32_t dirattr;
+    uint32_t fileattr;
+    uint32_t forkattr;
+};
+
+// The attributes that a record holds.
+struct attribute_set_t {
+    uint32_t commonattr;
+    uint32_t volattr;
+    uint32_t dirattr;
+    uint32_t fileattr;
+    uint32_t forkattr;
+};
+
+struct attrreference_t {
+    int32_t attr_dataoffset; // from this field itself
+    uint32_t attr_length;    // the terminating NUL included
+};
+
+// Fills buffer with records of the next entries of the folder that descriptor is open on, without "." and "..", as many
+// as fit; the position is the descriptor's. Returns their number, 0 when there are no more, or -1 with errno: ERANGE
+// when not even one fits (the position stays), EBADF, ENOTDIR, EINVAL for a request that is not understood. The list
+// has to ask for the returned set and the name. A record holds, packed to 4 bytes and without what it lacks:
+//
+//   0   length of the record, a multiple of 8   uint32_t
+//   4   returned set                            attribute_set_t
+//   24  error, only in records that report one  uint32_t: such a record has error and name alone
+//   24  name                                    attrreference_t; the text follows the fixed part
+//   32  object type                             uint32_t: a vtype
+//   36  modification time                       timespec
+//   52  flags                                   uint32_t
+//   56  total size, of all but folders          int64_t
+int getattrlistbulk(int descriptor, void* list, void* buffer, size_t size, uint64_t options);
