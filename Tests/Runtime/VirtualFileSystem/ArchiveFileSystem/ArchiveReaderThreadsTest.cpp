@@ -196,7 +196,9 @@ TEST(ArchiveReaderThreads, ReadsThatFailNowAndThenSpoilNothing) {
                 const UInt64 size = std::min<UInt64>(1 + random() % kBlockSize, kGatedSize - from);
                 const std::string got = archive.opened.Read(from, size);
                 ++(got.size() == size && got != "refused" ? whole : failed);
-                if (got != "refused") EXPECT_EQ(archive.opened.built.stream.substr(from, got.size()), got) << from;
+                if (got != "refused") {
+                    EXPECT_EQ(archive.opened.built.stream.substr(from, got.size()), got) << from;
+                }
             }
         });
         EXPECT_NE(0, whole);
