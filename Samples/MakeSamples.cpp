@@ -6,9 +6,10 @@
 
 namespace {
 
+// Large enough for the ZarvoWeb sample: the command looks for that directory in whole pieces of 65,536 bytes.
 std::string MakeTable() {
     std::string table = "number,square\n";
-    for (int number = 0; number < 4'000; ++number)
+    for (int number = 0; number < 6'000; ++number)
         table += std::to_string(number) + "," + std::to_string(number * number) + "\n";
     return table;
 }
@@ -19,6 +20,7 @@ const std::vector<ArchiveEntry> kEntries = {
     {.path = "tables/squares.csv", .bytes = MakeTable()},
     {.path = "road/of/one/file.txt", .bytes = "Folders are made on the way.\n"},
     {.path = "empty"},
+    {.path = "nothing", .flags = kFolderEntry},
 };
 
 ArchiveDescription Describe(ArchiveLayout layout) {

