@@ -101,20 +101,32 @@ FileEntryInfoQueryFlags LocalFileSystemPosix::GetFileEntryInfo(const FileEntryDa
     return answer;
 }
 
+static bool IsSameFile(const char* a, const char* b) {
+    struct stat statusA;
+    struct stat statusB;
+    return GetStatus(a, &statusA) && GetStatus(b, &statusB) && statusA.st_dev == statusB.st_dev &&
+           statusA.st_ino == statusB.st_ino;
+}
+
+// Whether a listed path names something in the folder, also after an entry has taken it over: a listing may write the
+// folder's path in another way or cut it, and an entry takes a backslash for a separator, so that the name "..\x"
+// would lead out.
+static bool NamesChildOf(const char* folder, const char* path) {
+    const char* const separator = strrchr(path, '/');
+    const char* const name = separator != nullptr ? separator + 1 : path;
+    if (*name == '\0' || strchr(name, '\\') != nullptr) return false;
+    const core::string parent(core::string_ref(path, static_cast<size_t>(name - path)), kMemLabelGeneral);
+    return IsSameFile(parent.empty() ? "." : parent.c_str(), folder);
+}
+
 bool LocalFileSystemPosix::Delete(FileEntryData& entry, bool recursive) {
     if (!IsDir(entry) || IsSymLink(entry)) return RepeatOnInterrupt([&] { return unlink(entry.path); }) == 0;
     if (recursive) {
-        const size_t length = strlen(entry.path);
-        const size_t prefixLength = entry.path[length - 1] == '/' ? length : length + 1;
         dynamic_block_array<FileEntryInfo, 32> children(kMemLabelFileList);
         (void)Enumerate(entry.path, &children, false, nullptr, kFileEnumerationAll); // rmdir tells what is left
         for (size_t index = 0; index < children.size(); ++index) {
             const char* const path = children[index].path;
-            // A path that was cut before its name is that of this folder. One that was cut in its name is that of no
-            // other child than those that are deleted anyway.
-            if (strlen(path) <= prefixLength) continue;
-            // An entry takes a backslash for a separator: the name "..\x" would be a path out of this folder.
-            if (strchr(path + prefixLength, '\\') != nullptr) continue;
+            if (!NamesChildOf(entry.path, path)) continue;
             FileSystemEntry child{core::string_ref(path)};
             (void)child.handler->Delete(child, true); // rmdir tells what is left
         }
@@ -188,13 +200,6 @@ bool LocalFileSystemPosix::SynchronizeMode(const FileEntryData& from, const File
         return false;
     }
     return true;
-}
-
-static bool IsSameFile(const char* a, const char* b) {
-    struct stat statusA;
-    struct stat statusB;
-    return GetStatus(a, &statusA) && GetStatus(b, &statusB) && statusA.st_dev == statusB.st_dev &&
-           statusA.st_ino == statusB.st_ino;
 }
 
 bool LocalFileSystemPosix::Copy(FileEntryData& from, FileEntryData& to) {

@@ -365,4 +365,22 @@ TEST_F(EnumerateTest, LargeTreesAreListedCopiedAndDeletedWhole) {
     EXPECT_TRUE(Tree("copy") == tree);
 }
 
+// However the folder's path is written, its listing's paths may be written in another way.
+TEST_F(EnumerateTest, FoldersAreDeletedWholeAndNothingElseIs) {
+    WorkIn("");
+    for (const char* path : {"docs", "./docs", "docs///", "././docs"}) {
+        SCOPED_TRACE(path);
+        WriteFile("other", "");
+        WriteFile("docs/a", "");
+        WriteFile("docs/..\\other", "");
+        FileSystemEntry entry{core::string_ref(path)};
+        EXPECT_FALSE(Mac().Delete(entry, true)) << "the name with the backslash stays";
+        EXPECT_EQ(Tree(""), (std::set<std::string>{"docs", "docs/..\\other", "other"}));
+        std::filesystem::remove(Path("docs/..\\other"));
+        WriteFile("docs/a", "");
+        EXPECT_TRUE(Mac().Delete(entry, true));
+        EXPECT_EQ(Tree(""), (std::set<std::string>{"other"}));
+    }
+}
+
 } // namespace
