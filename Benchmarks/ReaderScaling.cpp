@@ -4,14 +4,15 @@
 // two, and their ratio. The rows "decoder alone" read nothing: they say what ratio the machine itself allows. What is
 // read is compared with the source.
 #include "Runtime/VirtualFileSystem/ArchiveFileSystem/ArchiveStorageReader.h"
-#include "Tests/Support/ArchiveWriter.h"
-#include "Tests/Support/TemporaryFolder.h"
+#include "Tools/ArchiveWriter/ArchiveWriter.h"
 
 #include <algorithm>
 #include <chrono>
 #include <cstdio>
 #include <cstring>
+#include <stdlib.h>
 #include <thread>
+#include <unistd.h>
 
 namespace {
 
@@ -60,17 +61,18 @@ void Compare(const char* kind, const char* way, UInt64 passes, Work work) {
 
 // passes: as many as take some tenths of a second.
 void CompareKind(const char* kind, CompressionType type, bool isStreamed, UInt64 passes) {
-    TemporaryFolder folder;
-    const std::string path = folder / "archive";
+    char path[] = "/tmp/varnex-scaling-XXXXXX";
+    close(mkstemp(path));
     const std::string text = MakeText();
     ArchiveDescription description;
     description.entries = {{.path = "a", .bytes = text}};
     description.chunkSize = kBlockSize;
     description.type = type;
     description.streamed = isStreamed;
-    WriteFile(path, BuildArchive(description).bytes);
+    WriteArchive(description, path);
     ArchiveStorageReader reader(kMemLabelFileSystem);
-    if (reader.Initialize(core::string(path.c_str()), 0) != 0) abort();
+    if (reader.Initialize(core::string(path), 0) != 0) abort();
+    unlink(path);
 
     auto read = [&](UInt64 from, UInt64 size) {
         thread_local std::string bytes(kBlockSize, '\0');

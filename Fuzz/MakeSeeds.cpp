@@ -1,5 +1,5 @@
 // Makes the seed corpora of the fuzzers, a folder each: MakeSeeds FOLDER
-#include "Tests/Support/ArchiveWriter.h"
+#include "Tools/ArchiveWriter/ArchiveWriter.h"
 
 #include <cstdio>
 #include <filesystem>

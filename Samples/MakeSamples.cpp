@@ -1,5 +1,5 @@
 // Makes the sample archives, one of each layout: MakeSamples FOLDER
-#include "Tests/Support/ArchiveWriter.h"
+#include "Tools/ArchiveWriter/ArchiveWriter.h"
 
 #include <cstdio>
 #include <string>

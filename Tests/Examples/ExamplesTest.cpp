@@ -1,7 +1,7 @@
 #include "Runtime/Utilities/SpookyHash.h"
-#include "Tests/Support/ArchiveWriter.h"
 #include "Tests/Support/RunVarnex.h"
 #include "Tests/Support/TemporaryFolder.h"
+#include "Tools/ArchiveWriter/ArchiveWriter.h"
 
 #include <algorithm>
 #include <gtest/gtest.h>

@@ -2,10 +2,10 @@
 // that it says, its status and the whole folder are compared with what is expected.
 #pragma once
 
-#include "Tests/Support/ArchiveWriter.h"
 #include "Tests/Support/FolderTree.h"
 #include "Tests/Support/RunVarnex.h"
 #include "Tests/Support/TemporaryFolder.h"
+#include "Tools/ArchiveWriter/ArchiveWriter.h"
 
 #include <cstring>
 #include <gtest/gtest.h>

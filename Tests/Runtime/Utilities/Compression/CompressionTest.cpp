@@ -1,8 +1,8 @@
 #include "Runtime/Allocator/Allocator.h"
 #include "Runtime/Utilities/Compression/Lz4Decompressor.h"
 #include "Runtime/Utilities/Compression/LzmaDecompressor.h"
-#include "Tests/Support/Compressors.h"
 #include "Tests/Support/ReportRecorder.h"
+#include "Tools/ArchiveWriter/Compressors.h"
 
 #include <algorithm>
 #include <gtest/gtest.h>

@@ -3,7 +3,7 @@
 
 #include "Runtime/VirtualFileSystem/ArchiveFileSystem/ArchiveStorageReader.h"
 #include "Runtime/VirtualFileSystem/MemoryFileSystem/MemoryFile.h"
-#include "Tests/Support/ArchiveWriter.h"
+#include "Tools/ArchiveWriter/ArchiveWriter.h"
 
 #include <algorithm>
 #include <gtest/gtest.h>

@@ -13,7 +13,7 @@
 #pragma once
 
 #include "Runtime/Core/Types.h"
-#include "Tests/Support/Compressors.h"
+#include "Tools/ArchiveWriter/Compressors.h"
 
 #include <map>
 #include <optional>

@@ -1,4 +1,4 @@
-#include "Tests/Support/ArchiveFrames.h"
+#include "Tools/ArchiveWriter/ArchiveFrames.h"
 
 namespace {
 

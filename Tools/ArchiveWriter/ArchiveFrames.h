@@ -1,7 +1,7 @@
 // What the archive writer puts around an archive's data: fields by name, and the tables of the layouts. Private to it.
 #pragma once
 
-#include "Tests/Support/ArchiveWriter.h"
+#include "Tools/ArchiveWriter/ArchiveWriter.h"
 
 #include <map>
 #include <set>

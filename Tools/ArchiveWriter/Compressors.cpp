@@ -1,4 +1,4 @@
-#include "Tests/Support/Compressors.h"
+#include "Tools/ArchiveWriter/Compressors.h"
 
 #include <cstdio>
 #include <cstdlib>

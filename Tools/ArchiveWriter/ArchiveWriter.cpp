@@ -1,6 +1,6 @@
-#include "Tests/Support/ArchiveWriter.h"
+#include "Tools/ArchiveWriter/ArchiveWriter.h"
 
-#include "Tests/Support/ArchiveFrames.h"
+#include "Tools/ArchiveWriter/ArchiveFrames.h"
 
 #include <algorithm>
 #include <cstdio>
