@@ -7,6 +7,7 @@
 
 #include <algorithm>
 #include <cstring>
+#include <optional>
 #include <string>
 
 namespace {
@@ -46,6 +47,17 @@ public:
         return std::max(joined->size(), absoluteLength) <= kMaxPathLength;
     }
 
+    // Makes the folder that an entry's path names, and those above it, where they are missing. The path is kept.
+    bool CreateFolder(core::string_ref path) {
+        core::string joined(kMemLabelGeneral);
+        if (!Resolve(path, &joined) || !CreateDirectoryRecursive(joined)) return false;
+        m_LastFolder = path;
+        return true;
+    }
+
+    // Whether the folder is the one that was made, or found, last.
+    bool IsLastFolder(core::string_ref path) const { return m_LastFolder == path; }
+
 private:
     // Entries turn backslashes into "/", so they separate components here too.
     static bool HasParentComponent(core::string_ref path) {
@@ -60,6 +72,7 @@ private:
 
     std::string m_Path;
     size_t m_AbsoluteLength;
+    std::optional<core::string_ref> m_LastFolder;
 };
 
 void PrintHeader(const ArchiveStorageHeader::Header& header) {
@@ -105,29 +118,31 @@ bool CopyNode(ArchiveStorageReader& reader, const Node& node, FileAccessor& file
     return true;
 }
 
-bool ExtractFolder(const Node& node, const OutputFolder& output) {
-    core::string path(kMemLabelGeneral);
-    if (output.Resolve(node.path, &path) && CreateDirectoryRecursive(path)) return true;
+bool ExtractFolder(const Node& node, OutputFolder& output) {
+    if (output.CreateFolder(node.path)) return true;
     printf_console("ERROR: failed to create directory %s\n", node.path.c_str());
     return false;
 }
 
-bool ExtractFile(ArchiveStorageReader& reader, const Node& node, const OutputFolder& output,
-                 dynamic_array<UInt8>& buffer) {
+bool ExtractFile(ArchiveStorageReader& reader, const Node& node, OutputFolder& output, dynamic_array<UInt8>& buffer) {
     core::string path(kMemLabelGeneral);
     if (!output.Resolve(node.path, &path)) {
         printf_console("ERROR: failed to create file %s\n", node.path.c_str());
         return false;
     }
-    bool isOk = true;
-    const core::string parent(DeleteLastPathNameComponent(node.path), kMemLabelGeneral);
-    core::string parentPath(kMemLabelGeneral);
-    if (!output.Resolve(parent, &parentPath) || !CreateDirectoryRecursive(parentPath)) {
-        printf_console("ERROR: failed to create directory %s\n", parent.c_str());
-        isOk = false;
-    }
     FileAccessor file;
-    if (!file.Open(path.c_str(), kFilePermissionWrite)) {
+    bool isOk = true;
+    // The folder of the file before is there still, or the open fails.
+    const core::string_ref parent = DeleteLastPathNameComponent(node.path);
+    bool isOpen = output.IsLastFolder(parent) && file.Open(path.c_str(), kFilePermissionWrite);
+    if (!isOpen) {
+        (void)file.Close(); // nothing is open
+        isOk = output.CreateFolder(parent);
+        if (!isOk)
+            printf_console("ERROR: failed to create directory %s\n", core::string(parent, kMemLabelGeneral).c_str());
+        isOpen = file.Open(path.c_str(), kFilePermissionWrite);
+    }
+    if (!isOpen) {
         printf_console("ERROR: failed to create file %s\n", node.path.c_str());
         return false;
     }
@@ -152,7 +167,7 @@ bool ExtractArchive(const char* archivePath) {
     }
 
     printf_console("  creating folder '%s_data'\n", archivePath);
-    const OutputFolder output(archivePath);
+    OutputFolder output(archivePath);
     bool isAllOk = output.Create();
     // Every entry says so, too; without entries somebody has to.
     if (!isAllOk && reader.GetDirectoryInfo().nodes.empty())

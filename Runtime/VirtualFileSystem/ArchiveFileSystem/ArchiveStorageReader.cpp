@@ -4,6 +4,7 @@
 
 #include "Runtime/Utilities/Format.h"
 #include "Runtime/Utilities/LogAssert.h"
+#include "Runtime/VirtualFileSystem/ArchiveFileSystem/ReadAheadFile.h"
 #include "Runtime/VirtualFileSystem/MemoryFileSystem/MemoryFile.h"
 #include "Runtime/VirtualFileSystem/MemoryFileSystem/MultiBlocksMemoryFileData.h"
 #include "Runtime/VirtualFileSystem/MemoryFileSystem/SingleBlockMemoryFileData.h"
@@ -83,19 +84,31 @@ bool ArchiveStorageReader::BuildOffsetTables() {
     return true;
 }
 
+// Lets the parsers read a file that no handler serves. It stays the caller's, and outlives the accessor.
+static bool OpenFile(IFile* file, FileAccessor* accessor) {
+    FileEntryData data;
+    data.accessorHandler = New<IFileAdapter>(kMemLabelGeneral, file, kMemLabelGeneral, false);
+    if (data.accessorHandler == nullptr) return false;
+    FileSystemEntry entry(data);
+    return accessor->Open(entry, kFilePermissionRead);
+}
+
 int ArchiveStorageReader::ReadHeader(UInt64 offset) {
     if (!m_File.Seek(VFS::FileOffset(VFS::FileSize(offset)), kFileOriginBegin)) return kHeaderNotAnArchive;
-    if (ReadHeaderSignature(m_File, m_Header) != kHeaderOk) return kHeaderNotAnArchive;
+    ReadAheadFile ahead(&m_File);
+    FileAccessor file;
+    if (!OpenFile(&ahead, &file)) return kHeaderNotAnArchive;
+    if (ReadHeaderSignature(file, m_Header) != kHeaderOk) return kHeaderNotAnArchive;
 
     int result;
     if (m_Header.signature == kSignatureArchive || m_Header.signature == kSignatureRaw) {
-        result = ReadAll(m_File, m_Header, m_BlocksInfo, m_DirectoryInfo);
+        result = ReadAll(file, m_Header, m_BlocksInfo, m_DirectoryInfo);
         m_DirectoryReady = result == kHeaderOk;
     } else if (m_Header.signature == kSignatureWeb) {
-        result = ReadHeaderAndBlocksInfo_ZarvoWebAndZarvoRaw(m_File, m_Header, m_BlocksInfo);
+        result = ReadHeaderAndBlocksInfo_ZarvoWebAndZarvoRaw(file, m_Header, m_BlocksInfo);
         m_DirectoryReady = false;
     } else {
-        result = ReadBlockBasedHeader(offset);
+        result = ReadBlockBasedHeader(file, offset);
     }
     if (result != kHeaderOk) return result;
 
@@ -115,8 +128,8 @@ int ArchiveStorageReader::ReadHeader(UInt64 offset) {
     return kHeaderOk;
 }
 
-int ArchiveStorageReader::ReadBlockBasedHeader(UInt64 offset) {
-    if (const HeaderResult result = ArchiveStorageHeader::ReadHeader(m_File, m_Header); result != kHeaderOk)
+int ArchiveStorageReader::ReadBlockBasedHeader(FileAccessor& file, UInt64 offset) {
+    if (const HeaderResult result = ArchiveStorageHeader::ReadHeader(file, m_Header); result != kHeaderOk)
         return result;
 
     const UInt64 sectionOffset = GetBlocksInfoOffset(m_Header);
@@ -124,13 +137,13 @@ int ArchiveStorageReader::ReadBlockBasedHeader(UInt64 offset) {
         VFS::ReportValueTooLarge();
         return kHeaderShortRead;
     }
-    if (!m_File.Seek(VFS::FileOffset(VFS::FileSize(sectionOffset + offset)), kFileOriginBegin)) return kHeaderShortRead;
+    if (!file.Seek(VFS::FileOffset(VFS::FileSize(sectionOffset + offset)), kFileOriginBegin)) return kHeaderShortRead;
 
     const auto type = static_cast<CompressionType>(m_Header.flags & kArchiveCompressionTypeMask);
-    if (type != kCompressionNone) return ReadCompressedBlocksInfo(type);
+    if (type != kCompressionNone) return ReadCompressedBlocksInfo(file, type);
     Check(m_Header.compressedBlocksInfoSize == m_Header.uncompressedBlocksInfoSize,
           "Archive file has invalid uncompressed header size!");
-    return ReadBlocksInfoSection(m_File);
+    return ReadBlocksInfoSection(file);
 }
 
 // Reads the block list and, where the header says so, the directory behind it.
@@ -174,7 +187,7 @@ bool IsPossibleSize(CompressionType type, UInt64 compressedSize, UInt64 uncompre
 
 } // namespace
 
-int ArchiveStorageReader::ReadCompressedBlocksInfo(CompressionType type) {
+int ArchiveStorageReader::ReadCompressedBlocksInfo(FileAccessor& file, CompressionType type) {
     IDecompressor* decompressor = CreateDecompressor(type, kMemLabelGeneral);
     if (decompressor == nullptr) return kHeaderNotAnArchive;
     struct DeleteAtEnd {
@@ -189,7 +202,7 @@ int ArchiveStorageReader::ReadCompressedBlocksInfo(CompressionType type) {
     ScratchBuffer compressed(compressedSize);
     if (compressedSize != 0) {
         UInt64 delivered = 0;
-        if (compressed.Data() == nullptr || !m_File.Read(compressedSize, compressed.Data(), &delivered) ||
+        if (compressed.Data() == nullptr || !file.Read(compressedSize, compressed.Data(), &delivered) ||
             delivered != compressedSize)
             return kHeaderShortRead;
     }
@@ -210,7 +223,9 @@ int ArchiveStorageReader::ReadCompressedBlocksInfo(CompressionType type) {
 
 bool ArchiveStorageReader::MakeStorageUsed(bool reportErrors) {
     Mutex::AutoLock lock(m_StorageLock);
-    if (m_StorageUseCount++ == 0 && !m_File.Open(m_FileEntry, kFilePermissionRead)) {
+    const bool isFirstUse = m_StorageUseCount++ == 0;
+    if (isFirstUse) m_FilePosition = kUnknownPosition;
+    if (isFirstUse && !m_File.Open(m_FileEntry, kFilePermissionRead)) {
         if (reportErrors) ReportError(Format("Unable to open archive file: %s", m_FileEntry.Path()).c_str());
         return false;
     }
@@ -280,13 +295,9 @@ void ArchiveStorageReader::TryToReadDirectoryFromBlockData(UInt64 from, const vo
 }
 
 bool ArchiveStorageReader::TryReadDirectoryInfoFromFile(IFile* file) {
-    FileEntryData data;
-    data.accessorHandler = New<IFileAdapter>(kMemLabelGeneral, file, kMemLabelGeneral, false);
-    if (data.accessorHandler == nullptr) return false;
-    FileSystemEntry entry(data);
     FileAccessor accessor;
     // An open memory file can be opened, and its start sought.
-    (void)accessor.Open(entry, kFilePermissionRead);
+    if (!OpenFile(file, &accessor)) return false;
     (void)accessor.Seek(0, kFileOriginBegin);
     return ReadDirectoryInfo(accessor, m_Header, m_DirectoryInfo) == kHeaderOk;
 }

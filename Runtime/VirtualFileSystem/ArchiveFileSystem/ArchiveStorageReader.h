@@ -142,11 +142,12 @@ private:
     static constexpr UInt32 kLzmaPropertiesSize = 5;
     static constexpr UInt32 kLzmaSizeFieldSize = 8; // behind the properties, in ZarvoWeb archives
     static constexpr UInt64 kNotBroken = ~UInt64{0};
+    static constexpr UInt64 kUnknownPosition = ~UInt64{0};
 
     // Set-up, in ArchiveStorageReader.cpp. Runs while no other thread uses the reader, so it takes no lock.
     int ReadHeader(UInt64 offset) VARNEX_NO_THREAD_SAFETY_ANALYSIS;
-    int ReadBlockBasedHeader(UInt64 offset) VARNEX_NO_THREAD_SAFETY_ANALYSIS;
-    int ReadCompressedBlocksInfo(CompressionType type) VARNEX_NO_THREAD_SAFETY_ANALYSIS;
+    int ReadBlockBasedHeader(FileAccessor& file, UInt64 offset);
+    int ReadCompressedBlocksInfo(FileAccessor& file, CompressionType type);
     int ReadBlocksInfoSection(FileAccessor& file);
     [[nodiscard]] bool BuildOffsetTables();
     void TryToReadDirectoryFromBlockData(UInt64 from, const void* data, size_t size);
@@ -180,6 +181,7 @@ private:
     CacheResult CopyFromCachedBlock(CachedBlock* record, UInt64 offsetInBlock, UInt64 size, void* destination,
                                     UInt64* delivered, BatchingFileReader* batch);
     bool ReadFromStorage(UInt64 position, UInt64 size, void* destination, UInt64* delivered);
+    bool ReadFile(UInt64 position, UInt64 size, void* destination, UInt64* delivered) VARNEX_REQUIRES(m_StorageLock);
     bool IsBehindStorageEnd(UInt64 position);
 
     ArchiveStorageHeader::Header m_Header;
@@ -196,6 +198,7 @@ private:
     std::atomic<bool> m_DirectoryReady{false};
     FileSystemEntry m_FileEntry VARNEX_GUARDED_BY(m_StorageLock); // queries of it leave a code in it
     FileAccessor m_File VARNEX_GUARDED_BY(m_StorageLock);
+    UInt64 m_FilePosition VARNEX_GUARDED_BY(m_StorageLock) = kUnknownPosition; // of m_File, where a read has left it
     bool m_ReleaseStorageWhenUnused = true;
     UInt64 m_DataOffset = 0; // in the file, of the first stored byte of block 0
     SInt32 m_StorageUseCount VARNEX_GUARDED_BY(m_StorageLock) = 0;

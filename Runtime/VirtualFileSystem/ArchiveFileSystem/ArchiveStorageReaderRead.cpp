@@ -31,8 +31,12 @@ bool ArchiveStorageReader::Read(VFS::FileSize fromPosition, UInt64 size, void* b
     UInt32 end;
     if (size > m_UncompressedBlocksOffsets.back() - from || !FindBlock(from + (size - 1), &end)) return false;
 
-    BatchingFileReader batch(this, start != end ? kBatchSize : 0, m_CompressedBlocksOffsets[start],
-                             m_CompressedBlocksOffsets[end + 1]);
+    // The last block is read whole, or, stored as is, no further than the range goes.
+    UInt64 storedEnd = m_CompressedBlocksOffsets[end + 1];
+    if (GetBlockType(end) == kCompressionNone)
+        storedEnd =
+            std::min(storedEnd, m_CompressedBlocksOffsets[end] + (from + size - m_UncompressedBlocksOffsets[end]));
+    BatchingFileReader batch(this, start != end ? kBatchSize : 0, m_CompressedBlocksOffsets[start], storedEnd);
     UInt8* const destination = static_cast<UInt8*>(buffer);
     UInt64 delivered = 0;
     for (UInt32 index = start; index <= end; ++index) {
@@ -149,7 +153,7 @@ bool ArchiveStorageReader::ReadFromStorage(UInt64 position, UInt64 size, void* d
     if (m_HideLzmaSizeField) {
         if (position < kLzmaPropertiesSize && size != 0) {
             const UInt64 wanted = std::min<UInt64>(kLzmaPropertiesSize - position, size);
-            if (!m_File.Read(VFS::FileSize(filePosition), wanted, to, &firstPart)) return false;
+            if (!ReadFile(filePosition, wanted, to, &firstPart)) return false;
             to += firstPart;
             size -= firstPart;
             filePosition += firstPart;
@@ -162,8 +166,17 @@ bool ArchiveStorageReader::ReadFromStorage(UInt64 position, UInt64 size, void* d
         filePosition += kLzmaSizeFieldSize;
     }
     UInt64 got = 0;
-    const bool isRead = m_File.Read(VFS::FileSize(filePosition), size, to, &got);
+    const bool isRead = ReadFile(filePosition, size, to, &got);
     if (isRead) *delivered = firstPart + got;
+    return isRead;
+}
+
+// Reads at a position, to which the file is moved only when it is elsewhere.
+bool ArchiveStorageReader::ReadFile(UInt64 position, UInt64 size, void* destination, UInt64* delivered) {
+    const bool isThere = position == m_FilePosition;
+    const bool isRead = isThere ? m_File.Read(size, destination, delivered)
+                                : m_File.Read(VFS::FileSize(position), size, destination, delivered);
+    m_FilePosition = isRead ? position + *delivered : kUnknownPosition;
     return isRead;
 }
 
@@ -171,6 +184,7 @@ bool ArchiveStorageReader::ReadFromStorage(UInt64 position, UInt64 size, void* d
 bool ArchiveStorageReader::IsBehindStorageEnd(UInt64 position) {
     if (m_HideLzmaSizeField && position >= kLzmaPropertiesSize) position += kLzmaSizeFieldSize;
     Mutex::AutoLock lock(m_StorageLock);
+    m_FilePosition = kUnknownPosition;
     return m_File.Seek(0, kFileOriginEnd) && m_File.Position() <= VFS::FileSize(m_DataOffset + position);
 }
 
@@ -183,7 +197,9 @@ bool ArchiveStorageReader::BatchingFileReader::Read(void* destination, UInt64 po
     Check(position >= m_StartPos, "Assertion failed on expression: 'position >= m_StartPos'");
     Check(position <= m_EndPos && size <= m_EndPos - position,
           "Assertion failed on expression: 'position + size <= m_EndPos'");
-    if (m_BatchSize <= size || m_LoadedWindowStart > position)
+    // What nothing would be read ahead of needs no window.
+    const bool isRest = position >= m_LoadedWindowEnd && size == m_EndPos - position;
+    if (m_BatchSize <= size || m_LoadedWindowStart > position || isRest)
         return m_Reader->ReadFromStorage(position, size, destination, delivered);
 
     UInt64 current = position;
