@@ -1,0 +1,68 @@
+// The archives that docs/archive-format.md shows in hexadecimal are what the writer makes, and can be extracted.
+#include "Tests/Tools/Extractor/ExtractorTest.h"
+
+#include <sstream>
+
+namespace {
+
+// The bytes of each dump. A line is an offset, bytes that end at two spaces or the line's end, and a note.
+std::vector<std::string> ReadDumps(const std::string& document) {
+    std::vector<std::string> dumps;
+    std::istringstream text(ReadFile(document));
+    bool isInDump = false;
+    for (std::string line; std::getline(text, line);) {
+        if (line.starts_with("```")) {
+            isInDump = line == "```text";
+            if (isInDump) dumps.emplace_back();
+        } else if (isInDump) {
+            EXPECT_EQ(dumps.back().size(), strtoull(line.c_str(), nullptr, 16)) << line;
+            std::istringstream bytes(line.substr(6, line.find("  ", 6) - 6));
+            for (unsigned byte; bytes >> std::hex >> byte;)
+                dumps.back().push_back(static_cast<char>(byte));
+        }
+    }
+    return dumps;
+}
+
+struct ShownArchive {
+    UInt32 version;
+    UInt64 reportedSize;
+    ArchiveDescription description;
+};
+
+std::vector<ShownArchive> ShownArchives() {
+    const ArchiveEntry folder = {.path = "d", .flags = kFolderEntry}, text = {.path = "d/a.txt", .bytes = "text\n"},
+                       run = {.path = "z", .bytes = std::string(32, 'z')},
+                       longRun = {.path = "z", .bytes = std::string(65'536, 'z')};
+    return {
+        {8,
+         208,
+         {.entries = {folder, text, run},
+          .blocks = {{.size = 5}, {.size = 32, .type = kCompressionLz4}},
+          .sectionPadded = true}},
+        {6, 119, {.layout = ArchiveLayout::kWebVersion6, .entries = {text}}},
+        {4, 203, {.layout = ArchiveLayout::kWeb, .entries = {text, longRun}}},
+        {3, 130, {.layout = ArchiveLayout::kRaw, .entries = {text, run}}},
+        {5,
+         0,
+         {.layout = ArchiveLayout::kArchive,
+          .entries = {folder, text, run},
+          .blocks = {{.size = 5}, {.size = 32, .type = kCompressionLzma, .streamed = true}}}},
+    };
+}
+
+TEST(ArchiveFormatDocument, ShowsArchivesThatAreWrittenAndExtracted) {
+    const std::vector<std::string> dumps = ReadDumps(VARNEX_SOURCE_DIR "/docs/archive-format.md");
+    const std::vector<ShownArchive> archives = ShownArchives();
+    ASSERT_EQ(archives.size(), dumps.size());
+    for (size_t index = 0; index < dumps.size(); ++index) {
+        SCOPED_TRACE(testing::Message() << "dump " << index);
+        ArchiveDescription description = archives[index].description;
+        description.version = archives[index].version;
+        EXPECT_EQ(BuildArchive(description).bytes, dumps[index]);
+        ExpectOutcome(0, Report(archives[index].version, archives[index].reportedSize), TreeOf(description.entries),
+                      Extract(dumps[index]));
+    }
+}
+
+} // namespace
