@@ -1,0 +1,70 @@
+// The messages in the sources, the manual page and the README. Counted are the texts that puts, printf, printf_console
+// and ReportError are given: a user meets them. Failed checks speak to developers; the manual page names some of them.
+#include "Tests/Support/TemporaryFolder.h"
+
+#include <filesystem>
+#include <gtest/gtest.h>
+#include <regex>
+#include <set>
+
+namespace {
+
+const std::string kRoot = VARNEX_SOURCE_DIR "/";
+
+std::string Replace(const std::string& text, const char* pattern, const char* with) {
+    return std::regex_replace(text, std::regex(pattern), with);
+}
+
+// The first group of every match.
+std::vector<std::string> FindAll(const std::string& text, const char* pattern) {
+    const std::regex regex(pattern);
+    return {std::sregex_token_iterator(text.begin(), text.end(), regex, 1), std::sregex_token_iterator()};
+}
+
+// All that the command is made of, without comments. A literal is in one piece and without its last newline.
+std::string ReadSources() {
+    std::string code;
+    for (const char* const folder : {"Tools/Extractor", "Runtime", "Footing"})
+        for (const auto& entry : std::filesystem::recursive_directory_iterator(kRoot + folder))
+            if (entry.path().extension() == ".cpp" || entry.path().extension() == ".h")
+                code += ReadFile(entry.path()) + "\n";
+    code = Replace(Replace(code, "\n *//[^\n]*", "\n"), "\"\\s+\"", "");
+    return Replace(Replace(code, " *\\\\n\"", "\""), "%(s|d|i|llu)", "%");
+}
+
+std::string ReadSection(const char* document, const std::string& start, const std::string& end) {
+    const std::string text = ReadFile(kRoot + document);
+    const size_t from = text.find("\n" + start + "\n");
+    return from == std::string::npos ? "" : text.substr(from, text.find("\n" + end, from + start.size()) - from);
+}
+
+TEST(Messages, AreThoseOfTheManualPageAndTheReadme) {
+    const std::string code = ReadSources();
+    EXPECT_FALSE(std::regex_search(code, std::regex("\\b(fputs|fprintf|fwrite|putchar|perror|cout|cerr)\\b")));
+    std::set<std::string> printed, explained, checks, listed;
+    for (const std::string& literal : FindAll(
+             code,
+             "\\b(?:puts|printf|printf_console|ReportError)\\((?!const char)\\s*(?:Format\\(\\s*)?(?:\"([^\"]*)\")?"))
+        printed.insert(literal);
+    EXPECT_EQ(0u, printed.count("")) << "a message is not written where it is printed";
+    // Of operations that the command never asks for.
+    EXPECT_EQ(1u, printed.erase("Creating user config folder: %"));
+    EXPECT_EQ(1u, printed.erase("statvfs failed with errno=%; path was %"));
+    EXPECT_LT(15u, printed.size());
+
+    for (const std::string& line : FindAll(ReadSection("man/Varnex.1", ".SH MESSAGES", ".SH"), "\n\\.BI ([^\n]*)")) {
+        std::string text; // literals and placeholders take turns
+        for (const std::string& argument : FindAll(line, "(\"[^\"]*\"|\\S+)"))
+            text += argument[0] == '"' ? argument.substr(1, argument.size() - 2) : "%";
+        text = Replace(text, "\\\\\\(aq", "'");
+        EXPECT_NE(std::string::npos, code.find('"' + text + '"')) << text;
+        EXPECT_TRUE((printed.count(text) != 0 ? explained : checks).insert(text).second) << text;
+    }
+    for (const std::string& text : FindAll(ReadSection("README.md", "## Messages", "## "), "\n\\| `([^`]*)`"))
+        listed.insert(Replace(text, "%(s|d|i|llu)", "%"));
+    EXPECT_EQ(printed, explained);
+    EXPECT_EQ(printed, listed);
+    EXPECT_LT(3u, checks.size());
+}
+
+} // namespace
