@@ -11,6 +11,7 @@
 // The values that a description gives to fields, and which of them have been stored.
 struct GivenFields {
     const std::map<std::string, UInt64>& values;
+    bool namesMatter = true; // false: nobody asks for a field by its name, so none is remembered
     std::set<std::string> stored = {};
 };
 
@@ -43,10 +44,12 @@ public:
 
 private:
     void Put(const std::string& name, UInt32 size, UInt64 value) {
-        const auto given = m_Given.values.find(name);
-        if (given != m_Given.values.end()) value = given->second;
-        m_Given.stored.insert(name);
-        m_Fields[name] = {m_Bytes.size(), size};
+        if (m_Given.namesMatter) {
+            const auto given = m_Given.values.find(name);
+            if (given != m_Given.values.end()) value = given->second;
+            m_Given.stored.insert(name);
+            m_Fields[name] = {m_Bytes.size(), size};
+        }
         for (UInt32 byte = 0; byte < size; ++byte)
             m_Bytes.push_back(static_cast<char>(value >> (8 * (size - 1 - byte))));
     }
@@ -60,13 +63,6 @@ struct PlacedNode {
     const ArchiveEntry* entry;
     UInt64 offset;
     UInt64 size;
-};
-
-struct StoredBlock {
-    UInt64 uncompressedSize;
-    UInt64 compressedSize;
-    CompressionType type;
-    bool streamed;
 };
 
 // What stands around the data.

@@ -7,14 +7,13 @@
 #include <cstdlib>
 #include <filesystem>
 #include <fstream>
-#include <functional>
 
 // The archive is made in three parts: what stands before the data (head), the data, what stands behind it (tail). The
 // data is made first, since the sizes of the stored blocks stand in one of the other two.
 
 namespace {
 
-constexpr UInt64 kLzmaPropertiesSize = 5;
+constexpr UInt64 kPieceSize = 1'048'576; // of what need not be in memory whole
 
 void Require(bool isTrue, const std::string& message) {
     if (isTrue) return;
@@ -37,16 +36,21 @@ public:
     UInt64 Size() const { return m_Size; }
     const std::vector<PlacedNode>& Nodes() const { return m_Nodes; }
 
-    // The next bytes of the stream.
-    std::string Read(UInt64 size) {
-        std::string piece;
-        while (piece.size() < size) {
-            if (m_Taken == m_Pending.size()) LoadPending(size - piece.size());
-            const size_t count = std::min<size_t>(size - piece.size(), m_Pending.size() - m_Taken);
-            piece.append(m_Pending, m_Taken, count);
-            m_Taken += count;
-        }
+    // The next bytes of the stream, at most size; valid until the next call.
+    std::string_view Next(UInt64 size) {
+        while (m_Taken == m_Pending.size())
+            LoadPending(size);
+        const std::string_view piece = std::string_view(m_Pending).substr(m_Taken, size);
+        m_Taken += piece.size();
         return piece;
+    }
+
+    std::string Read(UInt64 size) {
+        std::string bytes;
+        bytes.reserve(size);
+        while (bytes.size() < size)
+            bytes += Next(size - bytes.size());
+        return bytes;
     }
 
 private:
@@ -104,10 +108,50 @@ CompressionType TypeOf(const ArchiveDescription& description, const ArchiveBlock
     return block.type.value_or(description.type);
 }
 
-using Sink = std::function<void(const std::string& bytes)>;
+// Stores the next block of the stream; its stored size.
+UInt64 StoreBlock(const ArchiveDescription& description, const ArchiveBlock& block, DataStream& stream,
+                  const ByteSink& sink) {
+    UInt64 storedSize = 0;
+    const auto store = [&](std::string_view bytes) {
+        sink(bytes);
+        storedSize += bytes.size();
+    };
+    UInt64 left = block.size;
+    const auto next = [&](size_t size) {
+        const std::string_view piece = left == 0 ? std::string_view() : stream.Next(std::min<UInt64>(left, size));
+        left -= piece.size();
+        return piece;
+    };
+    if (block.stored) {
+        store(*block.stored);
+        while (left != 0)
+            next(kPieceSize);
+        return storedSize;
+    }
+    switch (const CompressionType type = TypeOf(description, block)) {
+    case kCompressionLz4:
+    case kCompressionLz4HC: store(Compress(type, stream.Read(block.size))); break;
+    case kCompressionLzma: {
+        // The legacy stream has the size of its data, least significant byte first, behind the properties.
+        std::string sizeField;
+        for (int byte = 0; byte < 8 && description.layout == ArchiveLayout::kWeb; ++byte)
+            sizeField.push_back(static_cast<char>(block.size >> (8 * byte)));
+        const auto storeCoded = [&](std::string_view bytes) {
+            store(bytes);
+            if (storedSize == kLzmaPropertiesSize) store(sizeField);
+        };
+        CompressLzma(next, storeCoded, description.lzma);
+        break;
+    }
+    default:
+        while (left != 0)
+            store(next(kPieceSize));
+    }
+    return storedSize;
+}
 
 // Stores the stream block by block.
-std::vector<StoredBlock> StoreBlocks(const ArchiveDescription& description, DataStream& stream, const Sink& sink) {
+std::vector<StoredBlock> StoreBlocks(const ArchiveDescription& description, DataStream& stream, const ByteSink& sink) {
     std::vector<ArchiveBlock> cut = description.blocks;
     UInt64 position = 0;
     for (const ArchiveBlock& block : cut)
@@ -121,27 +165,25 @@ std::vector<StoredBlock> StoreBlocks(const ArchiveDescription& description, Data
 
     std::vector<StoredBlock> stored;
     for (const ArchiveBlock& block : cut) {
-        const CompressionType type = TypeOf(description, block);
-        const std::string plain = stream.Read(block.size);
-        std::string bytes = block.stored ? *block.stored : Compress(type, plain, description.lzma);
-        // The legacy stream has the size of its data, least significant byte first, behind the properties.
-        if (description.layout == ArchiveLayout::kWeb && !block.stored) {
-            std::string sizeField;
-            for (int byte = 0; byte < 8; ++byte)
-                sizeField.push_back(static_cast<char>(plain.size() >> (8 * byte)));
-            bytes.insert(kLzmaPropertiesSize, sizeField);
-        }
-        sink(bytes);
-        stored.push_back({block.size, bytes.size(), type, block.streamed.value_or(description.streamed)});
+        const UInt64 storedSize = StoreBlock(description, block, stream, sink);
+        stored.push_back(
+            {block.size, storedSize, TypeOf(description, block), block.streamed.value_or(description.streamed)});
     }
     return stored;
 }
 
 // Makes all parts; the data goes to the sink.
-Frame MakeParts(const ArchiveDescription& description, GivenFields& given, const Sink& sink) {
+Frame MakeParts(const ArchiveDescription& description, GivenFields& given, const ByteSink& sink,
+                ArchivePlan* plan = nullptr) {
     DataStream stream(description, given);
     const std::vector<StoredBlock> blocks = StoreBlocks(description, stream, sink);
     Frame frame = MakeFrame(description, given, blocks, stream.Nodes());
+    if (plan != nullptr) {
+        plan->dataOffset = frame.head.Size();
+        plan->blocks = blocks;
+        for (const PlacedNode& node : stream.Nodes())
+            plan->nodes.push_back({node.entry->path, node.entry->flags, node.offset, node.size});
+    }
     for (const auto& [name, value] : description.fields)
         Require(given.stored.count(name) != 0, "no field is named " + name);
     return frame;
@@ -149,7 +191,7 @@ Frame MakeParts(const ArchiveDescription& description, GivenFields& given, const
 
 void AppendFile(std::ofstream& output, const std::string& path) {
     std::ifstream input(path, std::ios::binary);
-    std::string piece(1 << 20, '\0');
+    std::string piece(kPieceSize, '\0');
     while (input.read(piece.data(), static_cast<std::streamsize>(piece.size())), input.gcount() > 0)
         output.write(piece.data(), input.gcount());
 }
@@ -160,7 +202,7 @@ BuiltArchive BuildArchive(const ArchiveDescription& description) {
     BuiltArchive built;
     GivenFields given{description.fields};
     std::string data;
-    const Frame frame = MakeParts(description, given, [&](const std::string& bytes) { data += bytes; });
+    const Frame frame = MakeParts(description, given, [&](std::string_view bytes) { data += bytes; });
 
     DataStream stream(description, given);
     if (description.layout == ArchiveLayout::kRaw)
@@ -176,12 +218,14 @@ BuiltArchive BuildArchive(const ArchiveDescription& description) {
     return built;
 }
 
-void WriteArchive(const ArchiveDescription& description, const std::string& outputFile) {
+ArchivePlan WriteArchive(const ArchiveDescription& description, const std::string& outputFile) {
     // The data is written first and its sizes stand before it, so it waits in a file of its own.
     const std::string dataFile = outputFile + ".data";
-    GivenFields given{description.fields};
+    GivenFields given{description.fields, !description.fields.empty()};
+    ArchivePlan plan;
     std::ofstream data(dataFile, std::ios::binary | std::ios::trunc);
-    const Frame frame = MakeParts(description, given, [&](const std::string& bytes) { data << bytes; });
+    const Frame frame = MakeParts(
+        description, given, [&](std::string_view bytes) { data << bytes; }, &plan);
     data.close();
     Require(!data.fail(), "can't write " + dataFile);
 
@@ -193,9 +237,10 @@ void WriteArchive(const ArchiveDescription& description, const std::string& outp
     Require(!output.fail(), "can't write " + outputFile);
     std::error_code error;
     Require(std::filesystem::remove(dataFile, error), "can't remove " + dataFile);
+    return plan;
 }
 
-void PackFolder(const std::string& folder, const std::string& outputFile, ArchiveDescription form) {
+ArchivePlan PackFolder(const std::string& folder, const std::string& outputFile, ArchiveDescription form) {
     std::map<std::string, bool> isFolderByPath;
     std::error_code error;
     std::filesystem::recursive_directory_iterator entry(folder, error), end;
@@ -212,5 +257,5 @@ void PackFolder(const std::string& folder, const std::string& outputFile, Archiv
         else
             form.entries.push_back({.path = relative, .sourceFile = path});
     }
-    WriteArchive(form, outputFile);
+    return WriteArchive(form, outputFile);
 }

@@ -95,9 +95,30 @@ struct BuiltArchive {
 
 BuiltArchive BuildArchive(const ArchiveDescription& description);
 
-// Writes the archive to a file. Only one block, the section and what the description itself holds are in memory.
-void WriteArchive(const ArchiveDescription& description, const std::string& outputFile);
+struct StoredBlock {
+    UInt64 uncompressedSize;
+    UInt64 compressedSize;
+    CompressionType type;
+    bool streamed;
+};
+
+// Where everything lies in an archive that has been written to a file.
+struct ArchivePlan {
+    struct Node {
+        std::string path;
+        UInt32 flags;
+        UInt64 offset; // in the data stream
+        UInt64 size;
+    };
+    UInt64 dataOffset;
+    std::vector<StoredBlock> blocks; // from dataOffset on
+    std::vector<Node> nodes;
+};
+
+// Writes the archive to a file. Only one LZ4 block or what the LZMA encoder needs, the section and what the description
+// itself holds are in memory.
+ArchivePlan WriteArchive(const ArchiveDescription& description, const std::string& outputFile);
 
 // An archive of every file and folder below a folder, in the order of their paths; form gives all but the entries. The
 // legacy layouts hold files only.
-void PackFolder(const std::string& folder, const std::string& outputFile, ArchiveDescription form);
+ArchivePlan PackFolder(const std::string& folder, const std::string& outputFile, ArchiveDescription form);

@@ -8,8 +8,6 @@
 
 namespace {
 
-constexpr size_t kLzmaPropertiesSize = 5;
-
 void* AllocateForEncoder(void*, size_t size) { return malloc(size); }
 void FreeForEncoder(void*, void* address) { free(address); }
 
@@ -20,25 +18,63 @@ void RequireEncoded(bool isEncoded, const char* encoder) {
     abort();
 }
 
+// The SDK's streams: its functions find the rest of the record behind the pointer to its first member.
+struct EncoderInput {
+    ISeqInStream stream;
+    const ByteSource& source;
+};
+
+struct EncoderOutput {
+    ISeqOutStream stream;
+    const ByteSink& sink;
+};
+
+SRes ReadForEncoder(void* stream, void* buffer, size_t* size) {
+    const std::string_view piece = static_cast<EncoderInput*>(stream)->source(*size);
+    *size = piece.copy(static_cast<char*>(buffer), piece.size());
+    return SZ_OK;
+}
+
+size_t WriteForEncoder(void* stream, const void* bytes, size_t size) {
+    static_cast<EncoderOutput*>(stream)->sink({static_cast<const char*>(bytes), size});
+    return size;
+}
+
 } // namespace
 
-std::string CompressLzma(std::string_view plain, const LzmaSettings& settings) {
+void CompressLzma(const ByteSource& source, const ByteSink& sink, const LzmaSettings& settings) {
     CLzmaEncProps properties;
     LzmaEncProps_Init(&properties);
     properties.level = settings.level;
     properties.dictSize = settings.dictionarySize;
+    properties.writeEndMark = settings.endMark ? 1 : 0;
     properties.numThreads = 1;
 
     ISzAlloc allocator = {AllocateForEncoder, FreeForEncoder};
-    std::string stored(kLzmaPropertiesSize + plain.size() + plain.size() / 3 + 128, '\0');
-    Byte* const bytes = reinterpret_cast<Byte*>(stored.data());
-    size_t propertiesSize = kLzmaPropertiesSize;
-    size_t codedSize = stored.size() - kLzmaPropertiesSize;
-    const SRes result =
-        LzmaEncode(bytes + kLzmaPropertiesSize, &codedSize, reinterpret_cast<const Byte*>(plain.data()), plain.size(),
-                   &properties, bytes, &propertiesSize, settings.endMark ? 1 : 0, nullptr, &allocator, &allocator);
-    RequireEncoded(result == SZ_OK && propertiesSize == kLzmaPropertiesSize, "LzmaEncode");
-    stored.resize(kLzmaPropertiesSize + codedSize);
+    Byte propertyBytes[kLzmaPropertiesSize];
+    SizeT propertiesSize = sizeof(propertyBytes);
+    const CLzmaEncHandle encoder = LzmaEnc_Create(&allocator);
+    RequireEncoded(encoder != nullptr && LzmaEnc_SetProps(encoder, &properties) == SZ_OK &&
+                       LzmaEnc_WriteProperties(encoder, propertyBytes, &propertiesSize) == SZ_OK,
+                   "LzmaEnc");
+    sink({reinterpret_cast<const char*>(propertyBytes), propertiesSize});
+
+    EncoderInput input{{ReadForEncoder}, source};
+    EncoderOutput output{{WriteForEncoder}, sink};
+    RequireEncoded(LzmaEnc_Encode(encoder, &output.stream, &input.stream, nullptr, &allocator, &allocator) == SZ_OK,
+                   "LzmaEnc");
+    LzmaEnc_Destroy(encoder, &allocator, &allocator);
+}
+
+std::string CompressLzma(std::string_view plain, const LzmaSettings& settings) {
+    std::string stored;
+    const ByteSource source = [&](size_t size) {
+        const std::string_view piece = plain.substr(0, size);
+        plain.remove_prefix(piece.size());
+        return piece;
+    };
+    CompressLzma(
+        source, [&](std::string_view bytes) { stored += bytes; }, settings);
     return stored;
 }
 

@@ -5,8 +5,11 @@
 
 #include "Runtime/Utilities/Compression/Compression.h"
 
+#include <functional>
 #include <string>
 #include <string_view>
+
+constexpr size_t kLzmaPropertiesSize = 5;
 
 struct LzmaSettings {
     bool endMark = false;           // close the stream with the end mark
@@ -14,7 +17,13 @@ struct LzmaSettings {
     UInt32 dictionarySize = 65'536; // at least 4,096
 };
 
-// 5 bytes of properties, then the coded bytes: the form that archives store, without the legacy size field.
+// The next bytes to compress, at most size; none at the end.
+using ByteSource = std::function<std::string_view(size_t size)>;
+using ByteSink = std::function<void(std::string_view bytes)>;
+
+// The properties, then the coded bytes: the form that archives store, without the legacy size field. The properties go
+// to the sink in a call of their own; the first form holds no more in memory than the encoder needs.
+void CompressLzma(const ByteSource& source, const ByteSink& sink, const LzmaSettings& settings);
 std::string CompressLzma(std::string_view plain, const LzmaSettings& settings = {});
 
 // One LZ4 block each.

@@ -1,0 +1,198 @@
+// The least that extracting an archive can cost: Floor ARCHIVE FOLDER
+//
+// Reads ARCHIVE.plan (see PackFolder.cpp), so it parses and checks nothing of the archive; decodes the blocks, one call
+// each, into one buffer, and makes each file of FOLDER with open, one write and close, each folder with mkdir. Stored
+// blocks are read in pieces. Files must be below 2 GiB. An unexpected
+// result ends it with status 1.
+#include "Runtime/Utilities/Compression/Compression.h"
+
+#include <algorithm>
+#include <cerrno>
+#include <cstdio>
+#include <cstdlib>
+#include <cstring>
+#include <fcntl.h>
+#include <lz4.h>
+#include <lzma/LzmaDec.h>
+#include <string>
+#include <string_view>
+#include <sys/stat.h>
+#include <unistd.h>
+#include <vector>
+
+namespace {
+
+constexpr UInt64 kStoredPiece = 131'072;
+constexpr UInt64 kSlack = 1'048'576; // bytes that have been written stay in the buffer until there are so many
+constexpr UInt64 kLzmaPropertiesSize = 5;
+
+void Require(bool isTrue, const char* what) {
+    if (isTrue) return;
+    perror(what);
+    exit(1);
+}
+
+void* AllocateForDecoder(void*, size_t size) { return malloc(size); }
+void FreeForDecoder(void*, void* address) { free(address); }
+
+struct Block {
+    UInt64 storedSize, size, type, behind;
+};
+
+struct Node {
+    UInt64 flags, offset, size;
+    std::string path;
+};
+
+struct Plan {
+    UInt64 dataOffset = 0;
+    std::vector<Block> blocks = {};
+    std::vector<Node> nodes = {};
+};
+
+Plan ReadPlan(const char* path) {
+    const int file = open(path, O_RDONLY);
+    struct stat status;
+    Require(file >= 0 && fstat(file, &status) == 0, path);
+    std::string text(static_cast<size_t>(status.st_size), '\0');
+    Require(read(file, text.data(), text.size()) == status.st_size, path);
+    close(file);
+
+    Plan plan;
+    char* next = text.data();
+    char* const end = next + text.size();
+    const auto number = [&] { return strtoull(next, &next, 10); };
+    while (next < end) {
+        const char kind = *next;
+        next = strchr(next, ' ');
+        if (kind == 'd') plan.dataOffset = number();
+        if (kind == 'b') plan.blocks.push_back(Block{number(), number(), number(), number()});
+        if (kind == 'n') plan.nodes.push_back(Node{number(), number(), number(), {}});
+        char* const lineEnd = strchr(next, '\n');
+        if (kind == 'n') plan.nodes.back().path.assign(next + 1, lineEnd);
+        next = lineEnd + 1;
+    }
+    return plan;
+}
+
+// The data stream, of which a part that only moves forward is in memory.
+class Stream {
+public:
+    Stream(const char* archive, const Plan& plan)
+        : m_Archive(open(archive, O_RDONLY)), m_Plan(plan), m_Position(plan.dataOffset) {
+        Require(m_Archive >= 0, archive);
+        UInt64 largestFile = 0, largestBlock = kStoredPiece, largestStored = 0;
+        for (const Node& node : plan.nodes)
+            largestFile = std::max(largestFile, node.size);
+        for (const Block& block : plan.blocks) {
+            if (block.type == kCompressionNone) continue;
+            largestBlock = std::max(largestBlock, block.size);
+            largestStored = std::max(largestStored, block.storedSize);
+        }
+        // Not a vector: what the decoder overwrites need not be cleared.
+        m_Buffer = static_cast<char*>(malloc(kSlack + largestFile + 2 * largestBlock));
+        m_Stored = static_cast<char*>(malloc(largestStored + 1));
+        Require(m_Buffer != nullptr && m_Stored != nullptr, "malloc");
+    }
+
+    // Those bytes; offsets must not go back.
+    const char* At(UInt64 offset, UInt64 size) {
+        while (m_Start + m_Filled < offset + size) {
+            const UInt64 written = offset - m_Start;
+            if (written > kSlack) {
+                m_Filled -= std::min(m_Filled, written);
+                memmove(m_Buffer, m_Buffer + written, m_Filled);
+                m_Start = offset;
+            }
+            DecodeNext();
+        }
+        return m_Buffer + (offset - m_Start);
+    }
+
+private:
+    void ReadStored(char* to, UInt64 size) {
+        Require(pread(m_Archive, to, size, static_cast<off_t>(m_Position)) == static_cast<ssize_t>(size), "pread");
+        m_Position += size;
+    }
+
+    void DecodeNext() {
+        Require(m_NextBlock < m_Plan.blocks.size(), "the blocks end too early");
+        const Block& block = m_Plan.blocks[m_NextBlock];
+        char* const to = m_Buffer + m_Filled;
+        if (block.type == kCompressionNone) {
+            const UInt64 size = std::min(kStoredPiece, block.size - m_TakenOfStored);
+            ReadStored(to, size);
+            m_Filled += size;
+            m_TakenOfStored += size;
+            if (m_TakenOfStored < block.size) return;
+            m_TakenOfStored = 0;
+        } else {
+            ReadStored(m_Stored, block.storedSize);
+            if (block.type == kCompressionLzma)
+                DecodeLzma(block, to);
+            else
+                Require(LZ4_decompress_safe(m_Stored, to, static_cast<int>(block.storedSize),
+                                            static_cast<int>(block.size)) == static_cast<int>(block.size),
+                        "LZ4_decompress_safe");
+            m_Filled += block.size;
+        }
+        ++m_NextBlock;
+    }
+
+    void DecodeLzma(const Block& block, char* to) {
+        ISzAlloc allocator = {AllocateForDecoder, FreeForDecoder};
+        SizeT size = block.size, storedSize = block.storedSize - block.behind;
+        const Byte* const stored = reinterpret_cast<const Byte*>(m_Stored);
+        ELzmaStatus status;
+        const SRes result = LzmaDecode(reinterpret_cast<Byte*>(to), &size, stored + block.behind, &storedSize, stored,
+                                       kLzmaPropertiesSize, LZMA_FINISH_ANY, &status, &allocator);
+        Require(result == SZ_OK && size == block.size, "LzmaDecode");
+    }
+
+    int m_Archive;
+    const Plan& m_Plan;
+    UInt64 m_Position;          // in the archive, of the next stored byte
+    size_t m_NextBlock = 0;     // to be decoded
+    UInt64 m_TakenOfStored = 0; // of a stored block, which is read in pieces
+    UInt64 m_Start = 0;         // in the data stream, of the buffer's first byte
+    UInt64 m_Filled = 0;        // of the buffer
+    char* m_Buffer;             // until the program ends
+    char* m_Stored;             // one block's bytes
+};
+
+// Makes the folder of a file, and those above it, unless the file before it lay in the same one.
+void MakeParent(std::string_view path, std::string* last) {
+    const size_t slash = path.rfind('/');
+    if (slash == std::string_view::npos || path.substr(0, slash) == *last) return;
+    *last = path.substr(0, slash);
+    for (size_t end = last->find('/');; end = last->find('/', end + 1)) {
+        Require(mkdir(last->substr(0, end).c_str(), 0777) == 0 || errno == EEXIST, last->c_str());
+        if (end == std::string::npos) return;
+    }
+}
+
+} // namespace
+
+int main(int argumentCount, char** arguments) {
+    if (argumentCount != 3) return 2;
+    const Plan plan = ReadPlan((std::string(arguments[1]) + ".plan").c_str());
+    Stream stream(arguments[1], plan);
+    Require(mkdir(arguments[2], 0777) == 0 && chdir(arguments[2]) == 0, arguments[2]);
+    const bool hasFolders =
+        std::any_of(plan.nodes.begin(), plan.nodes.end(), [](const Node& n) { return n.flags & 1; });
+    std::string lastParent;
+    for (const Node& node : plan.nodes) {
+        const char* const path = node.path.c_str();
+        if ((node.flags & 1) != 0) {
+            Require(mkdir(path, 0777) == 0, path);
+            continue;
+        }
+        if (!hasFolders) MakeParent(node.path, &lastParent);
+        const char* const bytes = stream.At(node.offset, node.size);
+        const int file = open(path, O_WRONLY | O_CREAT | O_TRUNC, 0666);
+        Require(file >= 0, path);
+        if (node.size != 0) Require(write(file, bytes, node.size) == static_cast<ssize_t>(node.size), path);
+        Require(close(file) == 0, path);
+    }
+    return 0;
+}
