@@ -1,6 +1,6 @@
 // File flags, which this system's files do not have. A file's flags are an extended attribute of it, as decimal digits.
-// What can't have one (pipes, devices, files on systems without extended attributes, files that even their owner may
-// not write) is kept in a table, for as long as the process lives.
+// Where that can't be written (pipes, devices, systems without extended attributes, files that even their owner may not
+// write), they are kept in a table for as long as the process lives, and the table is asked first.
 #include "PlatformDependent/OSX/Standin/FileFlags.h"
 
 #include "PlatformDependent/OSX/Standin/Faults.h"
@@ -36,14 +36,17 @@ bool IdentityOf(const char* path, FileIdentity* identity) {
 } // namespace
 
 uint32_t FileFlagsOf(const char* path) {
-    char digits[16] = {};
-    if (getxattr(path, kAttribute, digits, sizeof(digits) - 1) > 0)
-        return static_cast<uint32_t>(strtoul(digits, nullptr, 10));
+    const int errorBefore = errno;
     const std::lock_guard lock(gTableLock);
     FileIdentity identity;
-    if (gTable.empty() || !IdentityOf(path, &identity)) return 0;
-    const auto found = gTable.find(identity);
-    return found != gTable.end() ? found->second : 0;
+    uint32_t flags = 0;
+    char digits[16] = {};
+    if (!gTable.empty() && IdentityOf(path, &identity) && gTable.count(identity) != 0)
+        flags = gTable[identity];
+    else if (getxattr(path, kAttribute, digits, sizeof(digits) - 1) > 0)
+        flags = static_cast<uint32_t>(strtoul(digits, nullptr, 10));
+    errno = errorBefore;
+    return flags;
 }
 
 int PlatformStat(const char* path, PlatformStatus* status) {
@@ -64,11 +67,9 @@ int chflags(const char* path, uint32_t flags) {
 
     const std::lock_guard lock(gTableLock);
     gTable.erase(identity);
-    if (flags == 0) {
-        (void)removexattr(path, kAttribute); // there may be none
-        return 0;
-    }
     const std::string digits = std::to_string(flags);
-    if (setxattr(path, kAttribute, digits.data(), digits.size(), 0) != 0) gTable[identity] = flags;
+    const bool isStored = flags == 0 ? removexattr(path, kAttribute) == 0 || errno == ENODATA
+                                     : setxattr(path, kAttribute, digits.data(), digits.size(), 0) == 0;
+    if (!isStored) gTable[identity] = flags; // 0 too: the attribute that could not be changed says otherwise
     return 0;
 }

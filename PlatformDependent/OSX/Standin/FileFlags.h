@@ -3,5 +3,5 @@
 
 #include <PlatformSystem.h>
 
-// Follows links; 0 for what is missing. Any thread.
+// Follows links; 0 for what is missing. Leaves errno as it is. Any thread.
 uint32_t FileFlagsOf(const char* path);

@@ -7,7 +7,7 @@
 #include <ctime>
 #include <sys/stat.h>
 
-// File flags. They are kept with the file, in an extended attribute, or where the file can't have one, in this process.
+// File flags. They are kept with the file, in an extended attribute, or where that can't be written, in this process.
 constexpr uint32_t UF_HIDDEN = 0x8000;
 
 struct PlatformStatus : stat {
