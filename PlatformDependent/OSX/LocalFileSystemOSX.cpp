@@ -27,7 +27,7 @@ static_assert(kStatusQuery == 0x334);
 [[maybe_unused]] const char* ErrorText(int, const char* buffer) { return buffer; }
 [[maybe_unused]] const char* ErrorText(const char* text, const char*) { return text; }
 
-core::basic_string<char> HomeFolder() { return MakeString(NSHomeDirectory()); }
+core::basic_string<char> HomeFolder() { return MakeString(Platform_HomeDirectory()); }
 
 } // namespace
 
@@ -60,14 +60,15 @@ bool LocalFileSystemOSX::CreateAsFile(FileEntryData& entry) {
 bool LocalFileSystemOSX::MoveToTrash(FileEntryData& entry) {
     NSURL* url = NSURL_URLByResolvingSymlinksInPath(NSURL_fileURLWithPath(MakeNSString(entry.path)));
     const core::basic_string_ref<char> resolved = NSURL_fileSystemRepresentation(url);
-    if (resolved.length() > kMaxPathLength) return false; // cut, it would name something else
     strcpy_truncate(entry.path, resolved.data(), sizeof(entry.path), resolved.length());
+    // What is cut, or has a backslash, would name something else further on; nothing takes the whole disk.
+    if (resolved.length() > kMaxPathLength || strchr(entry.path, '\\') != nullptr || resolved == "/") return false;
     if (!IsPathCreated(entry.path)) return false;
 
     const core::basic_string<char> path = PathToAbsolutePath(entry.path);
     int tag = 0;
     // What counts is whether the path is gone, not what the workspace says.
-    (void)NSWorkspace_performFileOperation(NSWorkspaceRecycleOperation, MakeNSString(DeleteLastPathNameComponent(path)),
+    (void)NSWorkspace_performFileOperation(Platform_RecycleOperation(), MakeNSString(DeleteLastPathNameComponent(path)),
                                            MakeNSString(""),
                                            NSArray_arrayWithObject(MakeNSString(GetLastPathNameComponent(path))), &tag);
     if (IsPathCreated(path)) (void)DeleteFileOrDirectory(path); // the test below tells
@@ -75,10 +76,7 @@ bool LocalFileSystemOSX::MoveToTrash(FileEntryData& entry) {
 }
 
 bool LocalFileSystemOSX::Target(const FileEntryData& entry, FileSystemEntry& target) const {
-    const core::basic_string<char> path =
-        MakeString(NSString_stringByResolvingSymlinksInPath(MakeNSString(entry.path)));
-    if (path.length() > kMaxPathLength) return false; // cut, it would name something else
-    target = FileSystemEntry(path);
+    target = FileSystemEntry(MakeString(NSString_stringByResolvingSymlinksInPath(MakeNSString(entry.path))));
     return true;
 }
 
@@ -150,7 +148,7 @@ core::basic_string<char> LocalFileSystemOSX::GetUserAppDataFolder() const {
 core::basic_string<char> LocalFileSystemOSX::GetSharedApplicationDataFolder() const {
     const AutoreleasePool pool;
     return MakeString(NSArray_firstObject(
-        NSSearchPathForDirectoriesInDomains(NSApplicationSupportDirectory, NSLocalDomainMask, true)));
+        Platform_SearchPathForDirectoriesInDomains(NSApplicationSupportDirectory, NSLocalDomainMask, true)));
 }
 
 core::basic_string<char> LocalFileSystemOSX::LastErrorMessage() {

@@ -3,7 +3,8 @@
 // workspace, and the folders of application and user are the platform's.
 //
 // No operation here records a lastError. Any thread, as for the POSIX back end. Where it differs from that one:
-//  - paths that are not valid UTF-8 can't be handed to the platform: such a path is not listed, copied or thrown away;
+//  - a path that is not valid UTF-8, which the platform's own disks do not hold, can't be handed to its services. It is
+//    listed as it stands, but nothing is made, copied or thrown away there;
 //  - a name that starts with "." is listed as hidden, but only the file flag counts for the filters and for IsHidden;
 //  - a folder that can't be opened is listed as empty, with success; a listed folder has size 0, and a listed link that
 //    does not lead to a folder the size and time of the link itself; no listed entry is ever marked read-only;
@@ -24,11 +25,12 @@ public:
 
     bool CreateAsFile(FileEntryData& entry) override;
 
-    // Of a link, what it leads to goes to the trash. The entry's path becomes the resolved one, also on failure. What
-    // the trash does not take is deleted. True when the path is gone.
+    // Of a link, what it leads to goes to the trash. The entry's path becomes the resolved one, also on failure; when
+    // that is longer than an entry holds it is cut and nothing is thrown away, nor is a path with a backslash or "/".
+    // What the trash does not take is deleted. True when the path is gone.
     bool MoveToTrash(FileEntryData& entry) override;
 
-    // The target need not exist; false only when its path is longer than an entry holds.
+    // Always true: the target need not exist. A path that is longer than an entry holds is cut.
     bool Target(const FileEntryData& entry, FileSystemEntry& target) const override;
 
     // Copies folders too, with their contents; false when the destination exists.
@@ -40,7 +42,7 @@ public:
     FileEntryInfoQueryFlags GetFileEntryInfo(const FileEntryData& entry, FileEntryInfo& info,
                                              FileEntryInfoQueryFlags query) const override;
 
-    core::basic_string<char> GetApplicationPath() const override;   // the bundle
+    core::basic_string<char> GetApplicationPath() const override;   // the bundle; takes a lock of its own
     core::basic_string<char> GetApplicationFolder() const override; // the folder that holds it
     core::basic_string<char> GetApplicationManagedPath() const override;
     core::basic_string<char> GetApplicationContentsPath() const override;

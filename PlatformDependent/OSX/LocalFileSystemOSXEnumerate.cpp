@@ -55,9 +55,9 @@ public:
     UInt8* Data() { return m_Data; }
     size_t Size() const { return m_Size; }
 
-    // False, and as it was, when it is as large as it may be or memory is refused.
+    // False, and as it was, when it is as large as it may be, or memory is or was refused.
     bool Double() {
-        if (m_Size > kLargestBufferSize / 2) return false;
+        if (m_Size == 0 || m_Size > kLargestBufferSize / 2) return false;
         void* larger = realloc_internal(m_Data, m_Size * 2, kBufferAlignment, kMemLabelGeneral, kAllocateOptionNone,
                                         __FILE__, __LINE__);
         if (larger == nullptr) return false;
@@ -142,7 +142,7 @@ Record ReadRecord(const UInt8* bytes, size_t size) {
 
 void ReportMissingAttributes(const Record& record) {
     const UInt32 common = record.returned.commonattr;
-    if (!(common & ATTR_CMN_NAME))
+    if (record.name.empty()) // one that lies outside of the record is as good as none
         Report("Assertion failed on expression: 'entry.returned.commonattr & ATTR_CMN_NAME'");
     if (!(common & ATTR_CMN_OBJTYPE))
         Report("Assertion failed on expression: 'entry.returned.commonattr & ATTR_CMN_OBJTYPE'");
@@ -216,7 +216,7 @@ public:
             if (count == 0) return true;
             if (count > 0) {
                 HandleRecords(buffer, count, path, working, folder);
-            } else if (error != EINTR && !(error == ERANGE && buffer.Double())) {
+            } else if (error != ERANGE || !buffer.Double()) {
                 PrintListingError(error, path);
                 return false;
             }
@@ -267,9 +267,10 @@ private:
     bool m_Recursive;
 };
 
+// The path made absolute; as it stands when the platform has no text for it.
 core::basic_string<char> FileSystemRepresentation(const char* path) {
-    return core::basic_string<char>(NSURL_fileSystemRepresentation(NSURL_fileURLWithPath(MakeNSString(path))),
-                                    kMemLabelPathString);
+    const char* text = NSURL_fileSystemRepresentation(NSURL_fileURLWithPath(MakeNSString(path)));
+    return core::basic_string<char>(*text != '\0' ? text : path, kMemLabelPathString);
 }
 
 // What of path, which is absolute, is left below the current directory; path itself when it lies elsewhere.
@@ -292,7 +293,7 @@ bool LocalFileSystemOSX::Enumerate(const char* path, dynamic_block_array<FileEnt
     if (path == nullptr) return false;
 
     core::basic_string<char> representation = FileSystemRepresentation(path);
-    if (path[0] != '/') {
+    if (path[0] != '/' && representation.starts_with("/")) {
         const core::basic_string<char> current = FileSystemRepresentation(GetFileSystem()->CurrentDirectory().c_str());
         representation = BelowCurrentDirectory(representation, current);
     }

@@ -1,28 +1,35 @@
 // The platform's own services as LocalFileSystemOSX uses them: objects are opaque, and each operation is a free
-// function named after its class and selector, so that the code above is plain C++ on every system.
+// function named after its class and selector (Platform_... for what is no message), so that the code above is plain
+// C++ on every system, and no name is one that the platform's own headers declare.
 //
 //   AutoreleasePool pool;
 //   NSString* path = NSString_stringWithUTF8String("/tmp/x");      // freed with the pool
 //   if (NSFileManager_fileExistsAtPath(path)) return false;
 //
 // Every object returned is autoreleased; nil (a null pointer) may be passed wherever an object is expected and gives
-// nil, an empty text or false. Any thread; a pool and what was made inside it belong to one thread.
+// nil, an empty text or false, also where the message itself would not take it. Any thread; a pool and what was made
+// inside it belong to one thread.
 //
 // Behind this header stands one of two folders, chosen by CMake. Standin/ is a small layer over POSIX, for systems that
 // have none of this. On a Mac a folder of its own takes its place: a PlatformSystem.h that includes <sys/attr.h>,
 // <sys/vnode.h>, <sys/stat.h> and <unistd.h>, names struct stat PlatformStatus and lets PlatformStat call stat; and one
-// Objective-C++ file that includes Foundation and AppKit before this header (which then says @class for class, a
-// difference that the linker does not see) and forwards each function to the message it is named after. The pool
-// forwards to objc_autoreleasePoolPush and objc_autoreleasePoolPop. Nothing else changes.
+// Objective-C++ file that includes Foundation and AppKit before this header and forwards each function to what it is
+// named after. The pool forwards to objc_autoreleasePoolPush and objc_autoreleasePoolPop. This header and the code
+// above it stay as they are.
 #pragma once
 
 #include <PlatformSystem.h> // PlatformStatus, PlatformStat, chflags, getattrlistbulk; from the folder that CMake chose
 
 #include <cstddef>
 
+#ifndef __OBJC__ // there the platform's headers have these; to the linker a class is one, however it was declared
 class NSArray;
 class NSString;
 class NSURL;
+constexpr unsigned long NSUTF8StringEncoding = 4;
+constexpr unsigned long NSApplicationSupportDirectory = 14;
+constexpr unsigned long NSLocalDomainMask = 2;
+#endif
 
 // What is autoreleased while the pool lives is freed at its end. Pools nest; objects made outside of any pool live
 // until their thread ends.
@@ -37,13 +44,9 @@ private:
     void* m_Token;
 };
 
-enum NSStringEncoding : unsigned long { NSUTF8StringEncoding = 4 };
-enum NSSearchPathDirectory : unsigned long { NSApplicationSupportDirectory = 14 };
-enum NSSearchPathDomainMask : unsigned long { NSLocalDomainMask = 2 };
-
 // Both answer nil for bytes that are not valid in the encoding.
 NSString* NSString_stringWithUTF8String(const char* text);
-NSString* NSString_initWithBytes(const void* bytes, size_t length, NSStringEncoding encoding);
+NSString* NSString_initWithBytes(const void* bytes, size_t length, unsigned long encoding);
 
 NSString* NSString_string(); // the empty text
 
@@ -54,10 +57,10 @@ const char* NSString_UTF8String(NSString* string);
 // path stays relative unless a link in it leads to an absolute one.
 NSString* NSString_stringByResolvingSymlinksInPath(NSString* path);
 
-// A relative path is taken from the process's working directory.
+// A relative path is taken from the process's working directory; with none, or for an empty path, the URL is empty.
 NSURL* NSURL_fileURLWithPath(NSString* path);
 NSURL* NSURL_URLByResolvingSymlinksInPath(NSURL* url);
-// Absolute and without trailing "/"; empty for the URL of an empty path. Lives as long as the object does.
+// Absolute and without trailing "/", or empty. Lives as long as the object does.
 const char* NSURL_fileSystemRepresentation(NSURL* url);
 
 NSArray* NSArray_arrayWithObject(NSString* object);
@@ -74,11 +77,11 @@ bool NSFileManager_createFileAtPath(NSString* path); // without contents; makes 
 // leaves nothing there.
 bool NSFileManager_copyItemAtPath(NSString* source, NSString* destination);
 
-// Asks the shared workspace to move files, names inside the folder source, to the trash.
-enum NSWorkspaceFileOperation : int { NSWorkspaceRecycleOperation };
-bool NSWorkspace_performFileOperation(NSWorkspaceFileOperation operation, NSString* source, NSString* destination,
-                                      NSArray* files, int* tag);
+NSString* Platform_RecycleOperation(); // the constant NSWorkspaceRecycleOperation: to the trash
+// Asks the shared workspace to do operation with files, names inside the folder source.
+bool NSWorkspace_performFileOperation(NSString* operation, NSString* source, NSString* destination, NSArray* files,
+                                      int* tag);
 
-NSString* NSHomeDirectory();
-NSArray* NSSearchPathForDirectoriesInDomains(NSSearchPathDirectory directory, NSSearchPathDomainMask domain,
-                                             bool expandTilde);
+// The functions NSHomeDirectory and NSSearchPathForDirectoriesInDomains.
+NSString* Platform_HomeDirectory();
+NSArray* Platform_SearchPathForDirectoriesInDomains(unsigned long directory, unsigned long domain, bool expandTilde);

@@ -80,7 +80,9 @@ std::string MakeRecord(int descriptor, const char* name, const attrlist& request
     if (file & ATTR_FILE_TOTALSIZE) Append(record, static_cast<int64_t>(status.st_size));
     if (common & ATTR_CMN_NAME) {
         const auto length = static_cast<uint32_t>(strlen(name) + 1);
-        Overwrite(record, nameReference, attrreference_t{static_cast<int32_t>(record.size() - nameReference), length});
+        const int32_t moved = altered ? gStandinFaults.movedName : 0;
+        const auto offset = static_cast<int32_t>(record.size() - nameReference) + moved;
+        Overwrite(record, nameReference, attrreference_t{offset, length});
         record.append(name, length);
     }
     record.resize((record.size() + kRecordAlignment - 1) / kRecordAlignment * kRecordAlignment);
@@ -110,6 +112,12 @@ int getattrlistbulk(int descriptor, void* list, void* buffer, size_t size, uint6
         return Fail(ERANGE);
     }
 
+    int& recordsLeft = gStandinFaults.recordsBeforeListingError;
+    if (recordsLeft == 0) {
+        recordsLeft = -1;
+        return Fail(gStandinFaults.listingError);
+    }
+
     int count = 0;
     size_t used = 0;
     off_t position = lseek(descriptor, 0, SEEK_CUR); // of the next entry; a bad descriptor is found by the listing
@@ -118,22 +126,19 @@ int getattrlistbulk(int descriptor, void* list, void* buffer, size_t size, uint6
         // Not many more entries than there is room for: what is read in vain is read again.
         const size_t listingSize = std::clamp((size - used) / 2, kLongestListedName, sizeof(listing));
         const long length = syscall(SYS_getdents64, descriptor, listing, listingSize);
-        if (length < 0) return -1;
+        if (length < 0) return count > 0 ? count : -1; // what is packed is delivered; the next call meets it again
         if (length == 0) return count;
         for (long at = 0; at < length;) {
             const auto& entry = *reinterpret_cast<const dirent64*>(listing + at);
             at += entry.d_reclen;
             const std::string name = entry.d_name;
             if (name != "." && name != "..") {
-                const bool failing = gStandinFaults.recordsBeforeListingError == 0;
                 const std::string record = MakeRecord(descriptor, name.c_str(), request);
-                if (failing || record.size() > size - used) {
+                if (recordsLeft == 0 || record.size() > size - used) {
                     lseek(descriptor, position, SEEK_SET);
-                    if (count > 0) return count;
-                    if (failing) gStandinFaults.recordsBeforeListingError = -1;
-                    return Fail(failing ? gStandinFaults.listingError : ERANGE);
+                    return count > 0 ? count : Fail(ERANGE);
                 }
-                if (gStandinFaults.recordsBeforeListingError > 0) --gStandinFaults.recordsBeforeListingError;
+                if (recordsLeft > 0) --recordsLeft;
                 memcpy(static_cast<char*>(buffer) + used, record.data(), record.size());
                 used += record.size();
                 ++count;

@@ -13,6 +13,7 @@
 
 namespace {
 
+constexpr char kRecycle[] = "recycle";
 constexpr size_t kCopySize = 65536;
 constexpr int kMaxLinks = 40; // followed in one path, as the system does
 constexpr mode_t kModeBits = 07777;
@@ -93,15 +94,19 @@ bool CopyTree(const std::string& source, const std::string& destination) {
     return chmod(destination.c_str(), status.st_mode & kModeBits) == 0; // last: it may forbid writing
 }
 
+std::string ResolvedWithSlash(const std::string& path) {
+    const std::string resolved = ResolveLinks(path);
+    return resolved == "/" ? resolved : resolved + "/";
+}
+
 // Whether path, which may not exist yet, would lie inside folder: a folder can't be copied into itself.
 bool LiesInside(const std::string& path, const std::string& folder) {
-    const std::string parent = ResolveLinks(path.substr(0, path.find_last_of('/') + 1) + ".");
-    return (parent + "/").compare(0, folder.size() + 1, ResolveLinks(folder) + "/") == 0;
+    return ResolvedWithSlash(path.substr(0, path.find_last_of('/') + 1) + ".").starts_with(ResolvedWithSlash(folder));
 }
 
 // Moves the file or folder into the trash, under a name that is free there.
 bool MoveIntoTrash(const std::string& folder, const std::string& name) {
-    const std::string trash = NSHomeDirectory()->text + "/.Trash";
+    const std::string trash = Platform_HomeDirectory()->text + "/.Trash";
     if (mkdir(trash.c_str(), 0700) != 0 && errno != EEXIST) return false;
     std::string target = trash + "/" + name;
     for (int number = 2; ExistsItself(target); ++number)
@@ -163,9 +168,12 @@ bool NSFileManager_copyItemAtPath(NSString* source, NSString* destination) {
     return false;
 }
 
-bool NSWorkspace_performFileOperation(NSWorkspaceFileOperation, NSString* source, NSString*, NSArray* files, int* tag) {
+NSString* Platform_RecycleOperation() { return MakeAutoreleased<NSString>(std::string(kRecycle)); }
+
+bool NSWorkspace_performFileOperation(NSString* operation, NSString* source, NSString*, NSArray* files, int* tag) {
     *tag = 0;
-    if (gStandinFaults.trashRefuses || source == nullptr || files == nullptr) return false;
+    if (gStandinFaults.trashRefuses || operation == nullptr || source == nullptr || files == nullptr) return false;
+    if (operation->text != kRecycle) return false;
     bool moved = true;
     for (NSString* name : files->objects)
         if (name == nullptr || !MoveIntoTrash(source->text, name->text)) moved = false;

@@ -79,9 +79,9 @@ AutoreleasePool::~AutoreleasePool() { tPools.FreeDownTo(reinterpret_cast<size_t>
 
 NSString* NSString_string() { return MakeAutoreleased<NSString>(std::string()); }
 
-NSString* NSString_initWithBytes(const void* bytes, size_t length, NSStringEncoding encoding) {
+NSString* NSString_initWithBytes(const void* bytes, size_t length, unsigned long encoding) {
     const auto* text = static_cast<const unsigned char*>(bytes);
-    if (encoding != NSUTF8StringEncoding || gStandinFaults.nilStrings || !IsUTF8(text, length)) return nullptr;
+    if (encoding != NSUTF8StringEncoding || !IsUTF8(text, length)) return nullptr;
     return MakeAutoreleased<NSString>(std::string(static_cast<const char*>(bytes), length));
 }
 
@@ -89,9 +89,7 @@ NSString* NSString_stringWithUTF8String(const char* text) {
     return NSString_initWithBytes(text, strlen(text), NSUTF8StringEncoding);
 }
 
-const char* NSString_UTF8String(NSString* string) {
-    return string != nullptr && !gStandinFaults.noUTF8Form ? string->text.c_str() : nullptr;
-}
+const char* NSString_UTF8String(NSString* string) { return string != nullptr ? string->text.c_str() : nullptr; }
 
 NSString* NSString_stringByResolvingSymlinksInPath(NSString* path) {
     return path != nullptr ? MakeAutoreleased<NSString>(ResolveLinks(path->text)) : nullptr;
@@ -104,8 +102,9 @@ NSURL* NSURL_fileURLWithPath(NSString* path) {
         // Against the working directory the path's own leading "." says nothing.
         while (absolute == "." || absolute.compare(0, 2, "./") == 0)
             absolute.erase(0, std::min(absolute.find_first_not_of('/', 1), absolute.size()));
-        absolute.insert(0, "/");
-        if (const std::string folder = WorkingDirectory(); folder != "/") absolute.insert(0, folder);
+        const std::string folder = WorkingDirectory();
+        if (folder.empty()) return MakeAutoreleased<NSURL>(folder); // deleted: the path leads nowhere
+        absolute.insert(0, folder == "/" ? folder : folder + "/");
     }
     while (absolute.size() > 1 && absolute.back() == '/')
         absolute.pop_back();
@@ -132,14 +131,14 @@ NSString* NSBundle_bundlePath() {
     return MakeAutoreleased<NSString>(path.substr(0, path.find_last_of('/')));
 }
 
-NSString* NSHomeDirectory() {
+NSString* Platform_HomeDirectory() {
     if (const char* home = getenv("HOME"); home != nullptr && home[0] != '\0')
         return MakeAutoreleased<NSString>(std::string(home));
     const passwd* user = getpwuid(getuid());
     return MakeAutoreleased<NSString>(std::string(user != nullptr ? user->pw_dir : ""));
 }
 
-NSArray* NSSearchPathForDirectoriesInDomains(NSSearchPathDirectory directory, NSSearchPathDomainMask domain, bool) {
+NSArray* Platform_SearchPathForDirectoriesInDomains(unsigned long directory, unsigned long domain, bool) {
     std::vector<NSString*> folders;
     if (directory == NSApplicationSupportDirectory && domain == NSLocalDomainMask)
         folders.push_back(MakeAutoreleased<NSString>(std::string("/Library/Application Support")));
