@@ -8,18 +8,14 @@
 
 class BytesFile {
 public:
-    explicit BytesFile(const std::string& bytes)
-        : m_Entry(MemoryFile::CreateFileSystemEntry(kMemLabelGeneral, kFilePermissionRead,
-                                                    const_cast<char*>(bytes.data()), bytes.size(), false)) {
-        (void)accessor.Open(m_Entry, kFilePermissionRead); // an open memory file can be opened
+    explicit BytesFile(const std::string& bytes) {
+        FileSystemEntry entry = MemoryFile::CreateFileSystemEntry(kMemLabelGeneral, kFilePermissionRead,
+                                                                  const_cast<char*>(bytes.data()), bytes.size(), false);
+        (void)accessor.Open(entry, kFilePermissionRead); // an open memory file can be opened
     }
     explicit BytesFile(std::string&&) = delete;
 
     UInt64 Position() const { return accessor.Position().Cast<UInt64>(); }
 
-private:
-    FileSystemEntry m_Entry;
-
-public:
     FileAccessor accessor;
 };

@@ -1,48 +1,51 @@
 // Runs the command as its users do, in a process of its own, and keeps everything that it says.
 //
-//   EXPECT_EQ(RunVarnex({"missing.zarvo"}, {.workingDirectory = folder}),
-//             (Transcript{.status = 1, .output = "Extracting file 'missing.zarvo'...\n..."}));
+//   EXPECT_EQ(Transcript(1, "Extracting file 'missing.zarvo'...\n..."), RunVarnex({"missing.zarvo"}, folder));
 //
-// VARNEX_BINARY is the path of the program. Any thread.
+// VARNEX_BINARY is the path of the program.
 #pragma once
 
-#include <ostream>
+#include <cstdio>
+#include <functional>
 #include <string>
+#include <sys/wait.h>
+#include <unistd.h>
 #include <utility>
 #include <vector>
 
-// Statuses that no program returns.
-constexpr int kStatusOfSignal = 1'000; // plus the signal that ended the program
-constexpr int kStatusTimedOut = 2'000; // and was ended for it
+// The exit status, and what was printed to standard output and error together. A program that a signal has ended has
+// 1,000 and the signal as its status, one that can't be started 127. Two minutes are ended by SIGALRM.
+using Transcript = std::pair<int, std::string>;
 
-struct Transcript {
-    int status = 0;          // exit status, or one of those above
-    std::string output = {}; // everything on standard output
-    std::string error = {};  // everything on standard error
+// Runs a program in a folder. In the new process, prepare is called before the program; false: it is not run.
+inline Transcript RunProgram(const char* program, const std::vector<std::string>& arguments,
+                             const std::string& folder = ".", const std::function<bool()>& prepare = {}) {
+    constexpr int kStatusNotStarted = 127, kStatusOfSignal = 1'000;
+    std::vector<char*> list = {const_cast<char*>("Varnex")};
+    for (const std::string& argument : arguments)
+        list.push_back(const_cast<char*>(argument.c_str()));
+    list.push_back(nullptr);
 
-    bool operator==(const Transcript&) const = default;
-};
-
-// For failure messages: everything, with bytes that can't be printed escaped and what is very long cut in its middle.
-std::ostream& operator<<(std::ostream& stream, const Transcript& transcript);
-
-struct RunOptions {
-    std::string workingDirectory = {}; // empty: the caller's
-    std::vector<int> closedDescriptors = {};
-    std::vector<std::pair<std::string, std::string>> environment = {}; // added to the caller's
-    std::string outputFile = {};                                       // standard output goes there; none is collected
-    bool readsOutput = true;       // false: nobody reads standard output, and the pipe's other end is closed
-    long long largestFile = -1;    // bytes that a file may grow to; writes past it fail
-    bool unprivileged = false;     // as another user when the caller is root, whom no permission stops
-    long* peakKilobytes = nullptr; // gets the most memory that the program had at once
-    int timeoutSeconds = 120;
-};
-
-// Runs a program. A program that can't be started has the status 127.
-Transcript RunProgram(const char* program, const std::vector<std::string>& arguments, const RunOptions& options);
-
-#ifdef VARNEX_BINARY
-inline Transcript RunVarnex(const std::vector<std::string>& arguments, const RunOptions& options = {}) {
-    return RunProgram(VARNEX_BINARY, arguments, options);
+    FILE* const output = tmpfile();
+    const pid_t process = fork();
+    if (process == 0) {
+        alarm(120);
+        if (dup2(fileno(output), STDOUT_FILENO) >= 0 && dup2(STDOUT_FILENO, STDERR_FILENO) >= 0 &&
+            chdir(folder.c_str()) == 0 && (prepare == nullptr || prepare()))
+            execv(program, list.data());
+        _exit(kStatusNotStarted);
+    }
+    int status = kStatusNotStarted << 8;
+    waitpid(process, &status, 0);
+    Transcript transcript(WIFSIGNALED(status) ? kStatusOfSignal + WTERMSIG(status) : WEXITSTATUS(status), "");
+    rewind(output);
+    for (int byte; (byte = getc(output)) != EOF;)
+        transcript.second += static_cast<char>(byte);
+    fclose(output);
+    return transcript;
 }
-#endif
+
+inline Transcript RunVarnex(const std::vector<std::string>& arguments, const std::string& folder = ".",
+                            const std::function<bool()>& prepare = {}) {
+    return RunProgram(VARNEX_BINARY, arguments, folder, prepare);
+}

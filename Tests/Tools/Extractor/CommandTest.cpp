@@ -1,168 +1,109 @@
+// The command and the world around it: its arguments, what stands where it writes, and who listens.
 #include "Tests/Tools/Extractor/ExtractorTest.h"
 
-#include <filesystem>
-#include <unistd.h>
+#include <csignal>
+#include <fcntl.h>
+#include <sys/resource.h>
 
-namespace {
-
-ArchiveDescription TwoFiles() {
-    ArchiveDescription archive;
-    archive.entries = {{.path = "a.bin", .bytes = Incompressible(150'000)},
-                       {.path = "folder", .flags = kFolderEntry},
-                       {.path = "folder/b.txt", .bytes = "text"}};
-    archive.type = kCompressionLz4;
-    return archive;
-}
-
-TEST(Command, WithoutAnArgumentOnlySaysHowItIsUsed) {
-    const TemporaryFolder folder;
-    EXPECT_EQ((Transcript{.status = 1, .output = "Usage: Varnex <zarvowebfile>\n"}),
-              RunVarnex({}, {.workingDirectory = folder.Path()}));
-    EXPECT_EQ("", Differences({}, ReadFolderTree(folder.Path())));
-}
+static const std::string kThree = "a:r150000 folder| b/c:text";
 
 TEST(Command, LooksAtItsFirstArgumentOnly) {
     const TemporaryFolder folder;
-    const BuiltArchive built = BuildArchive(TwoFiles());
-    for (const char* const name : {"a.zarvo", "b.zarvo"})
-        WriteFile(folder / name, built.bytes);
-    EXPECT_EQ((Transcript{.status = 0, .output = Report(7, built.bytes.size())}),
-              RunVarnex({"a.zarvo", "b.zarvo", "--help", ""}, {.workingDirectory = folder.Path()}));
-    FolderTree tree = TreeOf(TwoFiles().entries);
-    tree["a.zarvo"] = tree["b.zarvo"] = built.bytes;
-    EXPECT_EQ("", Differences(tree, ReadFolderTree(folder.Path())));
-}
-
-TEST(Command, WithAnEmptyArgumentFindsNoFile) {
-    const TemporaryFolder folder;
-    EXPECT_EQ((Transcript{.status = 1, .output = "Extracting file ''...\nUnable to open archive file: \n" + kCantRead}),
-              RunVarnex({""}, {.workingDirectory = folder.Path()}));
-    EXPECT_EQ("", Differences({}, ReadFolderTree(folder.Path())));
-}
-
-TEST(Command, RunAgainRewritesWhatItMadeAndLeavesTheRest) {
-    const TemporaryFolder folder;
-    const std::string bytes = BuildArchive(TwoFiles()).bytes;
-    const FolderTree tree = TreeOf(TwoFiles().entries);
-    ExpectOutcome(0, Report(7, bytes.size()), tree, Extract(folder, bytes));
-    ExpectOutcome(0, Report(7, bytes.size()), tree, Extract(folder, bytes));
-
-    // As after a run that was interrupted, and with something else in the folder.
-    const std::string output = folder / "a.zarvo_data/";
-    WriteFile(output + "a.bin", "cut");
-    WriteFile(output + "folder/b.txt", Incompressible(100'000));
-    WriteFile(output + "other", "other");
-    FolderTree withOther = tree;
-    withOther["a.zarvo_data/other"] = "other";
-    ExpectOutcome(0, Report(7, bytes.size()), withOther, Extract(folder, bytes));
-}
-
-// The last node fails while its file is open, which is when a message could land in that file.
-TEST(Command, WithClosedStandardDescriptorsKeepsItsMessagesOutOfTheFiles) {
-    ArchiveDescription archive = TwoFiles();
-    archive.entries.push_back({.path = "past the end"});
-    archive.fields = {{"node[3].size", 1}};
-    const std::string bytes = BuildArchive(archive).bytes;
-    const std::string report = Report(7, bytes.size(), "ERROR: failed to decompress file past the end\n");
-    struct {
-        std::vector<int> closed;
-        std::string output;
-    } const rows[] = {
-        {{0}, report}, {{1}, ""}, {{2}, report}, {{0, 1}, ""}, {{0, 2}, report}, {{1, 2}, ""}, {{0, 1, 2}, ""},
+    const auto failed = [](const std::string& path, const std::string& reason) {
+        return Transcript(1, "Extracting file '" + path + "'...\n" + Say(reason + ":" + path + " unread"));
     };
-    for (const auto& row : rows) {
-        SCOPED_TRACE(testing::PrintToString(row.closed));
-        ExpectOutcome(1, row.output, TreeOf(archive.entries), Extract(bytes, {.closedDescriptors = row.closed}));
+    EXPECT_EQ(Transcript(1, "Usage: Varnex <zarvowebfile>\n"), RunVarnex({}, folder.Path()));
+    EXPECT_EQ(failed("", "unopened"), RunVarnex({""}, folder.Path()));
+    EXPECT_EQ(failed("no", "unopened"), RunVarnex({"no", "--help", ""}, folder.Path()));
+    EXPECT_EQ(failed(".", "noheader"), RunVarnex({"."}, folder.Path()));
+    EXPECT_TRUE(fs::is_empty(folder.Path()));
+}
+
+TEST(Command, RewritesWhatIsThereAndLeavesTheRest) {
+    const TemporaryFolder folder, other;
+    Case run{.archive = kThree, .folder = folder.Path()};
+    Expect(run);
+    // As after a run that was interrupted, and with something else in the folder.
+    WriteFile(folder / "a.zarvo_data/a", "cut");
+    WriteFile(folder / "a.zarvo_data/b/c", "longer");
+    WriteFile(folder / "a.zarvo_data/other", "other");
+    run.output = kThree + " other:other";
+    Expect(run);
+    // Links are followed.
+    fs::remove_all(folder / "a.zarvo_data/b");
+    fs::create_directory_symlink(other.Path(), folder / "a.zarvo_data/b");
+    run.output = "a:r150000 folder| other:other b:" + other.Path();
+    Expect(run);
+    EXPECT_EQ("text", ReadFile(other / "c"));
+}
+
+// The last file fails while it is open, which is when a message could land in it.
+TEST(Command, GoesOnWhoeverListens) {
+    Case run{kThree + " past: node[3].size=1", "data:past"};
+    for (int closed = 1; closed < 8; ++closed) {
+        run.isHeard = (closed & 2) == 0;
+        run.prepare = [closed] {
+            for (const int descriptor : {0, 1, 2})
+                if ((closed >> descriptor & 1) != 0) close(descriptor);
+            return true;
+        };
+        Expect(run);
     }
+    run.isHeard = false;
+    run.prepare = [] { return dup2(open("/dev/full", O_WRONLY), STDOUT_FILENO) >= 0; };
+    Expect(run);
+    run.prepare = [] {
+        int ends[2]; // of a pipe that nobody reads from
+        return pipe(ends) == 0 && dup2(ends[1], STDOUT_FILENO) >= 0 && close(ends[0]) == 0 && close(ends[1]) == 0;
+    };
+    Expect(run);
 }
 
-TEST(Command, GoesOnWhenNobodyTakesItsMessages) {
-    const std::string bytes = BuildArchive(TwoFiles()).bytes;
-    const FolderTree tree = TreeOf(TwoFiles().entries);
-    ExpectOutcome(0, "", tree, Extract(bytes, {.readsOutput = false}));
-    ExpectOutcome(0, "", tree, Extract(bytes, {.outputFile = "/dev/full"}));
-}
-
-TEST(DisturbedOutput, SomethingElseStandsWhereTheOutputGoes) {
-    const std::string bytes = BuildArchive(TwoFiles()).bytes;
+TEST(Command, SaysWhatStandsInItsWay) {
     const TemporaryFolder folder;
     const std::string output = folder / "a.zarvo_data";
     WriteFile(output, "file");
-    ExpectOutcome(1,
-                  Report(7, bytes.size(),
-                         "ERROR: failed to create directory \nERROR: failed to create file a.bin\n"
-                         "ERROR: failed to create directory folder\n"
-                         "ERROR: failed to create directory folder\nERROR: failed to create file folder/b.txt\n"),
-                  {{"a.zarvo_data", "file"}}, Extract(folder, bytes));
-
-    std::filesystem::remove(output);
-    std::filesystem::create_directories(output + "/a.bin");
-    WriteFile(output + "/folder", "file");
-    ExpectOutcome(1,
-                  Report(7, bytes.size(),
-                         "ERROR: failed to create file a.bin\nERROR: failed to create directory folder\n"
-                         "ERROR: failed to create directory folder\nERROR: failed to create file folder/b.txt\n"),
-                  OutputTree({{"a.bin", kFolder}, {"folder", "file"}}), Extract(folder, bytes));
-}
-
-TEST(DisturbedOutput, WritesThatFailEndTheirFileOnly) {
-    const std::string bytes = BuildArchive(TwoFiles()).bytes;
-    const std::string report = Report(7, bytes.size(), "ERROR: failed to write file a.bin\n");
-    // A file may grow to fewer bytes than it has: a write in the middle is short, or the last one is.
-    for (const size_t largest : std::vector<size_t>{100'000, 149'999}) {
-        SCOPED_TRACE(largest);
-        ExpectOutcome(1, report,
-                      OutputTree({{"a.bin", Incompressible(150'000).substr(0, largest)}, {"folder/b.txt", "text"}}),
-                      Extract(bytes, {.largestFile = static_cast<long long>(largest)}));
+    Expect({kThree, "folder: file:a folder:folder folder:b file:b/c", ":file", {}, folder.Path()});
+    fs::remove(output);
+    fs::create_directories(output + "/a");
+    WriteFile(output + "/b", "file");
+    Expect({kThree, "file:a folder:b file:b/c", "a| folder| b:file", {}, folder.Path()});
+    // A disk that is full from the start, or when a file has grown so far.
+    fs::remove_all(output);
+    fs::create_directory(output);
+    fs::create_symlink("/dev/full", output + "/a");
+    Expect({kThree, "write:a", "a:/dev/full folder| b/c:text", {}, folder.Path()});
+    for (const rlim_t largest : {100'000, 149'999}) {
+        Case run{kThree, "write:a", "a:r" + std::to_string(largest) + " folder| b/c:text"};
+        run.prepare = [largest] {
+            const rlimit limits = {largest, largest};
+            return signal(SIGXFSZ, SIG_IGN) != SIG_ERR && setrlimit(RLIMIT_FSIZE, &limits) == 0;
+        };
+        Expect(run);
     }
-
-    if (access("/dev/full", W_OK) != 0) GTEST_SKIP() << "no full device here";
-    const TemporaryFolder folder;
-    std::filesystem::create_directory(folder / "a.zarvo_data");
-    std::filesystem::create_symlink("/dev/full", folder / "a.zarvo_data/a.bin");
-    ExpectOutcome(1, report, OutputTree({{"a.bin", "<link to /dev/full>"}, {"folder/b.txt", "text"}}),
-                  Extract(folder, bytes));
 }
 
 // As another user when this one is not stopped by any permission.
-TEST(DisturbedOutput, PermissionsAreRespected) {
-    using std::filesystem::perms;
-    const std::string bytes = BuildArchive(TwoFiles()).bytes;
+TEST(Command, RespectsPermissions) {
     const TemporaryFolder folder;
     const std::string path = folder.Path(), output = path + "/a.zarvo_data";
-    const RunOptions options = {.workingDirectory = path, .unprivileged = true};
-    std::filesystem::permissions(path, perms::all);
-    if (RunVarnex({}, options).status != 1) GTEST_SKIP() << "the program can't be run by another user here";
-
-    // A file that can't be written, in a folder that can.
-    WriteFile(path + "/a.zarvo", bytes);
-    std::filesystem::create_directory(output);
-    WriteFile(output + "/a.bin", "kept");
-    std::filesystem::permissions(output, perms::all);
-    std::filesystem::permissions(output + "/a.bin", perms::owner_read | perms::others_read);
-    FolderTree tree = OutputTree({{"a.bin", "kept"}, {"folder/b.txt", "text"}});
-    tree["a.zarvo"] = bytes;
-    EXPECT_EQ((Transcript{.status = 1, .output = Report(7, bytes.size(), "ERROR: failed to create file a.bin\n")}),
-              RunVarnex({"a.zarvo"}, options));
-    EXPECT_EQ("", Differences(tree, ReadFolderTree(path)));
-
-    // No output folder can be made.
-    std::filesystem::remove_all(output);
-    std::filesystem::permissions(path, perms::owner_all | perms::others_read | perms::others_exec);
-    if (geteuid() != 0) std::filesystem::permissions(path, perms::owner_read | perms::owner_exec);
-    const std::string refused = FolderRefused(output, EACCES, path);
-    const std::string messages =
-        refused + "ERROR: failed to create directory \nERROR: failed to create file a.bin\n" + refused +
-        "ERROR: failed to create directory folder\n" + refused +
-        "ERROR: failed to create directory folder\nERROR: failed to create file folder/b.txt\n";
-    EXPECT_EQ((Transcript{.status = 1, .output = Report(7, bytes.size(), messages)}), RunVarnex({"a.zarvo"}, options));
-    EXPECT_EQ("", Differences({{"a.zarvo", bytes}}, ReadFolderTree(path)));
-
-    // The archive can't be read.
-    std::filesystem::permissions(path + "/a.zarvo", perms::none);
-    EXPECT_EQ((Transcript{.status = 1, .output = kStarting + "Unable to open archive file: a.zarvo\n" + kCantRead}),
-              RunVarnex({"a.zarvo"}, options));
-    std::filesystem::permissions(path, perms::owner_all);
+    Case run{kThree, "file:a", "a:kept folder| b/c:text", {}, path};
+    run.prepare = [] { return geteuid() != 0 || (setgid(65'534) == 0 && setuid(65'534) == 0); };
+    fs::permissions(path, fs::perms::all);
+    if (RunVarnex({}, path, run.prepare).first != 1) GTEST_SKIP() << "another user can't run the program here";
+    // A file that can't be written; then no output folder can be made; then the archive can't be read.
+    fs::create_directory(output);
+    WriteFile(output + "/a", "kept");
+    fs::permissions(output, fs::perms::all);
+    fs::permissions(output + "/a", fs::perms(0444));
+    Expect(run);
+    fs::remove_all(output);
+    fs::permissions(path, fs::perms(0555));
+    const std::string refused = "refused:" + output + " folder:";
+    run.messages = refused + " file:a " + refused + "folder " + refused + "b file:b/c";
+    run.output = "none";
+    Expect(run);
+    fs::permissions(path + "/a.zarvo", fs::perms::none);
+    const std::string unread = "Extracting file 'a.zarvo'...\n" + Say("unopened:a.zarvo unread");
+    EXPECT_EQ(Transcript(1, unread), RunVarnex({"a.zarvo"}, path, run.prepare));
 }
-
-} // namespace

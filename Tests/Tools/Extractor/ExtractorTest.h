@@ -1,118 +1,184 @@
-// What the transcript tests share: an archive becomes a file in an empty folder, the command runs there, and everything
-// that it says, its status and the whole folder are compared with what is expected.
+// What the tests of the command share: a line of words becomes an archive in a folder, the command runs there, and
+// everything that it says, its status and the whole folder are compared with what other words describe.
+//
+//   Expect({"web levels=2 a/b:c70000"});             // everything comes out
+//   Expect({"node[0].offset=9 a:", "data:a", "a:"}); // a can't be decompressed, and is left empty
 #pragma once
 
-#include "Tests/Support/FolderTree.h"
 #include "Tests/Support/RunVarnex.h"
 #include "Tests/Support/TemporaryFolder.h"
 #include "Tools/ArchiveWriter/ArchiveWriter.h"
 
+#include <algorithm>
 #include <cstring>
-#include <gtest/gtest.h>
 #include <random>
-#include <string>
-#include <vector>
+#include <sstream>
 
-inline const std::string kStarting = "Extracting file 'a.zarvo'...\n";
-inline const std::string kCantRead = "ERROR: can't read or not a zarvo web file\n";
-inline const std::string kNoHeader = "Unable to read header from archive file: a.zarvo\n" + kCantRead;
-inline const std::string kNoDirectory = "ERROR: failed to parse files information\n";
-inline const std::string kAllOk = "All ok!\n";
-inline const std::string kWideCast = "Value cannot be stored by type cast target: exceeds maximum representable value. "
-                                     "Result will be truncated.\n";
+namespace fs = std::filesystem;
 
-// Everything that a run says from its first line to its header's last.
-inline std::string HeaderReport(UInt32 version, UInt64 size) {
-    return kStarting + "  stream version: " + std::to_string(version) +
-           "\n  zarvo version: 5.x.x\n  zarvo revision: 7041.3.0b12\n  data size: " + std::to_string(size) + " bytes\n";
+// What the command says, by word. A word with a path, "file:a", stands for the text and the path.
+inline const std::map<std::string, std::string> kMessages = {
+    {"ok", "All ok!"},
+    {"unread", "ERROR: can't read or not a zarvo web file"},
+    {"nodirectory", "ERROR: failed to parse files information"},
+    {"folder", "ERROR: failed to create directory "},
+    {"file", "ERROR: failed to create file "},
+    {"data", "ERROR: failed to decompress file "},
+    {"write", "ERROR: failed to write file "},
+    {"refused", "CreateDirectory '"},
+    {"unopened", "Unable to open archive file: "},
+    {"noheader", "Unable to read header from archive file: "},
+    {"unsupported", "Decompressing this format (4) is not supported on this platform."},
+    {"unknown", "Assertion failed on expression: 't < kCompressionCount'"},
+    {"unstarted", "Decompressor's stream must be initialized!"},
+    {"toolarge", "Lz4 doesn't support input or output data size > INT_MAX"},
+    {"pastend", "Assertion failed on expression: 'position + size <= m_EndPos'"},
+    {"twosizes", "Archive file has invalid uncompressed header size!"},
+    {"toowide", "Value cannot be stored by type cast target: exceeds maximum representable value. "
+                "Result will be truncated."}};
+
+// The system's refusal to make a folder, "refused:/a", has its reason with the macOS back end only.
+inline std::string Say(const std::string& words, const std::string& folder = "") {
+    const bool hasReason = std::string(VARNEX_BINARY).ends_with("OSXBackEnd");
+    std::istringstream stream(words);
+    std::string text;
+    for (std::string word; stream >> word && word != ";";) {
+        const std::string kind = word.substr(0, word.find(':')),
+                          path = kind == word ? "" : word.substr(kind.size() + 1);
+        const std::string reason = hasReason ? strerror(path.size() > 255 ? ENAMETOOLONG : EACCES) : "";
+        text += kMessages.at(kind) + path +
+                (kind == "refused" ? "' failed: " + reason + " (current dir: " + folder + ")\n" : "\n");
+    }
+    return text;
 }
 
-// The whole of what a run says; messages are what follows the line on the output folder.
-inline std::string Report(UInt32 version, UInt64 size, const std::string& messages = kAllOk) {
-    return HeaderReport(version, size) + "  creating folder 'a.zarvo_data'\n" + messages;
+// "c70000", "r70000", "z70000": so many bytes that become half as many when they are compressed, as many, or hardly
+// any; "r70000@5000@10" is a part of them, and fewer are always their start. Other words stand for themselves.
+inline std::string Bytes(const std::string& word) {
+    char kind;
+    size_t size, from = 0, count = std::string::npos;
+    if (sscanf(word.c_str(), "%c%zu@%zu@%zu", &kind, &size, &from, &count) < 2) return word;
+    std::string bytes(size, 'z');
+    std::mt19937 random;
+    for (size_t index = 0; index < size && kind != 'z'; ++index)
+        bytes[index] = static_cast<char>(kind == 'c' && index / 64 % 2 == 0 ? 'a' + index % 16 : random());
+    return bytes.substr(from, count);
 }
 
-// The line on a folder that the system refuses; only the macOS back end says why.
-inline std::string FolderRefused(const std::string& path, [[maybe_unused]] int error,
-                                 const std::string& currentDirectory) {
-#ifdef VARNEX_WITH_OSX_BACK_END
-    const std::string reason = strerror(error);
-#else
-    const std::string reason;
-#endif
-    return "CreateDirectory '" + path + "' failed: " + reason + " (current dir: " + currentDirectory + ")\n";
+// The files ("a/b:c70000", with bytes behind the colon) and folders ("a|") among words. A file "?" is not listed.
+inline std::vector<ArchiveEntry> Entries(const std::string& words) {
+    std::vector<ArchiveEntry> entries;
+    std::istringstream stream(words);
+    for (std::string word; stream >> word;)
+        if (const size_t mark = word.find_first_of(":|"); mark != std::string::npos) {
+            entries.push_back({.path = word.substr(0, mark), .bytes = Bytes(word.substr(mark + 1))});
+            entries.back().flags = word[mark] == '|' ? kFolderEntry : 0;
+            entries.back().listed = word[0] != '?';
+        }
+    return entries;
 }
 
-struct Outcome {
-    Transcript transcript;
-    FolderTree tree; // of the folder that the command ran in, without the archive
-};
-
-// Runs the command on an archive of these bytes in a folder, which may hold something already.
-inline Outcome Extract(const TemporaryFolder& folder, const std::string& bytes, RunOptions options = {}) {
-    const std::string path = folder / "a.zarvo";
-    WriteFile(path, bytes);
-    options.workingDirectory = folder.Path();
-    Outcome outcome{RunVarnex({"a.zarvo"}, options), ReadFolderTree(folder.Path())};
-    EXPECT_EQ(outcome.tree["a.zarvo"] == bytes, true) << "the archive was changed";
-    outcome.tree.erase("a.zarvo");
-    return outcome;
+// An archive in words: entries, the layout ("web6" is the block-based one under the older signature), the kind of its
+// blocks, "section" for a section of that kind, and name=value: version, chunk, levels, or the number of a stored
+// field.
+inline ArchiveDescription Archive(const std::string& words, ArchiveDescription archive = {}) {
+    const std::string layouts[] = {"fs", "web6", "web", "raw", "old"}, kinds[] = {"stored", "lzma", "lz4", "lz4hc"};
+    archive.entries = Entries(words);
+    std::istringstream stream(words);
+    for (std::string word; stream >> word;) {
+        if (word.find_first_of(":|") != std::string::npos) continue;
+        const std::string name = word.substr(0, word.find('='));
+        const UInt64 value = name == word ? 0 : std::stoull(word.substr(name.size() + 1), nullptr, 0);
+        const auto layout = std::find(layouts, std::end(layouts), word), kind = std::find(kinds, std::end(kinds), word);
+        if (layout != std::end(layouts)) archive.layout = static_cast<ArchiveLayout>(layout - layouts);
+        if (kind != std::end(kinds)) archive.type = static_cast<CompressionType>(kind - kinds);
+        if (word == "section") archive.sectionType = archive.type;
+        if (word == "streamed") archive.streamed = true;
+        if (word == "endmark") archive.lzma.endMark = true;
+        if (word == "end") archive.sectionAtEnd = true;
+        if (word == "padded") archive.sectionPadded = true;
+        if (name == "version") archive.version = static_cast<UInt32>(value);
+        if (name == "levels") archive.levelCount = static_cast<UInt32>(value);
+        if (name == "chunk") archive.chunkSize = value;
+        if (name != word && name != "version" && name != "levels" && name != "chunk") archive.fields[name] = value;
+    }
+    return archive;
 }
 
-inline Outcome Extract(const std::string& bytes, const RunOptions& options = {}) {
-    const TemporaryFolder folder;
-    return Extract(folder, bytes, options);
+// Paths below a folder and what each one is: a file's bytes (of a long one their number and a hash), a link's target,
+// or kFolder for a folder that holds nothing.
+using FolderTree = std::map<std::string, std::string>;
+
+inline const std::string kFolder = "<folder>";
+
+inline std::string Brief(const std::string& bytes) {
+    if (bytes.size() < 100) return bytes;
+    return std::to_string(bytes.size()) + " bytes, " + std::to_string(std::hash<std::string>()(bytes));
 }
 
-// The tree that a run leaves: the output folder, what it holds, and the folders that its paths imply.
-inline FolderTree OutputTree(const FolderTree& contents) {
-    FolderTree tree = {{"a.zarvo_data", kFolder}};
-    for (const auto& [path, content] : contents) {
-        const std::string whole = "a.zarvo_data/" + path;
-        for (size_t slash = whole.find('/'); slash != std::string::npos; slash = whole.find('/', slash + 1))
-            tree[whole.substr(0, slash)] = kFolder;
-        tree[whole] = content;
+inline FolderTree ReadFolderTree(const std::string& folder) {
+    FolderTree tree;
+    for (const auto& entry : fs::recursive_directory_iterator(folder)) {
+        const bool isLink = entry.is_symlink(), isFolder = entry.is_directory() && !isLink;
+        const std::string path = entry.path(), name = path.substr(folder.size() + 1);
+        if (!isFolder || fs::is_empty(path))
+            tree[name] = isLink ? fs::read_symlink(path).string() : isFolder ? kFolder : Brief(ReadFile(path));
     }
     return tree;
 }
 
-inline FolderTree TreeOf(const std::vector<ArchiveEntry>& entries) {
-    FolderTree contents;
-    for (const ArchiveEntry& entry : entries)
-        if (entry.listed) contents[entry.path] = (entry.flags & kFolderEntry) != 0 ? kFolder : entry.bytes;
-    return OutputTree(contents);
+// What entries make of a folder, and of the folder itself when their path is empty or there are none.
+inline FolderTree Output(const std::vector<ArchiveEntry>& entries, const std::string& folder = "a.zarvo_data") {
+    FolderTree tree;
+    for (const auto& [path, bytes, flags, sourceFile, isListed] : entries)
+        if (isListed) tree[path.empty() ? folder : folder + "/" + path] = flags != 0 ? kFolder : Brief(bytes);
+    return tree.empty() ? FolderTree{{folder, kFolder}} : tree;
 }
 
-// A function, not a macro: the caller says where and in which row it is by SCOPED_TRACE.
-inline void ExpectOutcome(int status, const std::string& output, const FolderTree& tree, const Outcome& outcome) {
-    EXPECT_EQ((Transcript{.status = status, .output = output}), outcome.transcript);
-    EXPECT_EQ("", Differences(tree, outcome.tree));
-}
+struct Case {
+    std::string archive;          // as Archive takes it
+    std::string messages = "ok";  // as Say takes it; first what comes before the report on the header, and ";"
+    std::string output = "all";   // as Entries takes it; or all entries, or "none": no folder
+    ArchiveDescription form = {}; // what words can't say of the archive
+    std::string folder = {};      // else an empty one
+    std::string path = "a.zarvo";
+    std::function<bool()> prepare = {}; // as RunProgram takes it
+    bool isHeard = true;
+    std::function<void(std::string& bytes)> change = {}; // of the archive
+};
 
-// Bytes that no compressor makes smaller; the same for the same seed.
-inline std::string Incompressible(size_t size, unsigned seed = 1) {
-    std::mt19937 random(seed);
-    std::string bytes(size, '\0');
-    for (char& byte : bytes)
-        byte = static_cast<char>(random() & 0xFF);
-    return bytes;
-}
+inline void Expect(const Case& run) {
+    SCOPED_TRACE(run.archive + " at " + run.path);
+    const ArchiveDescription archive = Archive(run.archive, run.form);
+    std::string bytes = BuildArchive(archive).bytes;
+    const TemporaryFolder empty;
+    const std::string folder = run.folder.empty() ? empty.Path() : run.folder;
 
-// Bytes of which hardly anything is left when they are compressed.
-inline std::string ExtremelyCompressible(size_t size) { return std::string(size, 'z'); }
+    const UInt32 versions[] = {7, 6, 3, 3, 5};
+    const UInt32 version = archive.version.value_or(versions[static_cast<int>(archive.layout)]);
+    const bool hasSize =
+        archive.layout < ArchiveLayout::kWeb || (version > 1 && archive.layout != ArchiveLayout::kArchive);
+    const bool isRead = !run.messages.ends_with("unread"), isListed = isRead && !run.messages.ends_with("nodirectory");
+    const size_t early = run.messages.find(';') + 1;
+    std::ostringstream said;
+    said << "Extracting file '" << run.path << "'...\n" << Say(run.messages.substr(0, early));
+    if (isRead)
+        said << "  stream version: " << version << "\n  zarvo version: " << archive.engineVersion
+             << "\n  zarvo revision: " << archive.engineRevision << "\n  data size: " << (hasSize ? bytes.size() : 0)
+             << " bytes\n";
+    if (isListed) said << "  creating folder '" << run.path << "_data'\n";
+    said << Say(run.messages.substr(early), folder);
 
-// Bytes that become about half as many: runs of text between random bytes.
-inline std::string Compressible(size_t size, unsigned seed = 1) {
-    std::string bytes = Incompressible(size, seed);
-    for (size_t index = 0; index < size; ++index)
-        if (index / 64 % 2 == 0) bytes[index] = static_cast<char>('a' + index % 16);
-    return bytes;
-}
-
-// A path of this length, in components that a file system takes.
-inline std::string PathOfLength(size_t length) {
-    std::string path;
-    while (path.size() < length)
-        path += path.size() % 200 == 199 && path.size() + 1 < length ? '/' : 'p';
-    return path;
+    if (run.change) run.change(bytes);
+    const fs::path file = fs::path(folder) / run.path;
+    fs::create_directories(file.parent_path());
+    WriteFile(file, bytes);
+    const Transcript expected(run.messages.ends_with("ok") ? 0 : 1, run.isHeard ? said.str() : "");
+    EXPECT_EQ(expected, RunVarnex({run.path}, folder, run.prepare));
+    const std::string name = file.lexically_normal().lexically_relative(folder);
+    FolderTree tree;
+    if (isListed && run.output != "none")
+        tree = Output(run.output == "all" ? archive.entries : Entries(run.output), name + "_data");
+    tree[name] = Brief(bytes);
+    EXPECT_EQ(tree, ReadFolderTree(folder));
 }
