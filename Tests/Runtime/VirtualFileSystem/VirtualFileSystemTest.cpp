@@ -34,8 +34,7 @@ struct MarkedPathsHandler : LocalFileSystemPosix {
 TEST(VirtualFileSystem, VirtualOperationsLieInTheirFixedSlots) {
     // The slot that a pointer to a virtual function carries, as the ABI here defines it; 0 and 1 are the destructor's.
     const auto slot = [](auto function) { return std::bit_cast<std::array<size_t, 2>>(function)[0] / sizeof(void*); };
-    EXPECT_TRUE(slot(&FileSystemHandler::Close) == 7 && slot(&FileSystemHandler::MoveToTrash) == 32);
-    EXPECT_EQ(slot(&LocalFileSystemHandler::GetAvailableDiskSpace), 61u);
+    EXPECT_TRUE(slot(&FileSystemHandler::Close) == 7 && slot(&LocalFileSystemHandler::GetAvailableDiskSpace) == 61);
 }
 
 TEST(VirtualFileSystem, TheLastRegisteredHandlerThatClaimsAPathServesIt) {
@@ -45,8 +44,8 @@ TEST(VirtualFileSystem, TheLastRegisteredHandlerThatClaimsAPathServesIt) {
         MarkedPathsHandler first("mark"), second("mark2");
         EXPECT_TRUE(registry.GetHandlerForPath("x/mark2") == &second && registry.GetHandlerForPath("x/mark") == &first);
         EXPECT_TRUE(registry.ToAbsolute("mark2+") == "mark2" && registry.ToAbsolute("mark+") == "mark");
-        EXPECT_FALSE(registry.Enumerate("no\\mark", nullptr, false, kFileEnumerationAll));
-        EXPECT_EQ(first.calls, "+no\\mark -no\\mark ");
+        EXPECT_FALSE(registry.Enumerate("no\\mark", nullptr, false, kFileEnumerationAll) ||
+                     first.calls != "+no\\mark -no\\mark ");
     }
     EXPECT_TRUE(registry.ToAbsolute("mark") == "/cur/mark" && registry.ToAbsolute("/mark/..") == "/mark/..");
     EXPECT_EQ(registry.SetCurrentDirectory(std::string(1'100, 'c').c_str()).size(), 4u); // of the one before
@@ -66,10 +65,9 @@ TEST(VirtualFileSystem, EntriesAndAccessorsAreBoundAndUnboundInPairs) {
         entry = copy;
         entry.Set((longPath + "m").c_str()); // the mark is cut, but seen
         FileAccessor accessor;
-        UInt64 count = 7;
         EXPECT_TRUE(accessor.Close() && accessor.Open("m", kFilePermissionAppend, kFileAutoBehaviorLock));
         EXPECT_TRUE(accessor.Close() && !accessor.Close()); // asks again, but nobody is left to ask
-        EXPECT_FALSE(accessor.Read(0, 1, &count, &count) || accessor.Write(1, &count, &count));
+        EXPECT_FALSE(accessor.Read(0, 1, nullptr, nullptr) || accessor.Write(1, nullptr, nullptr));
         EXPECT_TRUE(accessor.Open("m", kFilePermissionRead)); // and closed by the destructor
     }
     EXPECT_EQ(handler.calls, "+m/a +m/a -m/a +m/a -m/a +" + longPath + " +m +m open 31m -m close m +m -m +m open 00m " +

@@ -26,6 +26,7 @@ struct ArchiveStorageReaderTestAccess {
         }
         return cache;
     }
+    static void EmptyCache(ArchiveStorageReader& reader) { reader.EmptyCache(); }
     static const auto& Blocks(const ArchiveStorageReader& reader) { return reader.m_BlocksInfo.storageBlocks; }
 };
 using Access = ArchiveStorageReaderTestAccess;
@@ -34,26 +35,24 @@ using Access = ArchiveStorageReaderTestAccess;
 struct DisturbedDisk : FaultyFileSystem {
     using FaultyFileSystem::Read;
     bool Read(FileEntryData& entry, UInt64 size, void* buffer, UInt64* actual, FileReadFlags flags) override {
-        isReached = true;
-        isReached.notify_all();
         isShut.wait(true);
         bytes += size;
         if (++reads % failsEvery == 0 || failures-- > 0) return false;
         return FaultyFileSystem::Read(entry, size, buffer, actual, flags);
     }
 
-    std::atomic<bool> isShut = false, isReached = false;
+    std::atomic<bool> isShut = false;
     std::atomic<int> failures = 0; // of the next reads
     std::atomic<UInt64> reads = 0, bytes = 0, failsEvery = ~UInt64{0};
 };
 
 // An archive on disk, behind as many other bytes as the offset says, and a reader of it.
 struct OpenedArchive {
-    explicit OpenedArchive(BuiltArchive archive, size_t offset = 0) : built(std::move(archive)) {
-        WriteFile(path, std::string(offset, '!') + built.bytes);
+    explicit OpenedArchive(const std::string& bytes, size_t offset = 0) {
+        WriteFile(path, std::string(offset, '!') + bytes);
         result = reader.Initialize(core::string(path.c_str()), offset);
     }
-    explicit OpenedArchive(const ArchiveDescription& description) : OpenedArchive(BuildArchive(description)) {}
+    explicit OpenedArchive(const ArchiveDescription& description) : OpenedArchive(BuildArchive(description).bytes) {}
 
     // The bytes that one call delivers; "refused" when it answers false.
     std::string Read(UInt64 from, UInt64 size, FileReadFlags flags = kFileReadFlagsNone) {
@@ -65,7 +64,6 @@ struct OpenedArchive {
 
     const TemporaryFolder folder;
     const std::string path = folder / "archive";
-    BuiltArchive built;
     ArchiveStorageReader reader{kMemLabelFileSystem};
     int result;
 };

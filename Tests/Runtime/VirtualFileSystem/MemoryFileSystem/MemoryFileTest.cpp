@@ -6,13 +6,14 @@
 #include <gtest/gtest.h>
 #include <random>
 
+static constexpr MemLabelIdentifier kLabel = kMemLabelGeneral;
+
 static std::string Read(const MemoryFileData& data, UInt64 from = 0, UInt64 size = 100'000) {
     std::string text(size, '?');
     return text.substr(0, data.Read(from, size, text.data()));
 }
 
 TEST(MemoryFileData, HoldsWhatATwinDoes) {
-    constexpr MemLabelIdentifier kLabel = kMemLabelGeneral;
     for (const size_t blockSize : {0u, 1u, 7u, 1'000u, 100'000u}) { // 0: in one buffer
         MemoryFileData* data = New<SingleBlockMemoryFileData>(kLabel, kLabel, nullptr, 0u, false);
         if (blockSize != 0) data->Release(), data = New<MultiBlocksMemoryFileData>(kLabel, kLabel, blockSize);
@@ -26,12 +27,11 @@ TEST(MemoryFileData, HoldsWhatATwinDoes) {
                 data->SetLength(from);
                 twin.resize(from);
             } else if (step % 50 == 48) {
-                char* contents = nullptr;
-                EXPECT_TRUE(data->Lock(reinterpret_cast<void**>(&contents)) &&
-                            twin.compare(0, twin.size(), contents, twin.size()) == 0);
-                contents[0] = 'L';
+                void* contents = nullptr;
+                ASSERT_TRUE(data->Lock(&contents) && memcmp(contents, twin.data(), twin.size()) == 0);
+                *static_cast<char*>(contents) = 'L';
                 data->Unlock(contents);
-                if (blockSize == 0 || blockSize > twin.size()) twin[0] = 'L'; // else it was a copy
+                if (blockSize == 0 || blockSize >= twin.size()) twin[0] = 'L'; // else it was a copy
             } else {
                 ASSERT_EQ(data->Write(from, piece.size(), piece.data()), piece.size());
                 twin.replace(from, piece.size(), piece);
@@ -53,7 +53,7 @@ TEST(MemoryFileData, HoldsWhatATwinDoes) {
 
 TEST(MemoryFile, ReadsAndSeeksReachOnlyWhatLiesInTheFile) {
     ReportRecorder reports;
-    MemoryFile file(kMemLabelGeneral, nullptr, kFilePermissionReadWrite);
+    MemoryFile file(kLabel, nullptr, kFilePermissionReadWrite);
     UInt64 count = 0;
     char bytes[101] = {};
     EXPECT_TRUE(file.Write(12, "twelve bytes", nullptr) && file.Read(7, 100, bytes, &count, kFileReadFlagsNone));
@@ -79,8 +79,7 @@ TEST(MemoryFile, ReadsAndSeeksReachOnlyWhatLiesInTheFile) {
 TEST(MemoryFile, PermissionAndCloseDecideWhatIsRefusedAndReported) {
     const auto read = [](MemoryFile& file) { return file.Read(0, nullptr, nullptr, kFileReadFlagsNone); };
     ReportRecorder reports;
-    MemoryFile source(kMemLabelGeneral, nullptr, kFilePermissionRead);
-    MemoryFile sink(kMemLabelGeneral, nullptr, kFilePermissionAppend);
+    MemoryFile source(kLabel, nullptr, kFilePermissionRead), sink(kLabel, nullptr, kFilePermissionAppend);
     EXPECT_TRUE(sink.Write(3, "abc", nullptr) && sink.SetLength(2) && sink.Size() == 2 && read(source));
     EXPECT_FALSE(source.Write(3, "abc", nullptr) || source.SetLength(2) || read(sink));
     EXPECT_TRUE(reports.Take().size() == 3 && source.Close() && sink.IsOpen() && sink.Close() && !sink.IsOpen());
@@ -93,9 +92,9 @@ TEST(MemoryFile, EntryWrapsMemoryThatGrowsOnlyWhenTakenOver) {
     for (const bool isOwned : {false, true}) {
         char callers[17] = {}, text[32] = {};
         void* memory = callers;
-        if (isOwned) memory = malloc_internal(16, 16, kMemLabelGeneral, kAllocateOptionNone, __FILE__, __LINE__);
+        if (isOwned) memory = malloc_internal(16, 16, kLabel, kAllocateOptionNone, __FILE__, __LINE__);
         FileSystemEntry entry =
-            MemoryFile::CreateFileSystemEntry(kMemLabelGeneral, kFilePermissionReadWrite, memory, 16, isOwned);
+            MemoryFile::CreateFileSystemEntry(kLabel, kFilePermissionReadWrite, memory, 16, isOwned);
         FileAccessor accessor;
         UInt64 count = 0;
         EXPECT_TRUE(accessor.Open(entry, kFilePermissionRead) && accessor.Seek(6, kFileOriginEnd));
