@@ -11,8 +11,6 @@ static std::atomic<int> gInterruptions;
 
 TEST(Semaphore, WakesNobodyForAnInterruptionAndAsksTheSystemOnlyForThreadsThatWait) {
     Footing_Semaphore_CreateInplace(&gSemaphore);
-    Footing_Semaphore_Release(&gSemaphore, 1);
-    Footing_Semaphore_Acquire(&gSemaphore);
     struct sigaction action = {}; // without SA_RESTART: a signal interrupts the wait
     action.sa_handler = [](int) {
         if (++gInterruptions == 3) Footing_Semaphore_Release(&gSemaphore, 3);
@@ -22,8 +20,7 @@ TEST(Semaphore, WakesNobodyForAnInterruptionAndAsksTheSystemOnlyForThreadsThatWa
     setitimer(ITIMER_REAL, &everyMillisecond, nullptr);
     Footing_Semaphore_Acquire(&gSemaphore);
     setitimer(ITIMER_REAL, &never, nullptr);
-    EXPECT_GE(gInterruptions, 3);
-    EXPECT_TRUE(gSemaphore.count == 2 && gSemaphore.storage.count == 0);
-    EXPECT_NE(dispatch_semaphore_wait(gSemaphore.storage.platformSemaphore, DISPATCH_TIME_NOW), 0);
+    Footing_Semaphore_Acquire(&gSemaphore); // asks the system for nothing
+    EXPECT_TRUE(gInterruptions >= 3 && gSemaphore.count == 1 && gSemaphore.storage.count == 0);
     Footing_Semaphore_FreeInplace(&gSemaphore);
 }

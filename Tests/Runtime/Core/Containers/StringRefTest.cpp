@@ -1,7 +1,6 @@
 #include "Runtime/Core/Containers/StringRef.h"
 
 #include <gtest/gtest.h>
-#include <string>
 #include <vector>
 
 TEST(StringRef, BehavesAsItsTwinOnEveryShortText) {
@@ -18,17 +17,14 @@ TEST(StringRef, BehavesAsItsTwinOnEveryShortText) {
             ASSERT_EQ(std::pair(ours == other, ours < other), std::pair(a == b, a < b));
             ASSERT_TRUE((ours.compare(b.c_str()) <=> 0) == (a.compare(b.c_str()) <=> 0));
             ASSERT_TRUE((ours.compare(upper.c_str(), kCaseInsensitive) <=> 0) == (a.compare(b.c_str()) <=> 0));
-            ASSERT_EQ(ours.starts_with(other), a.starts_with(b));
+            ASSERT_TRUE(ours.starts_with(other) == a.starts_with(b) && ours.rfind(b[0]) == a.rfind(b[0]));
             ASSERT_EQ(ours.starts_with({upper.data(), upper.size()}, kCaseInsensitive), a.starts_with(b));
-            ASSERT_EQ(ours.rfind(b[0]), a.rfind(b[0]));
             for (const size_t pos : {size_t{0}, size_t{1}, size_t{3}, ~size_t{0}}) { // the last and a size wrap
-                ASSERT_EQ(ours.find(other, pos), a.find(b, pos));
-                ASSERT_EQ(ours.find(b[0], pos), a.find(b[0], pos));
+                ASSERT_TRUE(ours.find(other, pos) == a.find(b, pos) && ours.find(b[0], pos) == a.find(b[0], pos));
                 ASSERT_EQ(ours.find_case_insensitive(upper.data(), pos, b.size()), b.empty() ? pos : a.find(b, pos));
             }
         }
     EXPECT_LT(core::string_ref("").compare(core::string_ref("", size_t{1} << 32)), 0); // only the lengths are looked at
     char copy[] = "####";
-    EXPECT_TRUE(strcpy_truncate(copy, "abc", 3, 3) == 2 && strcpy_truncate(copy, "abc", 0, 3) == 0);
-    EXPECT_EQ(std::string(copy, 4), std::string("ab\0#", 4));
+    EXPECT_TRUE(strcpy_truncate(copy, "abc", 3, 3) == 2 && memcmp(copy, "ab\0#", 4) == 0);
 }

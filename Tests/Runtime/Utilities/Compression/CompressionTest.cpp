@@ -1,6 +1,3 @@
-#include "Runtime/Allocator/Allocator.h"
-#include "Runtime/Utilities/Compression/Lz4Decompressor.h"
-#include "Runtime/Utilities/Compression/LzmaDecompressor.h"
 #include "Tests/Support/ReportRecorder.h"
 #include "Tools/ArchiveWriter/Compressors.h"
 
@@ -10,8 +7,8 @@
 #include <random>
 
 using namespace std::string_literals;
-static const Lz4Decompressor kLz4;
-static const LzmaDecompressor kLzma;
+static const IDecompressor* const kLz4 = CreateDecompressor(kCompressionLz4HC, kMemLabelGeneral);
+static const IDecompressor* const kLzma = CreateDecompressor(kCompressionLzma, kMemLabelGeneral);
 static const std::string kPlain = "zarvo zarvo zarvo zarvo\n", kLz4Block = "\x69zarvo \6\0Parvo\n"s;
 static const std::string kUnmarked = "\x5d\0\x10\0\0\0\x3d\x18\x4a\xac\x4a\x1d\x09\x1a\x65\xdc\xc3\0\0"s;
 static const std::string kMarked = kUnmarked.substr(0, 15) + "\xe3\x3d\x7a\xff\xff\xfc\xf4\x50\0"s;
@@ -19,53 +16,41 @@ static const std::string kMarked = kUnmarked.substr(0, 15) + "\xe3\x3d\x7a\xff\x
 // One call, of a stream or for a whole buffer: how much was consumed, and the output; nothing when it is refused. The
 // memory is of exactly the sizes given, for the sanitizer to watch; input that there is none of has no address.
 using Result = std::optional<std::pair<size_t, std::string>>;
-static Result Decode(const IDecompressor& decoder, void* state, const std::string& source, size_t room, bool isLast) {
+static Result Decode(const IDecompressor* decoder, void* state, const std::string& source, size_t room, bool isLast) {
     std::vector<char> in(source.begin(), source.end()), out(room);
     size_t taken = in.size(), made = room;
-    const bool isDone = state == nullptr
-                            ? decoder.DecompressMemory(in.data(), &taken, out.data(), &made)
-                            : decoder.DecompressStream(state, in.data(), &taken, out.data(), &made, isLast);
-    return isDone ? Result({taken, std::string(out.data(), made)}) : Result();
-}
-
-TEST(CreateDecompressor, AnswersByKindAndReportsThoseWithoutOne) {
-    ReportRecorder reports;
-    for (const auto& [asked, type] : {std::pair(0, 0), {1, 1}, {2, 2}, {3, 2}, {4, 0}}) {
-        IDecompressor* const made = CreateDecompressor(static_cast<CompressionType>(asked), kMemLabelGeneral);
-        EXPECT_EQ(made != nullptr ? static_cast<int>(made->GetType()) : 0, type) << asked;
-        Delete(made, kMemLabelGeneral);
-    }
-    EXPECT_EQ(reports.Take().size(), 1u); // of the last
+    if (state == nullptr ? !decoder->DecompressMemory(in.data(), &taken, out.data(), &made)
+                         : !decoder->DecompressStream(state, in.data(), &taken, out.data(), &made, isLast))
+        return {};
+    return Result({taken, std::string(out.data(), made)});
 }
 
 TEST(Decompressor, OneCallDecodesWhatFitsOrRefuses) {
     using Row = std::tuple<const IDecompressor*, bool, std::string, size_t, size_t, size_t>;
     for (const auto& [decoder, isStream, source, room, consumed, produced] : // consumed: 0 when refused
-         {Row(&kLz4, false, kLz4Block, 99, 15, 24), Row(&kLz4, false, kLz4Block, 23, 0, 0),
-          Row(&kLz4, false, kLz4Block + kLz4Block, 99, 0, 0), Row(&kLz4, false, "\0"s, 9, 0, 0),
-          Row(&kLz4, true, kLz4Block, 24, 0, 0), Row(&kLzma, false, kUnmarked + "more", 24, 19, 24),
-          Row(&kLzma, true, kUnmarked, 25, 19, 24), Row(&kLzma, false, kUnmarked, 25, 0, 0),
-          Row(&kLzma, false, kMarked + "more", 99, 24, 24), Row(&kLzma, true, kMarked + "more", 99, 24, 24),
-          Row(&kLzma, false, kUnmarked, 10, 18, 10), Row(&kLzma, true, kMarked.substr(0, 4), 9, 0, 0),
-          Row(&kLzma, true, "\xE1" + kMarked, 24, 0, 0)}) {
+         {Row(kLz4, false, kLz4Block, 99, 15, 24), Row(kLz4, false, kLz4Block, 23, 0, 0),
+          Row(kLz4, false, kLz4Block + kLz4Block, 99, 0, 0), Row(kLz4, true, kLz4Block, 24, 0, 0),
+          Row(kLzma, false, kUnmarked + "more", 24, 19, 24), Row(kLzma, true, kUnmarked, 25, 19, 24),
+          Row(kLzma, false, kUnmarked, 25, 0, 0), Row(kLzma, false, kUnmarked, 10, 18, 10),
+          Row(kLzma, false, kMarked + "more", 99, 24, 24), Row(kLzma, true, kMarked + "more", 99, 24, 24),
+          Row(kLzma, true, kMarked.substr(0, 4), 9, 0, 0), Row(kLzma, true, "\xE1" + kMarked, 24, 0, 0)}) {
         void* state = nullptr;
-        ASSERT_TRUE(!isStream || kLzma.DecompressStreamInit(&state));
-        EXPECT_EQ(Decode(*decoder, state, source, room, false),
-                  consumed == 0 ? Result() : Result({consumed, kPlain.substr(0, produced)}))
-            << source.size() << " into " << room;
-        kLzma.DecompressStreamDeinit(state);
+        ASSERT_TRUE(!isStream || kLzma->DecompressStreamInit(&state));
+        const Result expected = consumed == 0 ? Result() : Result({consumed, kPlain.substr(0, produced)});
+        EXPECT_EQ(Decode(decoder, state, source, room, false), expected) << source.size() << " into " << room;
+        kLzma->DecompressStreamDeinit(state);
     }
     for (size_t length = 0; length < kMarked.size(); ++length)
         EXPECT_FALSE(Decode(kLzma, nullptr, kMarked.substr(0, length), 99, false)) << length;
     for (size_t length = 0; length < kLz4Block.size(); ++length)
         EXPECT_NE(Decode(kLz4, nullptr, kLz4Block.substr(0, length), 24, false), Result({length, kPlain})) << length;
-}
-
-TEST(Lz4Decompressor, RefusesSizesFromTheLargestIntOn) {
     ReportRecorder reports;
+    EXPECT_TRUE(kLz4->GetType() == kCompressionLz4 && kLzma->GetType() == kCompressionLzma);
+    for (const CompressionType type : {kCompressionNone, kCompressionCount}) // the second is reported
+        EXPECT_EQ(CreateDecompressor(type, kMemLabelGeneral), nullptr);
     size_t tooMuch = 0x7FFFFFFF, made = 24;
-    EXPECT_FALSE(kLz4.DecompressMemory(kLz4Block.data(), &tooMuch, nullptr, &made));
-    EXPECT_EQ(reports.Take().size(), 1u);
+    EXPECT_FALSE(kLz4->DecompressMemory(kLz4Block.data(), &tooMuch, nullptr, &made)); // reported
+    EXPECT_EQ(reports.Take().size(), 2u);
 }
 
 // The decoder, called again after an error, reads wild memory; the state refuses instead.
@@ -80,21 +65,17 @@ TEST(LzmaDecompressor, StreamCutInAnyWayIsTheWholeAndADamagedOneRefusesUntilItIs
         std::string source = stored[round % 2], output;
         if (round % 4 < 2) source[5 + random() % (source.size() - 5)] ^= '\x55';
         const size_t piece = size_t{5} << random() % 15, window = size_t{9} << random() % 15;
-        ASSERT_TRUE(kLzma.DecompressStreamInit(&state));
+        ASSERT_TRUE(kLzma->DecompressStreamInit(&state));
         Result step;
-        size_t consumed = 0;
         do {
-            const std::string input = source.substr(consumed, piece);
-            const size_t room = std::min(window, plain.size() - output.size());
-            const bool isLast = consumed + input.size() == source.size() && output.size() + room == plain.size();
-            step = Decode(kLzma, state, input, room, isLast);
-            if (step) consumed += step->first, output += step->second;
+            const size_t left = plain.size() - output.size(), room = std::min(window, left);
+            step = Decode(kLzma, state, source.substr(0, piece), room, piece >= source.size() && room == left);
+            if (step) source.erase(0, step->first), output += step->second;
         } while (step && step->first + step->second.size() != 0 && output.size() < plain.size());
         EXPECT_TRUE(round % 4 < 2 || output == plain) << round;
+        EXPECT_TRUE(step || !(Decode(kLzma, state, source, 9, false) || Decode(kLzma, state, "", 9, false))) << round;
         refused += !step;
-        for (const std::string& next : {source, ""s})
-            EXPECT_TRUE(step || !Decode(kLzma, state, next, 65'536, false)) << round;
     }
     EXPECT_GT(refused, 10); // else the damage did not reach the decoder
-    kLzma.DecompressStreamDeinit(state);
+    kLzma->DecompressStreamDeinit(state);
 }
