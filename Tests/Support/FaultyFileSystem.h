@@ -31,9 +31,9 @@ public:
     void Arm(int n, FaultKind kind) {
         m_CallsLeft = n;
         m_Kind = kind;
-        m_HasStruck = false;
     }
-    bool HasStruck() const { return m_HasStruck; }
+    // Whether one has failed since.
+    bool HasStruck() const { return m_CallsLeft <= 0; }
 
     // Instead of failing, the call that is due runs this first, and goes on.
     std::function<void()> action;
@@ -69,7 +69,6 @@ private:
         if (m_Kind.isShort && (size == nullptr || *size < 2)) return false;
         --m_CallsLeft;
         if (m_CallsLeft > 0 || (m_CallsLeft < 0 && !m_Kind.isLasting)) return false;
-        m_HasStruck = true;
         if (action != nullptr) action();
         if (m_Kind.isShort) *size /= 2;
         if (action != nullptr || m_Kind.isShort) return false;
@@ -77,7 +76,6 @@ private:
         return true;
     }
 
-    mutable int m_CallsLeft = 0;
+    mutable int m_CallsLeft = 0; // until one fails; -1 and below: since then
     FaultKind m_Kind{false, false};
-    mutable bool m_HasStruck = false;
 };

@@ -21,7 +21,7 @@ TEST(Command, LooksAtItsFirstArgumentOnly) {
 
 TEST(Command, RewritesWhatIsThereAndLeavesTheRest) {
     const TemporaryFolder folder, other;
-    Case run{.archive = kThree, .folder = folder.Path()};
+    Case run{.archive = kThree, .folder = folder.Path(), .path = folder / "a.zarvo"};
     Expect(run);
     // As after a run that was interrupted, and with something else in the folder.
     WriteFile(folder / "a.zarvo_data/a", "cut");

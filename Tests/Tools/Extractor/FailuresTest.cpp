@@ -24,10 +24,8 @@ TEST(Failures, HeadersAreRefusedAndDamageSpoilsTheReadsThatNeedIt) {
         {"data:a", "a:", "lzma streamed block[0].compressedSize=4; lzma streamed block[0].compressedSize=10"},
         {"toolarge data:a", "a:", "lz4 block[0].uncompressedSize=0x7FFFFFFF"},
         {"unstarted data:a", "a:", "lz4 block[0].flags=0x42; old lz4hc running[0].streamed=3"},
-        {"unsupported data:a", "a:", "block[0].flags=4"},
         {"unsupported unsupported data:a", "a:", "block[0].flags=0x44"}, // asked for to start it, and to fill
-        {"unknown data:a", "a:", "block[0].flags=5"},
-        {"unknown unknown data:a", "a:", "block[0].flags=0x7F"},
+        {"unknown unknown data:a", "a:", "block[0].flags=0x45; block[0].flags=0x7F"},
         // A whole block that fails spoils its read, a part of one only itself.
         {"unsupported data:a", "a:", "chunk=20000 block[1].flags=4"},
         {"unsupported unsupported data:a", "a:c50000", "chunk=50000 block[1].flags=4"},
@@ -103,18 +101,17 @@ TEST(Failures, RangesAreReadInAnyOrderAndDamageSpoilsOnlyWhatLiesBehindIt) {
 TEST(Failures, HostileValuesInAnyFieldAreSurvived) {
     for (const std::string form : {"fs lzma streamed", "web6 lzma section end", "web", "raw", "old lzma streamed end"})
         for (const auto& [name, field] : BuildArchive(Archive(form + " a:c70000 b:text")).fields)
-            for (const char* value : {"=0", "=1", "=0x7FFFFFFF", "=0x80000000", "=0xFFFFFFFF", "=0x7FFFFFFFFFFFFFFF",
-                                      "=0x8000000000000000", "=0xFFFFFFFFFFFFFFFF"}) {
-                const std::string words = form + " chunk=70000 a:c70000 b:text " + name + value;
-                SCOPED_TRACE(words);
+            for (const char* value : {"0", "1", "0x7FFFFFFF", "0x80000000", "0xFFFFFFFF", "0x7FFFFFFFFFFFFFFF",
+                                      "0x8000000000000000", "0xFFFFFFFFFFFFFFFF"}) {
+                const std::string words = form + " chunk=70000 a:c70000 b:text " + name + "=" + value;
                 const TemporaryFolder folder;
                 WriteFile(folder / "a.zarvo", BuildArchive(Archive(words)).bytes);
                 const auto [status, output] = RunVarnex({"a.zarvo"}, folder.Path());
-                EXPECT_EQ(output.ends_with(Say("ok")) ? 0 : 1, status) << output;
-                for (const auto& [path, content] : ReadFolderTree(folder.Path()))
-                    EXPECT_TRUE(path.starts_with("a.zarvo")) << path;
+                EXPECT_EQ(output.ends_with(Say("ok")) ? 0 : 1, status) << words << "\n" << output;
+                for (const auto& entry : fs::directory_iterator(folder.Path()))
+                    EXPECT_TRUE(entry.path().string().starts_with(folder / "a.zarvo")) << words << "\n" << entry.path();
                 rusage usage;
                 ASSERT_EQ(0, getrusage(RUSAGE_CHILDREN, &usage));
-                ASSERT_LE(usage.ru_maxrss, VARNEX_SANITIZED ? usage.ru_maxrss : 64 * 1'024);
+                ASSERT_LE(usage.ru_maxrss, VARNEX_SANITIZED ? usage.ru_maxrss : 64 * 1'024) << words;
             }
 }
