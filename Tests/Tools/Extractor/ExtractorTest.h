@@ -154,18 +154,16 @@ inline void Expect(const Case& run) {
     const TemporaryFolder empty;
     const std::string folder = run.folder.empty() ? empty.Path() : run.folder;
 
-    const UInt32 versions[] = {7, 6, 3, 3, 5};
-    const UInt32 version = archive.version.value_or(versions[static_cast<int>(archive.layout)]);
-    const bool hasSize =
-        archive.layout < ArchiveLayout::kWeb || (version > 1 && archive.layout != ArchiveLayout::kArchive);
+    const size_t layout = static_cast<size_t>(archive.layout); // from the third on old ones, the last without a size
+    const UInt32 version = archive.version.value_or(std::array{7u, 6u, 3u, 3u, 5u}[layout]);
+    const size_t size = layout < 2 || (layout < 4 && version > 1) ? bytes.size() : 0;
     const bool isRead = !run.messages.ends_with("unread"), isListed = isRead && !run.messages.ends_with("nodirectory");
     const size_t early = run.messages.find(';') + 1;
     std::ostringstream said;
     said << "Extracting file '" << run.path << "'...\n" << Say(run.messages.substr(0, early));
     if (isRead)
         said << "  stream version: " << version << "\n  zarvo version: " << archive.engineVersion
-             << "\n  zarvo revision: " << archive.engineRevision << "\n  data size: " << (hasSize ? bytes.size() : 0)
-             << " bytes\n";
+             << "\n  zarvo revision: " << archive.engineRevision << "\n  data size: " << size << " bytes\n";
     if (isListed) said << "  creating folder '" << run.path << "_data'\n";
     said << Say(run.messages.substr(early), folder);
 
