@@ -1,9 +1,9 @@
 // The least that extracting an archive can cost: Floor ARCHIVE FOLDER
 //
-// Reads ARCHIVE.plan (see PackFolder.cpp), so it parses and checks nothing of the archive; decodes the blocks, one call
-// each, into one buffer, and makes each file of FOLDER with open, one write and close, each folder with mkdir. Stored
-// blocks are read in pieces. Files must be below 2 GiB. An unexpected
-// result ends it with status 1.
+// Reads ARCHIVE.plan (see PackFolder.cpp), so it parses and checks nothing of the archive; decodes the blocks into one
+// buffer that stays in the processor's cache, and makes each file of FOLDER with open, one write (a large one with one
+// for each piece) and close, each folder with mkdir. A block that is no larger than a piece is decoded in one call,
+// larger ones piece by piece. An unexpected result ends it with status 1.
 #include "Runtime/Utilities/Compression/Compression.h"
 
 #include <algorithm>
@@ -22,8 +22,8 @@
 
 namespace {
 
-constexpr UInt64 kStoredPiece = 131'072;
-constexpr UInt64 kSlack = 1'048'576; // bytes that have been written stay in the buffer until there are so many
+constexpr UInt64 kPiece = 131'072;
+constexpr UInt64 kSlack = 524'288; // bytes that have been written stay in the buffer until there are so many
 constexpr UInt64 kLzmaPropertiesSize = 5;
 
 void Require(bool isTrue, const char* what) {
@@ -81,28 +81,27 @@ public:
     Stream(const char* archive, const Plan& plan)
         : m_Archive(open(archive, O_RDONLY)), m_Plan(plan), m_Position(plan.dataOffset) {
         Require(m_Archive >= 0, archive);
-        UInt64 largestFile = 0, largestBlock = kStoredPiece, largestStored = 0;
-        for (const Node& node : plan.nodes)
-            largestFile = std::max(largestFile, node.size);
+        UInt64 largestBlock = kPiece, largestStored = kPiece;
         for (const Block& block : plan.blocks) {
-            if (block.type == kCompressionNone) continue;
+            if (IsDecodedInPieces(block)) continue;
             largestBlock = std::max(largestBlock, block.size);
             largestStored = std::max(largestStored, block.storedSize);
         }
-        // Not a vector: what the decoder overwrites need not be cleared.
-        m_Buffer = static_cast<char*>(malloc(kSlack + largestFile + 2 * largestBlock));
-        m_Stored = static_cast<char*>(malloc(largestStored + 1));
+        // Not vectors: what is about to be overwritten need not be cleared.
+        m_Buffer = static_cast<char*>(malloc(kSlack + kPiece + 2 * largestBlock));
+        m_Stored = static_cast<char*>(malloc(largestStored));
         Require(m_Buffer != nullptr && m_Stored != nullptr, "malloc");
+        LzmaDec_Construct(&m_Lzma);
     }
 
-    // Those bytes; offsets must not go back.
+    // Those bytes, at most kPiece; offsets must not go back.
     const char* At(UInt64 offset, UInt64 size) {
         while (m_Start + m_Filled < offset + size) {
-            const UInt64 written = offset - m_Start;
-            if (written > kSlack) {
-                m_Filled -= std::min(m_Filled, written);
-                memmove(m_Buffer, m_Buffer + written, m_Filled);
-                m_Start = offset;
+            const UInt64 unwanted = std::min(m_Filled, offset - m_Start);
+            if (unwanted > kSlack) {
+                m_Filled -= unwanted;
+                memmove(m_Buffer, m_Buffer + unwanted, m_Filled);
+                m_Start += unwanted;
             }
             DecodeNext();
         }
@@ -110,6 +109,10 @@ public:
     }
 
 private:
+    static bool IsDecodedInPieces(const Block& block) {
+        return block.type == kCompressionNone || (block.type == kCompressionLzma && block.size > kPiece);
+    }
+
     void ReadStored(char* to, UInt64 size) {
         Require(pread(m_Archive, to, size, static_cast<off_t>(m_Position)) == static_cast<ssize_t>(size), "pread");
         m_Position += size;
@@ -119,45 +122,82 @@ private:
         Require(m_NextBlock < m_Plan.blocks.size(), "the blocks end too early");
         const Block& block = m_Plan.blocks[m_NextBlock];
         char* const to = m_Buffer + m_Filled;
-        if (block.type == kCompressionNone) {
-            const UInt64 size = std::min(kStoredPiece, block.size - m_TakenOfStored);
-            ReadStored(to, size);
-            m_Filled += size;
-            m_TakenOfStored += size;
-            if (m_TakenOfStored < block.size) return;
-            m_TakenOfStored = 0;
-        } else {
+        if (!IsDecodedInPieces(block)) {
             ReadStored(m_Stored, block.storedSize);
-            if (block.type == kCompressionLzma)
-                DecodeLzma(block, to);
-            else
-                Require(LZ4_decompress_safe(m_Stored, to, static_cast<int>(block.storedSize),
-                                            static_cast<int>(block.size)) == static_cast<int>(block.size),
-                        "LZ4_decompress_safe");
+            DecodeWhole(block, to);
             m_Filled += block.size;
+            ++m_NextBlock;
+            return;
         }
+        const UInt64 size = std::min(kPiece, block.size - m_Taken);
+        if (block.type == kCompressionNone)
+            ReadStored(to, size);
+        else
+            DecodePiece(block, to, size);
+        m_Filled += size;
+        m_Taken += size;
+        if (m_Taken < block.size) return;
+        m_Position += m_StoredLeft; // an end mark
+        m_StoredLeft = m_Loaded = m_Consumed = m_Taken = 0;
         ++m_NextBlock;
     }
 
-    void DecodeLzma(const Block& block, char* to) {
-        ISzAlloc allocator = {AllocateForDecoder, FreeForDecoder};
+    void DecodeWhole(const Block& block, char* to) {
+        if (block.type != kCompressionLzma) {
+            const int size =
+                LZ4_decompress_safe(m_Stored, to, static_cast<int>(block.storedSize), static_cast<int>(block.size));
+            return Require(size == static_cast<int>(block.size), "LZ4_decompress_safe");
+        }
         SizeT size = block.size, storedSize = block.storedSize - block.behind;
         const Byte* const stored = reinterpret_cast<const Byte*>(m_Stored);
         ELzmaStatus status;
         const SRes result = LzmaDecode(reinterpret_cast<Byte*>(to), &size, stored + block.behind, &storedSize, stored,
-                                       kLzmaPropertiesSize, LZMA_FINISH_ANY, &status, &allocator);
+                                       kLzmaPropertiesSize, LZMA_FINISH_ANY, &status, &m_Allocator);
         Require(result == SZ_OK && size == block.size, "LzmaDecode");
+    }
+
+    // The next bytes of a stream of LZMA.
+    void DecodePiece(const Block& block, char* to, UInt64 size) {
+        const Byte* const stored = reinterpret_cast<const Byte*>(m_Stored);
+        if (m_Taken == 0) {
+            ReadStored(m_Stored, block.behind);
+            m_StoredLeft = block.storedSize - block.behind;
+            Require(LzmaDec_Allocate(&m_Lzma, stored, kLzmaPropertiesSize, &m_Allocator) == SZ_OK, "LzmaDec_Allocate");
+            LzmaDec_Init(&m_Lzma);
+        }
+        while (size != 0) {
+            if (m_Consumed == m_Loaded) {
+                m_Loaded = std::min(kPiece, m_StoredLeft);
+                m_Consumed = 0;
+                m_StoredLeft -= m_Loaded;
+                ReadStored(m_Stored, m_Loaded);
+            }
+            SizeT produced = size, consumed = m_Loaded - m_Consumed;
+            ELzmaStatus status;
+            const SRes result = LzmaDec_DecodeToBuf(&m_Lzma, reinterpret_cast<Byte*>(to), &produced,
+                                                    stored + m_Consumed, &consumed, LZMA_FINISH_ANY, &status);
+            Require(result == SZ_OK && produced + consumed != 0, "LzmaDec_DecodeToBuf");
+            m_Consumed += consumed;
+            to += produced;
+            size -= produced;
+        }
     }
 
     int m_Archive;
     const Plan& m_Plan;
-    UInt64 m_Position;          // in the archive, of the next stored byte
-    size_t m_NextBlock = 0;     // to be decoded
-    UInt64 m_TakenOfStored = 0; // of a stored block, which is read in pieces
-    UInt64 m_Start = 0;         // in the data stream, of the buffer's first byte
-    UInt64 m_Filled = 0;        // of the buffer
-    char* m_Buffer;             // until the program ends
-    char* m_Stored;             // one block's bytes
+    UInt64 m_Position;      // in the archive, of the next stored byte
+    size_t m_NextBlock = 0; // to be decoded
+    UInt64 m_Taken = 0;     // of it, when it is decoded in pieces
+    UInt64 m_Start = 0;     // in the data stream, of the buffer's first byte
+    UInt64 m_Filled = 0;    // of the buffer
+    char* m_Buffer;         // until the program ends
+    char* m_Stored;         // one block's bytes, or a piece of them
+
+    ISzAlloc m_Allocator = {AllocateForDecoder, FreeForDecoder};
+    CLzmaDec m_Lzma;
+    UInt64 m_StoredLeft = 0; // of the block, behind the piece
+    UInt64 m_Loaded = 0;     // the piece
+    UInt64 m_Consumed = 0;   // of it
 };
 
 // Makes the folder of a file, and those above it, unless the file before it lay in the same one.
@@ -188,10 +228,14 @@ int main(int argumentCount, char** arguments) {
             continue;
         }
         if (!hasFolders) MakeParent(node.path, &lastParent);
-        const char* const bytes = stream.At(node.offset, node.size);
         const int file = open(path, O_WRONLY | O_CREAT | O_TRUNC, 0666);
         Require(file >= 0, path);
-        if (node.size != 0) Require(write(file, bytes, node.size) == static_cast<ssize_t>(node.size), path);
+        for (UInt64 written = 0; written < node.size;) {
+            const UInt64 size = std::min(kPiece, node.size - written);
+            const char* const bytes = stream.At(node.offset + written, size);
+            Require(write(file, bytes, size) == static_cast<ssize_t>(size), path);
+            written += size;
+        }
         Require(close(file) == 0, path);
     }
     return 0;

@@ -1,0 +1,70 @@
+"""Whether the cost of a file, and of a byte, stays the same however many there are in one archive."""
+
+import os
+import shutil
+import sys
+import tempfile
+
+from compare import DEFAULT_FOLDER, make_tree
+from measuring import Row, count_calls, measure, median, run, table
+
+FILE_COUNTS = [1_000, 10_000, 100_000, 1_000_000]
+FILES_WITH_COUNTED_CALLS = 10_000  # strace slows calls down a lot
+BYTE_COUNTS = [10_000_000, 100_000_000, 1_000_000_000, 4 << 30]
+ARCHIVE = "flat.zarvo"
+
+
+def measure_archive(options, kind, source, counts_calls=False):
+    """Packs the source, on the disk; the median of extracting it on the memory file system, and the system calls."""
+    row = Row("", ARCHIVE, [f"{options.build}/Varnex", ARCHIVE], ARCHIVE + "_data")
+    with tempfile.TemporaryDirectory(prefix="varnex-flat-", dir=options.memory) as folder:
+        with tempfile.TemporaryDirectory(dir=options.scratch) as packed:
+            run([f"{options.build}/Benchmarks/PackFolder", kind, str(source), f"{packed}/{ARCHIVE}"])
+            shutil.copyfile(f"{packed}/{ARCHIVE}", f"{folder}/{ARCHIVE}")
+        calls = count_calls(row, folder) if counts_calls else None
+        return median([measure(options.build, row, folder) for _ in range(options.rounds)]), calls
+
+
+def write_data(tree, path, size):
+    """A file of that size: the tree's files one after another, again and again."""
+    with open(path, "wb") as out:
+        while True:
+            for parent, folders, names in os.walk(tree):
+                folders.sort()
+                for name in sorted(names):
+                    with open(os.path.join(parent, name), "rb") as source:
+                        out.write(source.read(size - out.tell()))
+                    if out.tell() == size:
+                        return
+
+
+def progress(text):
+    print(text, file=sys.stderr, flush=True)
+
+
+def print_flatness(options):
+    lines = []
+    for count in FILE_COUNTS:
+        progress(f"{count:,} empty files")
+        cost, calls = measure_archive(options, "stored", count, count <= FILES_WITH_COUNTED_CALLS)
+        lines.append([f"{count:,}", f"{cost.wall:.3f}", f"{cost.wall / count * 1e6:.2f}", f"{cost.peak / 1024:.1f}",
+                      f"{calls / count:.2f}" if calls else ""])
+    print(f"Empty files in folders of 1,000, on a memory file system, medians of {options.rounds} rounds:")
+    table(["files", "wall, s", "a file, µs", "peak, MiB", "system calls a file"], lines)
+
+    tree = make_tree(os.path.abspath(options.folder or DEFAULT_FOLDER), options.folder is None, options.scratch)
+    lines = []
+    for size in BYTE_COUNTS:
+        if shutil.disk_usage(options.memory).free < 2.1 * size:
+            progress(f"no room for {size:,} bytes")
+            continue
+        with tempfile.TemporaryDirectory(dir=options.scratch) as source:
+            write_data(tree, f"{source}/data", size)
+            costs = []
+            for kind in ("stored", "lz4hc"):
+                progress(f"{size:,} bytes, {kind}")
+                costs.append(measure_archive(options, kind, source)[0])
+        lines.append([f"{size:,}"] + [text for cost in costs for text in
+                                      (f"{cost.wall:.3f}", f"{cost.wall / size * 1e9:.3f}", f"{cost.peak / 1024:.1f}")])
+    print("\nOne file, in blocks of 128 KiB:")
+    table(["bytes", "stored: wall, s", "a byte, ns", "peak, MiB", "LZ4HC: wall, s", "a byte, ns", "peak, MiB"], lines)

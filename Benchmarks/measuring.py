@@ -1,0 +1,61 @@
+"""Running commands and what they cost. Extractors run in a folder that holds the archives, and write below it."""
+
+import os
+import shutil
+import statistics
+import subprocess
+import sys
+from collections import namedtuple
+
+Sample = namedtuple("Sample", "wall user system peak")  # seconds, seconds, seconds, KiB
+Row = namedtuple("Row", "title archive command output")
+
+
+def run(command, **options):
+    done = subprocess.run(command, stdout=subprocess.PIPE, stderr=subprocess.STDOUT, **options)
+    if done.returncode != 0:
+        sys.exit(f"{' '.join(map(str, command))} failed:\n{done.stdout.decode(errors='replace')[-2000:]}")
+    return done.stdout.decode(errors="replace")
+
+
+def prepare(row, folder):
+    output = os.path.join(folder, row.output)
+    shutil.rmtree(output, ignore_errors=True)
+    if row.command[0] == "tar":
+        os.mkdir(output)
+    return output
+
+
+def measure(build, row, folder):
+    output = prepare(row, folder)
+    os.sync()
+    words = run([f"{build}/Benchmarks/Measure", *row.command], cwd=folder).split()
+    shutil.rmtree(output, ignore_errors=True)
+    if words[4] != "0":
+        sys.exit(f"{' '.join(row.command)} ended with status {words[4]}")
+    return Sample(*map(float, words[:4]))
+
+
+def verify(row, folder, tree):
+    output = prepare(row, folder)
+    run(row.command, cwd=folder)
+    run(["diff", "-rq", "--no-dereference", tree, output])
+
+
+def count_calls(row, folder):
+    prepare(row, folder)
+    run(["strace", "-c", "-f", "-o", "calls", *row.command], cwd=folder)
+    with open(f"{folder}/calls") as file:
+        total = file.read().splitlines()[-1].split()
+    return int(total[3])
+
+
+def median(samples):
+    return Sample(*map(statistics.median, zip(*samples)))
+
+
+def table(head, lines):
+    print("\n| " + " | ".join(head) + " |")
+    print("| --- |" + " ---: |" * (len(head) - 1))
+    for line in lines:
+        print("| " + " | ".join(line) + " |")
