@@ -1,6 +1,8 @@
 """Measures Varnex: scripts/bench runs this once everything is built. docs/performance.md says what the rows mean."""
 
 import argparse
+import contextlib
+import io
 import os
 import shutil
 import sys
@@ -17,12 +19,23 @@ def roomiest_memory_folder():
     return max(folders, key=lambda folder: shutil.disk_usage(folder).free, default=None)
 
 
+def write_docs(name, text):
+    """Puts the text between the two comments of that name in docs/performance.md."""
+    path = os.path.join(os.path.dirname(os.path.abspath(__file__)), "..", "docs", "performance.md")
+    with open(path) as file:
+        before, _, rest = file.read().partition(f"<!-- {name}: begin -->\n")
+    behind = rest.partition(f"<!-- {name}: end -->")[2]
+    with open(path, "w") as file:
+        file.write(f"{before}<!-- {name}: begin -->\n{text.strip()}\n<!-- {name}: end -->{behind}")
+
+
 def main():
     temporary = tempfile.gettempdir()
     parser = argparse.ArgumentParser(prog="scripts/bench", description="Measures Varnex and prints Markdown tables.")
     parser.add_argument("folder", nargs="?", help=f"what to pack (default: a part of {DEFAULT_FOLDER})")
     parser.add_argument("--flat", action="store_true",
                         help="instead of comparing: the cost of a file and of a byte for more and more of them")
+    parser.add_argument("--write-docs", action="store_true", help="put the tables into docs/performance.md, too")
     parser.add_argument("--kinds", help=f"only these archives, and what they are held against: {','.join(KINDS)}")
     parser.add_argument("--rounds", type=int, default=7)
     parser.add_argument("--scratch", default=f"{temporary}/varnex-bench", help="packed archives are kept here")
@@ -34,10 +47,15 @@ def main():
     if not options.memory:
         sys.exit("there is no memory file system to write to: give one with --memory")
     os.makedirs(options.scratch, exist_ok=True)
-    if options.flat:
-        print_flatness(options)
-    else:
-        print_comparison(options)
+    text = io.StringIO()
+    with contextlib.redirect_stdout(text):
+        if options.flat:
+            print_flatness(options)
+        else:
+            print_comparison(options)
+    print(text.getvalue(), end="")
+    if options.write_docs:
+        write_docs("bench --flat" if options.flat else "bench", text.getvalue())
 
 
 main()

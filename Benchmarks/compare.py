@@ -235,25 +235,32 @@ def print_wanted(archives, medians, kinds):
 def describe_machine():
     with open("/proc/cpuinfo") as file:
         model = re.search(r"model name\s*: (.*)", file.read())
-    packages = ["liblz4-1", "lzma-dev", "squashfs-tools", "erofs-utils", "7zip", "tar"]
-    versions = run(["dpkg-query", "-W", "-f", "${Package} ${Version}, ", *packages]).strip(", ")
-    print(f"\n{model.group(1) if model else platform.machine()}, {os.cpu_count()} processors, Linux "
-          f"{platform.release()}; {versions}")
+    line = f"{model.group(1) if model else platform.machine()}, {os.cpu_count()} processors, Linux {platform.release()}"
+    if shutil.which("dpkg-query"):
+        packages = ["liblz4-1", "lzma-dev", "squashfs-tools", "erofs-utils", "7zip", "tar"]
+        line += "; " + run(["dpkg-query", "-W", "-f", "${Package} ${Version}, ", *packages]).strip(", ")
+    print(f"\n{line}")
+
+
+def file_system_of(folder):
+    return run(["stat", "-f", "-c", "%T", folder]).strip()
 
 
 def print_comparison(options):
     is_default = options.folder is None
     tree = make_tree(os.path.abspath(options.folder or DEFAULT_FOLDER), is_default, options.scratch)
     kinds = options.kinds.split(",") if options.kinds else list(KINDS)
-    peers = [peer for peer in PEERS if not options.kinds or any(line[0] in kinds and line[1] == peer for line in WANTED)]
+    peers = [peer for peer in PEERS
+             if not options.kinds or any(kind in kinds and peer == against for kind, against, *_ in WANTED)]
     archives = pack_all(options.build, tree, kinds, peers)
     rows = make_rows(options.build, kinds, peers)
     sizes = [os.path.getsize(os.path.join(parent, name)) for parent, _, names in os.walk(tree) for name in names]
     print(f"{len(sizes):,} files, {sum(sizes) / 1e6:.0f} MB; medians of {options.rounds} rounds")
     describe_machine()
-    for parent, title, is_memory in [(options.memory, "a memory file system", True), (options.disk, "the disk", False)]:
-        if not parent: # --disk ''
-            continue
+    places = [(options.memory, "a memory file system", True)]
+    if options.disk:
+        places.append((options.disk, f"the disk ({file_system_of(options.disk)})", False))
+    for parent, title, is_memory in places:
         medians, calls = measure_in(parent, options.build, archives, tree, rows, options.rounds, is_memory)
         print(f"\n### On {title}")
         print_costs(rows, archives, medians, calls)
