@@ -9,7 +9,7 @@ import sys
 import tempfile
 from collections import namedtuple
 
-from measuring import Row, count_calls, measure, median, run, table, verify
+from measuring import Row, count_calls, cpu, measure, median, run, table, verify
 
 MIB = 1 << 20
 DEFAULT_FOLDER = "/usr"
@@ -145,9 +145,10 @@ def make_rows(build, kinds, peers):
 # ---- measuring ----
 
 
-def place(archives, folder):
-    """The archives on the measured file system: links where that can be."""
-    for name in os.listdir(archives):
+def place(archives, rows, folder):
+    """The archives and their plans on the measured file system: links where that can be."""
+    names = {row.archive for row in rows.values()}
+    for name in names | {name + ".plan" for name in names if os.path.exists(f"{archives}/{name}.plan")}:
         try:
             os.link(f"{archives}/{name}", f"{folder}/{name}")
         except OSError:
@@ -155,11 +156,11 @@ def place(archives, folder):
 
 
 def measure_in(parent, build, archives, tree, rows, rounds, counts_calls):
-    """Medians of every row, and system calls where they are wanted; each tool's tree is compared with the source once."""
+    """Medians of every row, and system calls where they are wanted; before, each tree is compared with the source."""
     samples = {name: [] for name in rows}
     calls = {}
     with tempfile.TemporaryDirectory(prefix="varnex-bench-", dir=parent) as folder:
-        place(archives, folder)
+        place(archives, rows, folder)
         for name, row in rows.items():
             verify(row, folder, tree)
             if counts_calls:
@@ -181,10 +182,6 @@ def print_costs(rows, archives, medians, calls):
                   f"{cost.user:.3f}", f"{cost.system:.3f}", f"{cost.peak / 1024:.1f}"] +
                  ([f"{calls[name]:,}"] if calls else [])
                  for name, row in rows.items() for cost in [medians[name]]])
-
-
-def cpu(cost):
-    return cost.user + cost.system
 
 
 def print_ratios(medians, kinds, peers):

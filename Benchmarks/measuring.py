@@ -54,6 +54,10 @@ def median(samples):
     return Sample(*map(statistics.median, zip(*samples)))
 
 
+def cpu(cost):
+    return cost.user + cost.system
+
+
 def table(head, lines):
     print("\n| " + " | ".join(head) + " |")
     print("| --- |" + " ---: |" * (len(head) - 1))
