@@ -45,7 +45,11 @@ bool CreateDirectoryRecursive(string_ref path) {
     return CreateDirectory(path);
 }
 
-bool DeleteFileOrDirectory(string_ref path) { return GetFileSystem()->Delete(PathToAbsolutePath(path), true); }
+bool DeleteFileOrDirectory(string_ref path) {
+    const core::string absolute = PathToAbsolutePath(path);
+    // Cut, the path would name something else.
+    return absolute.size() <= kMaxPathLength && GetFileSystem()->Delete(absolute, true);
+}
 
 bool IsFileOrDirectoryInUse(string_ref path) { return FileSystemEntry(path).IsLocked(); }
 

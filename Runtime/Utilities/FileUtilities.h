@@ -33,7 +33,7 @@ bool CreateDirectory(core::basic_string_ref<char> path);
 // must be of a length that an entry can hold.
 bool CreateDirectoryRecursive(core::basic_string_ref<char> path);
 
-// A folder with all that it holds.
+// A folder with all that it holds. False for a path longer than an entry can hold, which would be cut.
 bool DeleteFileOrDirectory(core::basic_string_ref<char> path);
 
 // Whether somebody holds a lock on the file, or on one in the folder. The path is taken as given.

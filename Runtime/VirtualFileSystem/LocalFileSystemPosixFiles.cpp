@@ -120,7 +120,13 @@ static bool NamesChildOf(const char* folder, const char* path) {
 }
 
 bool LocalFileSystemPosix::Delete(FileEntryData& entry, bool recursive) {
-    if (!IsDir(entry) || IsSymLink(entry)) return RepeatOnInterrupt([&] { return unlink(entry.path); }) == 0;
+    if (!IsDir(entry)) return RepeatOnInterrupt([&] { return unlink(entry.path); }) == 0;
+    // With a slash at its end, the system takes a link to a folder for the folder.
+    size_t length = strlen(entry.path);
+    while (length > 1 && entry.path[length - 1] == '/')
+        --length;
+    const FileSystemEntry bare(core::string_ref(entry.path, length));
+    if (IsSymLink(bare)) return RepeatOnInterrupt([&] { return unlink(bare.path); }) == 0;
     if (recursive) {
         dynamic_block_array<FileEntryInfo, 32> children(kMemLabelFileList);
         (void)Enumerate(entry.path, &children, false, nullptr, kFileEnumerationAll); // rmdir tells what is left

@@ -12,8 +12,10 @@
 int main(int argumentCount, char** arguments) {
     // First of all, so that no file of ours becomes the standard output.
     ZarvoClassic::Footing_Process_OpenStandardDescriptors();
-    // Who stops listening to our messages does not stop the extraction.
+    // Who stops listening to our messages does not stop the extraction, and a file that grows past a limit is one that
+    // can't be written.
     signal(SIGPIPE, SIG_IGN);
+    signal(SIGXFSZ, SIG_IGN);
 
     if (argumentCount < 2) {
         puts("Usage: Varnex <zarvowebfile>");

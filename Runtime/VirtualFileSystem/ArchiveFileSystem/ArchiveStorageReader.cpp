@@ -223,9 +223,7 @@ int ArchiveStorageReader::ReadCompressedBlocksInfo(FileAccessor& file, Compressi
 
 bool ArchiveStorageReader::MakeStorageUsed(bool reportErrors) {
     Mutex::AutoLock lock(m_StorageLock);
-    const bool isFirstUse = m_StorageUseCount++ == 0;
-    if (isFirstUse) m_FilePosition = kUnknownPosition;
-    if (isFirstUse && !m_File.Open(m_FileEntry, kFilePermissionRead)) {
+    if (m_StorageUseCount++ == 0 && !m_File.Open(m_FileEntry, kFilePermissionRead)) {
         if (reportErrors) ReportError(Format("Unable to open archive file: %s", m_FileEntry.Path()).c_str());
         return false;
     }

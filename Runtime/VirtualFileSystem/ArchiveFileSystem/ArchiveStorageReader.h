@@ -123,7 +123,8 @@ private:
     // that is read ahead. Positions are relative to m_DataOffset.
     class BatchingFileReader {
     public:
-        BatchingFileReader(ArchiveStorageReader* reader, UInt64 batchSize, UInt64 startPos, UInt64 endPos);
+        BatchingFileReader(ArchiveStorageReader* reader, UInt64 batchSize, UInt64 startPos, UInt64 endPos,
+                           UInt64 wantedEnd);
         bool Read(void* destination, UInt64 position, UInt64 size, UInt64* delivered);
 
     private:
@@ -131,6 +132,7 @@ private:
         UInt64 m_BatchSize; // 0: no window
         UInt64 m_StartPos;  // the call may read [m_StartPos, m_EndPos)
         UInt64 m_EndPos;
+        UInt64 m_WantedEnd; // no more is read ahead, unless more is asked for
         UInt64 m_LoadedWindowStart = 0;
         UInt64 m_LoadedWindowEnd = 0;
         dynamic_array<UInt8> m_Buffer;
@@ -142,7 +144,6 @@ private:
     static constexpr UInt32 kLzmaPropertiesSize = 5;
     static constexpr UInt32 kLzmaSizeFieldSize = 8; // behind the properties, in ZarvoWeb archives
     static constexpr UInt64 kNotBroken = ~UInt64{0};
-    static constexpr UInt64 kUnknownPosition = ~UInt64{0};
 
     // Set-up, in ArchiveStorageReader.cpp. Runs while no other thread uses the reader, so it takes no lock.
     int ReadHeader(UInt64 offset) VARNEX_NO_THREAD_SAFETY_ANALYSIS;
@@ -181,7 +182,6 @@ private:
     CacheResult CopyFromCachedBlock(CachedBlock* record, UInt64 offsetInBlock, UInt64 size, void* destination,
                                     UInt64* delivered, BatchingFileReader* batch);
     bool ReadFromStorage(UInt64 position, UInt64 size, void* destination, UInt64* delivered);
-    bool ReadFile(UInt64 position, UInt64 size, void* destination, UInt64* delivered) VARNEX_REQUIRES(m_StorageLock);
     bool IsBehindStorageEnd(UInt64 position);
 
     ArchiveStorageHeader::Header m_Header;
@@ -198,7 +198,6 @@ private:
     std::atomic<bool> m_DirectoryReady{false};
     FileSystemEntry m_FileEntry VARNEX_GUARDED_BY(m_StorageLock); // queries of it leave a code in it
     FileAccessor m_File VARNEX_GUARDED_BY(m_StorageLock);
-    UInt64 m_FilePosition VARNEX_GUARDED_BY(m_StorageLock) = kUnknownPosition; // of m_File, where a read has left it
     bool m_ReleaseStorageWhenUnused = true;
     UInt64 m_DataOffset = 0; // in the file, of the first stored byte of block 0
     SInt32 m_StorageUseCount VARNEX_GUARDED_BY(m_StorageLock) = 0;

@@ -196,9 +196,12 @@ void ArchiveStorageReader::DeinitCachedBlock(CachedBlock* block) {
         decompressor->DecompressStreamDeinit(block->streamState);
 }
 
-// Frees every record that nobody uses; none is in use when the rules of MakeStorageUnused are kept.
+// Frees every record that nobody uses; none is in use when the rules of MakeStorageUnused are kept. What is known to be
+// damaged is forgotten, too: the file may be whole when it is opened again.
 void ArchiveStorageReader::EmptyCache() {
     Mutex::AutoLock lock(m_CacheLock);
+    m_HasBrokenBlocks = false;
+    m_BrokenFrom.clear();
     size_t kept = 0;
     for (CachedBlock* block : m_CachedBlocks) {
         const bool isClaimed = TryToClaim(block->beingWritten);
@@ -214,7 +217,7 @@ void ArchiveStorageReader::EmptyCache() {
 }
 
 // Remembers that a block's data can't be decoded from some place on. Only what would fail in the same way, and as
-// silently, every time is noted.
+// silently, every time is noted; but a decoder does not tell refused memory from damage. Kept until the file is closed.
 void ArchiveStorageReader::NoteBrokenBlock(UInt32 blockIndex, UInt64 brokenFrom) {
     Mutex::AutoLock lock(m_CacheLock);
     if (m_BrokenFrom.empty()) {
@@ -228,7 +231,7 @@ void ArchiveStorageReader::NoteBrokenBlock(UInt32 blockIndex, UInt64 brokenFrom)
 UInt64 ArchiveStorageReader::GetBrokenFrom(UInt32 blockIndex) {
     if (!m_HasBrokenBlocks) return kNotBroken;
     Mutex::AutoLock lock(m_CacheLock);
-    return m_BrokenFrom[blockIndex];
+    return m_BrokenFrom.empty() ? kNotBroken : m_BrokenFrom[blockIndex];
 }
 
 // Produces the next window of a streamed block: up to maxSize bytes that follow the window before.

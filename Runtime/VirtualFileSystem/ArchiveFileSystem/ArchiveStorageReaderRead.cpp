@@ -31,12 +31,14 @@ bool ArchiveStorageReader::Read(VFS::FileSize fromPosition, UInt64 size, void* b
     UInt32 end;
     if (size > m_UncompressedBlocksOffsets.back() - from || !FindBlock(from + (size - 1), &end)) return false;
 
-    // The last block is read whole, or, stored as is, no further than the range goes.
-    UInt64 storedEnd = m_CompressedBlocksOffsets[end + 1];
+    const UInt64 storedEnd = m_CompressedBlocksOffsets[end + 1];
+    // Of a last block that is stored as is, no more is wanted than the range holds.
+    UInt64 wantedEnd = storedEnd;
     if (GetBlockType(end) == kCompressionNone)
-        storedEnd =
+        wantedEnd =
             std::min(storedEnd, m_CompressedBlocksOffsets[end] + (from + size - m_UncompressedBlocksOffsets[end]));
-    BatchingFileReader batch(this, start != end ? kBatchSize : 0, m_CompressedBlocksOffsets[start], storedEnd);
+    BatchingFileReader batch(this, start != end ? kBatchSize : 0, m_CompressedBlocksOffsets[start], storedEnd,
+                             wantedEnd);
     UInt8* const destination = static_cast<UInt8*>(buffer);
     UInt64 delivered = 0;
     for (UInt32 index = start; index <= end; ++index) {
@@ -153,7 +155,7 @@ bool ArchiveStorageReader::ReadFromStorage(UInt64 position, UInt64 size, void* d
     if (m_HideLzmaSizeField) {
         if (position < kLzmaPropertiesSize && size != 0) {
             const UInt64 wanted = std::min<UInt64>(kLzmaPropertiesSize - position, size);
-            if (!ReadFile(filePosition, wanted, to, &firstPart)) return false;
+            if (!m_File.Read(VFS::FileSize(filePosition), wanted, to, &firstPart)) return false;
             to += firstPart;
             size -= firstPart;
             filePosition += firstPart;
@@ -166,17 +168,8 @@ bool ArchiveStorageReader::ReadFromStorage(UInt64 position, UInt64 size, void* d
         filePosition += kLzmaSizeFieldSize;
     }
     UInt64 got = 0;
-    const bool isRead = ReadFile(filePosition, size, to, &got);
+    const bool isRead = m_File.Read(VFS::FileSize(filePosition), size, to, &got);
     if (isRead) *delivered = firstPart + got;
-    return isRead;
-}
-
-// Reads at a position, to which the file is moved only when it is elsewhere.
-bool ArchiveStorageReader::ReadFile(UInt64 position, UInt64 size, void* destination, UInt64* delivered) {
-    const bool isThere = position == m_FilePosition;
-    const bool isRead = isThere ? m_File.Read(size, destination, delivered)
-                                : m_File.Read(VFS::FileSize(position), size, destination, delivered);
-    m_FilePosition = isRead ? position + *delivered : kUnknownPosition;
     return isRead;
 }
 
@@ -184,13 +177,17 @@ bool ArchiveStorageReader::ReadFile(UInt64 position, UInt64 size, void* destinat
 bool ArchiveStorageReader::IsBehindStorageEnd(UInt64 position) {
     if (m_HideLzmaSizeField && position >= kLzmaPropertiesSize) position += kLzmaSizeFieldSize;
     Mutex::AutoLock lock(m_StorageLock);
-    m_FilePosition = kUnknownPosition;
     return m_File.Seek(0, kFileOriginEnd) && m_File.Position() <= VFS::FileSize(m_DataOffset + position);
 }
 
 ArchiveStorageReader::BatchingFileReader::BatchingFileReader(ArchiveStorageReader* reader, UInt64 batchSize,
-                                                             UInt64 startPos, UInt64 endPos)
-    : m_Reader(reader), m_BatchSize(batchSize), m_StartPos(startPos), m_EndPos(endPos), m_Buffer(kMemLabelReadBatch) {}
+                                                             UInt64 startPos, UInt64 endPos, UInt64 wantedEnd)
+    : m_Reader(reader),
+      m_BatchSize(batchSize),
+      m_StartPos(startPos),
+      m_EndPos(endPos),
+      m_WantedEnd(wantedEnd),
+      m_Buffer(kMemLabelReadBatch) {}
 
 bool ArchiveStorageReader::BatchingFileReader::Read(void* destination, UInt64 position, UInt64 size,
                                                     UInt64* delivered) {
@@ -198,7 +195,7 @@ bool ArchiveStorageReader::BatchingFileReader::Read(void* destination, UInt64 po
     Check(position <= m_EndPos && size <= m_EndPos - position,
           "Assertion failed on expression: 'position + size <= m_EndPos'");
     // What nothing would be read ahead of needs no window.
-    const bool isRest = position >= m_LoadedWindowEnd && size == m_EndPos - position;
+    const bool isRest = size != 0 && position >= m_LoadedWindowEnd && size == m_WantedEnd - position;
     if (m_BatchSize <= size || m_LoadedWindowStart > position || isRest)
         return m_Reader->ReadFromStorage(position, size, destination, delivered);
 
@@ -206,7 +203,8 @@ bool ArchiveStorageReader::BatchingFileReader::Read(void* destination, UInt64 po
     UInt64 remaining = size;
     while (remaining != 0) {
         if (current >= m_LoadedWindowEnd) {
-            const UInt64 length = std::min(m_BatchSize, m_EndPos - current);
+            const UInt64 end = current < m_WantedEnd ? m_WantedEnd : m_EndPos;
+            const UInt64 length = std::min(m_BatchSize, end - current);
             if (!m_Buffer.resize_uninitialized(static_cast<size_t>(length), kResizeExact)) return false;
             UInt64 got = 0;
             if (!m_Reader->ReadFromStorage(current, length, m_Buffer.data(), &got)) return false;

@@ -1,5 +1,5 @@
 // Reads an open file through a buffer, so that a parser that asks for a few bytes at a time and steps back and forth
-// costs one call of the file for many fields. It answers what the file itself would.
+// costs one call of the file for many fields. It answers what a file on disk would.
 //
 //   ReadAheadFile ahead(&file);   // file stays open, and untouched by others, for as long as this is used
 //   file.Seek(...);               // afterwards, since its position is anywhere then

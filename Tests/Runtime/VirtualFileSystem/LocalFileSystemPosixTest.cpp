@@ -113,7 +113,7 @@ TEST_F(LocalFileSystemPosixTest, DeletingTakesATreeButNothingOutsideIt) {
     Run("mkdir -p kept tree/.sub/$(printf '\\377') odd; touch kept/file 'odd/..\\kept' tree/.sub/$(printf %0255d 0)");
     Run("ln -s kept link; ln -s ../kept tree/link; ln -s . tree/loop; ln -s nowhere tree/dangling");
     EXPECT_FALSE(DeleteTree("tree", false) || DeleteTree("odd"));
-    EXPECT_TRUE(DeleteTree("tree") && DeleteTree("link") && Mode("tree") + Mode("link") == -2);
+    EXPECT_TRUE(DeleteTree("tree") && DeleteTree("link/") && Mode("tree") + Mode("link") == -2);
     Run("test -e kept/file; mkdir -p theirs/sub; touch theirs/file theirs/sub/file; chmod 777 theirs");
     EXPECT_TRUE(IsTrueForAnybody([&] { return !DeleteTree("theirs") && Mode("theirs/file") == -1; }));
     // Folders whose paths leave room for 8 characters, for the separator alone, and for nothing.

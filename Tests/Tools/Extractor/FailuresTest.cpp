@@ -41,6 +41,7 @@ TEST(Failures, HeadersAreRefusedAndDamageSpoilsTheReadsThatNeedIt) {
         for (std::string words; std::getline(stream, words, ';');)
             Expect({words + " a:c100000", messages, output});
     }
+    Expect({"chunk=1000 block[0].compressedSize=10 a:z1005 b:z1995"}); // the blocks behind it lie elsewhere
     for (const char* signature : {"ZarvoF", "ZarvoFSx", "zarvofs", "", "z64", "z100000"})
         Expect({"a:text", kNoHeader, "none", {.signature = Bytes(signature)}});
 }
