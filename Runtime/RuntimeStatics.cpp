@@ -6,7 +6,6 @@
 // registration, which nobody names, is there wherever it can be run.
 #include "Runtime/RuntimeStatics.h"
 
-#include "Footing/Thread.h"
 #include "Footing/Timer.h"
 #include "PlatformDependent/Linux/ClockGettimeNsecNp.h"
 #include "Runtime/Math/Random/Rand.h"

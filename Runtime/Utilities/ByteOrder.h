@@ -1,8 +1,6 @@
 // Integers in big-endian order, as archives store them.
 #pragma once
 
-#include "Runtime/Core/Types.h"
-
 #include <bit>
 #include <type_traits>
 

@@ -1,8 +1,7 @@
 #include "Runtime/Core/Containers/DynamicArray.h"
 
-#include "Runtime/Utilities/Format.h"
-
 #include <algorithm>
+#include <cstdio>
 
 namespace dynamic_array_detail {
 
@@ -26,8 +25,11 @@ void* dynamic_array_data::reserve(size_t capacity, size_t elementSize, size_t al
         if (const size_t kept = std::min(size, capacity); buffer != nullptr && kept != 0)
             memcpy(buffer, data, kept * elementSize);
     } else {
-        if (static_cast<SInt64>(capacity) < 0)
-            ReportFailedCheck(Format("Dynamic array capacity overflow: 0x%llx", UInt64{capacity}).c_str());
+        if (static_cast<SInt64>(capacity) < 0) {
+            char message[64];
+            snprintf(message, sizeof(message), "Dynamic array capacity overflow: 0x%llx", UInt64{capacity});
+            ReportFailedCheck(message);
+        }
         buffer = realloc_internal(data, byteCount, alignment, label, kAllocateOptionNone, __FILE__, __LINE__);
     }
     // Refused: the old buffer is still there, and stays.
