@@ -6,7 +6,6 @@
 
 using namespace ZarvoClassic;
 using ReadWriteLockWord::Transition;
-using ReadWriteLockWord::Verdict;
 
 namespace {
 
