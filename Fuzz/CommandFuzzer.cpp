@@ -1,5 +1,4 @@
 // Property: whatever the bytes are, the command makes one folder, beside the archive, and touches nothing else.
-#include "Footing/Process.h"
 #include "Fuzz/FuzzSupport.h"
 #include "Runtime/Utilities/RegisterRuntimeInitializeAndCleanup.h"
 #include "Tools/Extractor/Extractor.h"

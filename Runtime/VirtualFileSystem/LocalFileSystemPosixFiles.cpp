@@ -1,5 +1,4 @@
 // The POSIX back end's operations on whole files and folders: attributes, deletion, locks, moves, copies.
-#include "PlatformDependent/Linux/FileDescriptor.h"
 #include "Runtime/Core/Containers/DynamicArray.h"
 #include "Runtime/Utilities/FileUtilities.h"
 #include "Runtime/VirtualFileSystem/LocalFileSystemPosix.h"

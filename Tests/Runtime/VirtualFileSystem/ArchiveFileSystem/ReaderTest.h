@@ -2,7 +2,6 @@
 #pragma once
 
 #include "Runtime/VirtualFileSystem/ArchiveFileSystem/ArchiveStorageReader.h"
-#include "Tests/Support/ConsoleCapture.h"
 #include "Tests/Support/FaultyFileSystem.h"
 #include "Tests/Support/TemporaryFolder.h"
 #include "Tools/ArchiveWriter/ArchiveWriter.h"
