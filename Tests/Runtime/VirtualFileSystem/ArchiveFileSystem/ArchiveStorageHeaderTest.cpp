@@ -1,4 +1,5 @@
 #include "Tests/Runtime/VirtualFileSystem/ArchiveFileSystem/ReaderTest.h"
+#include "Tests/Support/ConsoleCapture.h"
 
 TEST(ArchiveLayouts, EndUpInTheSameRecordsUnlessTheyAreCutOrHostile) {
     using enum ArchiveLayout;

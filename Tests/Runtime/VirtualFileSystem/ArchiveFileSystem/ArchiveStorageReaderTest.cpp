@@ -1,4 +1,5 @@
 #include "Tests/Runtime/VirtualFileSystem/ArchiveFileSystem/ReaderTest.h"
+#include "Tests/Support/ConsoleCapture.h"
 
 // Files that lie apart in one stream cost one decoding of it, and files behind its damage, or behind the end of a file
 // that was cut, none at all.
