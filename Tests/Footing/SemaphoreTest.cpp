@@ -13,14 +13,15 @@ TEST(Semaphore, WakesNobodyForAnInterruptionAndAsksTheSystemOnlyForThreadsThatWa
     Footing_Semaphore_CreateInplace(&gSemaphore);
     struct sigaction action = {}; // without SA_RESTART: a signal interrupts the wait
     action.sa_handler = [](int) {
-        if (++gInterruptions == 3) Footing_Semaphore_Release(&gSemaphore, 3);
+        if (++gInterruptions == 3) Footing_Semaphore_Release(&gSemaphore, 2);
     };
     sigaction(SIGALRM, &action, nullptr);
     const itimerval everyMillisecond = {{0, 1'000}, {0, 1'000}}, never = {};
     setitimer(ITIMER_REAL, &everyMillisecond, nullptr);
     Footing_Semaphore_Acquire(&gSemaphore);
     setitimer(ITIMER_REAL, &never, nullptr);
+    ASSERT_GE(gInterruptions, 3);
     Footing_Semaphore_Acquire(&gSemaphore); // asks the system for nothing
-    EXPECT_TRUE(gInterruptions >= 3 && gSemaphore.count == 1 && gSemaphore.storage.count == 0);
+    EXPECT_TRUE(gSemaphore.count == 0 && gSemaphore.storage.count == 0);
     Footing_Semaphore_FreeInplace(&gSemaphore);
 }

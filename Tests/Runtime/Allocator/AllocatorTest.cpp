@@ -12,13 +12,13 @@ extern "C" const char* __tsan_default_options() { return "allocator_may_return_n
 using Huge = std::array<char, size_t{1} << 60>; // which New clears, wherever it is
 
 TEST(Allocator, ReallocationMovesAlignsAndKeepsWhatFitsAndARefusedOneTheOldBlock) {
-    for (const size_t align : {1, 64, 4096}) {
+    for (const size_t align : {1u, 64u, 4096u}) {
         const auto reallocate = [&](void* pointer, size_t size) {
             return realloc_internal(pointer, size, align, kMemLabelGeneral, kAllocateOptionNone, "", 0);
         };
         void* block = memcpy(reallocate(nullptr, 5), "text", 5);
         EXPECT_EQ(nullptr, reallocate(block, sizeof(Huge)));
-        for (const size_t size : {5000, 3}) {
+        for (const size_t size : {5000u, 3u}) {
             const size_t old = reinterpret_cast<size_t>(block);
             block = reallocate(block, size);
             const size_t now = reinterpret_cast<size_t>(block);

@@ -21,22 +21,22 @@ TEST(LogAssert, ModeChoosesTypeConsoleFunctionStackTraceAndPosition) {
     Mutex::AutoLock lock(g_LogHandlerListMutex);
     gCleanLogEntryHandlers = nodes, gCurrentLogEntryHandler = Tell<'p'>; // which takes what would be printed
     gPreprocessor = [](const auto&, auto* shortTrace, auto* trace, auto* file, auto* line) {
-        *shortTrace = "short", *trace = "made", *file = "moved", *line += 1;
+        *shortTrace = "short", *trace = "new", *file = "moved", *line += 1;
     };
     using Row = std::tuple<UInt32, const char*, StackTraceLogType, const char*, const char*, const char*>;
     for (const auto& [mode, types, table, trace, file, printed] :
-         {Row(0x0, "30", none, "", "", ""), Row(0x4, "33", none, "", "", ""), Row(0x82, "12", some, "", "", "made\n\n"),
+         {Row(0x0, "30", none, "", "", ""), Row(0x4, "33", none, "", "", ""), Row(0x82, "12", some, "", "", "new\n\n"),
           Row(0x1000, "20", none, "", "", ""), Row(0x20001, "40", none, "", "", ""), Row(0x3, "01", none, "", "", ""),
           Row(0x284, "23", none, "", "", ""), Row(0xC00001, "00", some, "", "f", ""),
-          Row(0x200000, "11", some, "", "", "made\n\n"),
-          Row(0x800001, "00", some, "", "f", "made\n\n(Filename: moved Line: 13)\n\n"),
-          Row(0x400001, "00", some, "\nframe\n", "f", "frame\n\n"), Row(0x440001, "00", some, "frame", "f", ""),
-          Row(0x400101, "00", none, "frame", "f", ""), Row(0x40001, "00", native, "frame", "f", ""),
+          Row(0x200000, "11", some, "", "", "new\n\n"), Row(0x40001, "00", native, "at", "f", ""),
+          Row(0x800001, "00", some, "", "f", "new\n\n(Filename: moved Line: 13)\n\n"),
+          Row(0x400001, "00", some, "\nat\n", "f", "at\n\n"), Row(0x440001, "00", some, "at", "f", ""),
           Row(0x800001, "00", native, "", "f", "Stacktrace is not supported on this platform.\n\n"),
-          Row(0xC00001, "00", some, "frame", "f", "frame\n\n(Filename: f Line: 12)\n\n"),
-          Row(0xC00001, "00", some, "frame", "a/Debug.bindings.cs", "frame\n\n")}) {
+          Row(0xC00001, "00", some, "at", "f", "at\n\n(Filename: f Line: 12)\n\n"),
+          Row(0x40101, "00", none, "at", "f", "at\n\n"), Row(0xC00001, "00", some, "at", "Debug.bindings", "at\n\n")}) {
         std::fill_n(gStackTraceLogType, kLogTypeCount, table);
-        gTold.clear(), DebugStringToFile({"text", "", "", trace, file, 12, -1, mode});
+        const auto stage = (mode & 0x40000) != 0 ? DebugStringToFilePostprocessedStacktrace : DebugStringToFile;
+        gTold.clear(), stage({"text", "", "", trace, file, 12, -1, mode});
         const char* const clean = *types == '1' ? "Assertion failed: text\nshort" : "text";
         EXPECT_EQ(gTold, Format("c%c[%s\n\n]p%c[text\n%s]", types[0], clean, types[1], printed).c_str()) << mode;
     }

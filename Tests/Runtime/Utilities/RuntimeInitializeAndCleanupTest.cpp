@@ -25,11 +25,11 @@ TEST(RuntimeRegistry, RunsByOrderThenAddressAndCleansUpInReverse) {
         all[i].emplace(i == 3 ? nullptr : Init, i == 4 ? nullptr : Cleanup, orders[i], names[i]);
     EXPECT_EQ(callsOf(Registration::ExecuteCleanup), ""); // nothing has been started
     EXPECT_EQ(callsOf(Registration::ExecuteInitializations), "+c+a+b+e");
-    EXPECT_TRUE(gScriptingRand != nullptr && *gScriptingRand != Rand()); // registered though no program names it
-    all[2].reset(), all[2].emplace(Init, Cleanup, 0, names[2]);          // from the middle of the list to its end
+    EXPECT_TRUE(gScriptingRand != nullptr && *gScriptingRand != Rand());        // registered though no program names it
+    all[2].reset(), all[1].reset(), all[2].emplace(Init, Cleanup, 0, names[2]); // from the middle of the list
     EXPECT_EQ(callsOf(Registration::ExecuteInitializations), "+c");
-    EXPECT_EQ(callsOf(Registration::ExecuteCleanup), "-d-b-a-c");
+    EXPECT_EQ(callsOf(Registration::ExecuteCleanup), "-d-a-c");
     all[2].reset(), all[0].reset(); // the newest, the oldest
-    EXPECT_EQ(callsOf(Registration::ExecuteInitializations), "+b+e");
+    EXPECT_EQ(callsOf(Registration::ExecuteInitializations), "+e");
     EXPECT_EQ(kSeenThread, PlatformThread::GetCurrentThreadID());
 }

@@ -10,7 +10,7 @@ TEST(SpookyHash, KnownAnswersHold) {
     using Row = std::tuple<size_t, UInt64, UInt64>;
     for (const auto& [length, first, second] :
          {Row(0, 0x232706fc6bf50919, 0x8b72ee65b4e851c7), Row(15, 0xd9aa86de65dc278b, 0xda240564552a4a10),
-          Row(33, 0x3e958dcbef6dd224, 0x6482a6da6de7dc07), Row(191, 0x71043a03b5bb462f, 0xfe7d0ad0a893b638),
+          Row(16, 0x340225d6331f2651, 0x886e7c23939a583d), Row(191, 0x71043a03b5bb462f, 0xfe7d0ad0a893b638),
           Row(192, 0x02d13f94b2a31a54, 0x0ea393db758d85d3), Row(1000, 0xe0fbb54472b2d8be, 0xfc0f2e867e61f867)}) {
         UInt64 hash[2] = {};
         SpookyHash::Hash128(bytes + 1, length, &hash[0], &hash[1]);

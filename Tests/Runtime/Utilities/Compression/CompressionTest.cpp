@@ -9,9 +9,9 @@
 using namespace std::string_literals;
 static const IDecompressor* const kLz4 = CreateDecompressor(kCompressionLz4HC, kMemLabelGeneral);
 static const IDecompressor* const kLzma = CreateDecompressor(kCompressionLzma, kMemLabelGeneral);
-static const std::string kPlain = "zarvo zarvo zarvo zarvo\n", kLz4Block = "\x69zarvo \6\0Parvo\n"s;
-static const std::string kUnmarked = "\x5d\0\x10\0\0\0\x3d\x18\x4a\xac\x4a\x1d\x09\x1a\x65\xdc\xc3\0\0"s;
-static const std::string kMarked = kUnmarked.substr(0, 15) + "\xe3\x3d\x7a\xff\xff\xfc\xf4\x50\0"s;
+static const std::string kPlain = "zarvo zarvo zarvo zarvo\n", kBlock = "\x69zarvo \6\0Parvo\n"s;
+static const std::string kBare = "\x5d\0\x10\0\0\0\x3d\x18\x4a\xac\x4a\x1d\x09\x1a\x65\xdc\xc3\0\0"s;
+static const std::string kEnded = kBare.substr(0, 15) + "\xe3\x3d\x7a\xff\xff\xfc\xf4\x50\0"s;
 
 // One call, of a stream or for a whole buffer: how much was consumed, and the output; nothing when it is refused. The
 // memory is of exactly the sizes given, for the sanitizer to watch; input that there is none of has no address.
@@ -28,28 +28,28 @@ static Result Decode(const IDecompressor* decoder, void* state, const std::strin
 TEST(Decompressor, OneCallDecodesWhatFitsOrRefuses) {
     using Row = std::tuple<const IDecompressor*, bool, std::string, size_t, size_t, size_t>;
     for (const auto& [decoder, isStream, source, room, consumed, produced] : // consumed: 0 when refused
-         {Row(kLz4, false, kLz4Block, 99, 15, 24), Row(kLz4, false, kLz4Block, 23, 0, 0),
-          Row(kLz4, false, kLz4Block + kLz4Block, 99, 0, 0), Row(kLz4, true, kLz4Block, 24, 0, 0),
-          Row(kLzma, false, kUnmarked + "more", 24, 19, 24), Row(kLzma, true, kUnmarked, 25, 19, 24),
-          Row(kLzma, false, kUnmarked, 25, 0, 0), Row(kLzma, false, kUnmarked, 10, 18, 10),
-          Row(kLzma, false, kMarked + "more", 99, 24, 24), Row(kLzma, true, kMarked + "more", 99, 24, 24),
-          Row(kLzma, true, kMarked.substr(0, 4), 9, 0, 0), Row(kLzma, true, "\xE1" + kMarked, 24, 0, 0)}) {
+         {Row(kLz4, false, kBlock, 99, 15, 24), Row(kLz4, false, kBlock, 23, 0, 0),
+          Row(kLz4, false, kBlock + kBlock, 99, 0, 0), Row(kLz4, true, kBlock, 24, 0, 0),
+          Row(kLz4, false, "\0"s, 9, 0, 0), Row(kLzma, false, kBare + "!", 24, 19, 24),
+          Row(kLzma, true, kBare, 25, 19, 24), Row(kLzma, false, kBare, 25, 0, 0), Row(kLzma, false, kBare, 10, 18, 10),
+          Row(kLzma, false, kEnded + "!", 99, 24, 24), Row(kLzma, true, kEnded + "!", 99, 24, 24),
+          Row(kLzma, true, kEnded.substr(0, 4), 9, 0, 0), Row(kLzma, true, "\xE1" + kEnded, 24, 0, 0)}) {
         void* state = nullptr;
         ASSERT_TRUE(!isStream || kLzma->DecompressStreamInit(&state));
         const Result expected = consumed == 0 ? Result() : Result({consumed, kPlain.substr(0, produced)});
         EXPECT_EQ(Decode(decoder, state, source, room, false), expected) << source.size() << " into " << room;
         kLzma->DecompressStreamDeinit(state);
     }
-    for (size_t length = 0; length < kMarked.size(); ++length)
-        EXPECT_FALSE(Decode(kLzma, nullptr, kMarked.substr(0, length), 99, false)) << length;
-    for (size_t length = 0; length < kLz4Block.size(); ++length)
-        EXPECT_NE(Decode(kLz4, nullptr, kLz4Block.substr(0, length), 24, false), Result({length, kPlain})) << length;
+    for (size_t length = 0; length < kEnded.size(); ++length)
+        EXPECT_FALSE(Decode(kLzma, nullptr, kEnded.substr(0, length), 99, false)) << length;
+    for (size_t length = 0; length < kBlock.size(); ++length)
+        EXPECT_NE(Decode(kLz4, nullptr, kBlock.substr(0, length), 24, false), Result({length, kPlain})) << length;
     ReportRecorder reports;
     EXPECT_TRUE(kLz4->GetType() == kCompressionLz4 && kLzma->GetType() == kCompressionLzma);
     for (const CompressionType type : {kCompressionNone, kCompressionCount}) // the second is reported
         EXPECT_EQ(CreateDecompressor(type, kMemLabelGeneral), nullptr);
     size_t tooMuch = 0x7FFFFFFF, made = 24;
-    EXPECT_FALSE(kLz4->DecompressMemory(kLz4Block.data(), &tooMuch, nullptr, &made)); // reported
+    EXPECT_FALSE(kLz4->DecompressMemory(kBlock.data(), &tooMuch, nullptr, &made)); // reported
     EXPECT_EQ(reports.Take().size(), 2u);
 }
 
