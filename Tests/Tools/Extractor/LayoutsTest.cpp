@@ -1,5 +1,4 @@
 // Archives that are whole, in every form that there is: everything comes out.
-#include "Tests/Support/BigEndianBytes.h"
 #include "Tests/Tools/Extractor/ExtractorTest.h"
 
 static const std::string kFiles = " one.assets:1 folder/large:c200000 folder/empty: a/b/c:r65536 ";
@@ -62,23 +61,4 @@ TEST(Layouts, WebDirectoryIsFoundInWholePiecesOnly) {
             words += " " + std::string(91 + (size - 4) % 100, 'q') + ":z" + std::to_string(rest);
             Expect({words, (size + rest) / 65'536 >= (size + 65'535) / 65'536 ? "ok" : "nodirectory"});
         }
-}
-
-TEST(Layouts, WorkedExamplesByteByByte) {
-    const auto header = [](UInt64 size, UInt32 flags) {
-        BigEndianBytes bytes;
-        bytes.String("ZarvoFS").U32(7).String("5.x.x").String("7041.3.0b12").U64(size).U32(56).U32(56).U32(flags);
-        return bytes.Fill(14).Get();
-    };
-    BigEndianBytes section, raw;
-    section.Fill(16).U32(1).U32(4).U32(4).U16(0).U32(1).U64(0).U64(4).U32(0).String("a");
-    raw.String("ZarvoRaw").U32(3).String("5.x.x").String("7041.3.0b12").U32(0x55AA55AA).U32(63).U32(1).U32(1);
-    raw.U32(18).U32(18).U32(81).U32(0x55AA55AA).U32(1).String("a").U32(14).U32(4);
-    const std::pair<std::string, std::string> rows[] = {
-        {"raw", raw.Get() + "text"},
-        {"fs", header(124, 0x40) + section.Get() + "text"},
-        {"padded", header(132, 0x240) + section.Get() + std::string(8, '\0') + "text"},
-        {"end padded", header(124, 0x2C0) + "text" + section.Get()}}; // padding is of no effect at the end
-    for (const auto& [words, expected] : rows)
-        Expect({.archive = words + " a:text", .change = [&](std::string& bytes) { EXPECT_EQ(expected, bytes); }});
 }
