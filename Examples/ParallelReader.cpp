@@ -61,6 +61,7 @@ int main(int argumentCount, char** arguments) {
     std::atomic<UInt64> bytesRead{0};
     const auto start = std::chrono::steady_clock::now();
     std::vector<std::thread> threads;
+    threads.reserve(static_cast<size_t>(threadCount));
     for (int index = 0; index < threadCount; ++index)
         threads.emplace_back([&] { HashFiles(reader, next, hashes, bytesRead); });
     for (std::thread& thread : threads)
