@@ -69,7 +69,7 @@ TEST(Command, SaysWhatStandsInItsWay) {
     fs::create_directory(output);
     fs::create_symlink("/dev/full", output + "/a");
     Expect({kThree, "write:a", "a:/dev/full folder| b/c:text", {}, folder.Path()});
-    for (const rlim_t largest : {100'000, 149'999}) {
+    for (const rlim_t largest : {rlim_t{100'000}, rlim_t{149'999}}) {
         Case run{kThree, "write:a", "a:r" + std::to_string(largest) + " folder| b/c:text"};
         run.prepare = [largest] {
             const rlimit limits = {largest, largest};

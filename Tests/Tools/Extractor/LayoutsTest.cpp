@@ -53,8 +53,8 @@ TEST(Layouts, OddArchivesThatAreWhole) {
 
 // Every read that looks for the directory asks for 65,536 bytes, and a stream that can't give as many is refused.
 TEST(Layouts, WebDirectoryIsFoundInWholePiecesOnly) {
-    for (const size_t size : {1'000, 65'536, 65'537, 131'072, 131'076})
-        for (const size_t rest : {1, 64'535, 64'536, 64'537, 65'534, 65'535, 65'536}) {
+    for (const size_t size : {1'000u, 65'536u, 65'537u, 131'072u, 131'076u})
+        for (const size_t rest : {1u, 64'535u, 64'536u, 64'537u, 65'534u, 65'535u, 65'536u}) {
             std::string words = "web"; // an entry takes its path and 9 bytes; the last one has the rest of the stream
             for (size_t left = size - 4; left >= 200; left -= 100)
                 words += " " + std::string(91, 'p') + ":";

@@ -33,7 +33,7 @@ static std::string MakePath(size_t length) {
 }
 
 TEST(NodePath, MayMakeTheWholePathAsLongAsAnEntryHolds) {
-    for (const size_t length : {1'038, 1'039, 1'040, 5'000}) {
+    for (const size_t length : {1'038u, 1'039u, 1'040u, 5'000u}) {
         const TemporaryFolder folder, other; // of one length
         const std::string path = MakePath(length - (folder / "a.zarvo_data/").size());
         const bool isMade = length <= 1'039;
@@ -47,7 +47,7 @@ TEST(NodePath, MayMakeTheWholePathAsLongAsAnEntryHolds) {
 
 // The output folder's path is 5 characters longer, and that of an entry 5 more.
 TEST(ArchivePath, IsNeverCut) {
-    for (const size_t length : {1'034, 1'035, 1'039, 1'040, 3'000}) {
+    for (const size_t length : {1'034u, 1'035u, 1'039u, 1'040u, 3'000u}) {
         std::string path = length % 2 == 0 ? ".//a.zarvo" : "./a.zarvo";
         while (path.size() < length)
             path.insert(0, "./");
