@@ -29,7 +29,7 @@ TEST(ArchiveReaderThreads, TheCacheHasARecordForEachUseThatCantShareOneAndAFailu
                     EXPECT_TRUE(got == "refused" || got == text.substr(from, kPiece - 2)) << from;
                     refused += got == "refused";
                 });
-            for (int tries = 10'000'000; Access::Look(archive.reader).uses != threads && tries != 0; --tries)
+            for (int tries = 1'000'000; Access::Look(archive.reader).uses != threads && tries != 0; --tries)
                 std::this_thread::yield();
             Access::EmptyCache(archive.reader); // frees none of these
             disk.failures = failures;

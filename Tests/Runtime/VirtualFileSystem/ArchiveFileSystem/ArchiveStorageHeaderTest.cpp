@@ -45,7 +45,7 @@ TEST(ArchiveLayouts, EndUpInTheSameRecordsUnlessTheyAreCutOrHostile) {
             EXPECT_EQ(length < whole.bytes.find('\0') ? -1 : length < neededLength, cut.result) << length;
         }
         for (const auto& [name, place] : whole.fields) {
-            for (const UInt64 hostile : {0ull, 2ull, 0x7FFFFFFFull, 0x80000000ull, 0xFFFFFFFFull, ~0ull >> 1, ~0ull}) {
+            for (const UInt64 hostile : {0ull, 20ull, 0x7FFFFFFFull, 0x80000000ull, 0xFFFFFFFFull, ~0ull >> 1, ~0ull}) {
                 description.fields = {{name, hostile}};
                 OpenedArchive archive(description);
                 const size_t nodes = archive.reader.GetDirectoryInfo().nodes.capacity();

@@ -20,12 +20,15 @@ TEST(ArchiveReader, AStreamIsNotDecodedAgainForEveryFileInIt) {
     }
 }
 
-// It also asks for a dictionary of 4 GiB.
-TEST(ArchiveReader, AStreamThatEndsBeforeItsBlockDeliversWhatItHolds) {
+TEST(ArchiveReader, WhatEndsEarlyDeliversWhatItHolds) {
+    // A stream that ends before its block does, and asks for a dictionary of 4 GiB.
     const std::string lzma = CompressLzma(SampleText(60'000), {.endMark = true}).replace(1, 4, 4, '\xFF');
     OpenedArchive archive({.entries = {{"", SampleText(90'000)}}, .blocks = {{90'000, kCompressionLzma, true, lzma}}});
     EXPECT_EQ(SampleText(60'000).substr(50'000), archive.Read(50'000, 30'000));
     EXPECT_EQ("refused", archive.Read(60'000, 10));
+    // A file that ends inside of the bytes that a read needs of its last block.
+    const BuiltArchive built = BuildArchive({.entries = {{"", "0123456789abcdefghij"}}, .chunkSize = 10});
+    EXPECT_EQ("0123456789", OpenedArchive(built.bytes.substr(0, built.dataOffset + 12)).Read(0, 15));
 }
 
 TEST(ArchiveReader, ADirectoryInTheDataIsReadyOnceItsLastByteHasBeenRead) {
@@ -63,8 +66,7 @@ TEST(ArchiveReader, UseCountOpensAndClosesTheFileUnlessItHasChanged) {
     EXPECT_TRUE(reader.MakeStorageUsed(true) && archive.Read(5, 3) == "refused"); // from -1 to 0 opens nothing
     EXPECT_TRUE(reader.MakeStorageUsed(true) && archive.Read(6, 3) == "678" && archive.Read(0, 0).empty());
     UInt64 count = 77;
-    EXPECT_FALSE(reader.Read(10, 0, nullptr, &count) || reader.Read(5, ~0ull - 2, nullptr, &count) ||
-                 reader.Read(~0ull, 2, nullptr, &count) || count != 77);
+    EXPECT_FALSE(reader.Read(5, ~0ull - 2, nullptr, &count) || reader.Read(~0ull, 2, nullptr, &count) || count != 77);
     disk.Arm(1, {false, false}); // the question when the file was changed
     EXPECT_FALSE(reader.MakeStorageUsed(true));
     EXPECT_EQ("ArchiveStorageReader has mismatched MakeStorageUsed/MakeStorageUnused calls\n"
