@@ -48,7 +48,8 @@ TEST(Failures, HeadersAreRefusedAndDamageSpoilsTheReadsThatNeedIt) {
 
 // Every cut of every layout: what is said, and how much of the file comes out.
 TEST(Failures, EveryCutEndsInTheRightMessage) {
-    for (const std::string form : {"fs", "fs end", "lz4 section", "lzma section end", "web", "raw", "old", "old end"}) {
+    for (const std::string form :
+         {"fs chunk=7", "fs end", "lz4 section", "lzma section end", "web", "raw", "old", "old end"}) {
         const bool isWeb = form == "web";
         const std::string words = form + (isWeb ? " a:z65600" : " a:r20");
         const BuiltArchive built = BuildArchive(Archive(words));
@@ -56,7 +57,8 @@ TEST(Failures, EveryCutEndsInTheRightMessage) {
         // The NUL of the path that ends a stored section is not missed, nor are the last bytes of a ZarvoWeb stream.
         const size_t loadEnd = (form.ends_with("end") ? size : dataStart) - (form.starts_with("fs") ? 1 : 0);
         for (size_t cut = 0; cut < size - (isWeb ? 5 : 0); ++cut) {
-            const size_t count = form == "lz4 section" ? 0 : std::clamp(cut, dataStart, dataStart + 20) - dataStart;
+            size_t count = form == "lz4 section" ? 0 : std::clamp(cut, dataStart, dataStart + 20) - dataStart;
+            if (form == "fs chunk=7" && count >= 7 && count < 20) count = 0; // a later block spoils the whole read
             Case run{words, count == 20 ? "ok" : "data:a", count == 0 ? "a:" : "a:r" + std::to_string(count)};
             if (isWeb) run.messages = "nodirectory";
             if (cut < loadEnd) run.messages = cut < strlen(built.bytes.c_str()) ? kNoHeader : "unread";

@@ -34,6 +34,8 @@ TEST(Layouts, OddArchivesThatAreWhole) {
     const ArchiveDescription asIs{.blocks = {{1'000, {}, {}, Bytes("r1000")}}}, unflagged{.webSignatureFlag = false};
     const std::pair<std::string, ArchiveDescription> rows[] = {
         {"flags=0xFFFFFC40 block[0].flags=0xFF80 node[0].flags=0xFFFFFFFE a:text", longTexts},
+        {"node[0].flags=0xFFFFFFFF folder|", {}},
+        {"padded a/section:of-64-bytes", {}},
         {"old lz4 running[0].type=0xFFFFFFC2 running[0].streamed=0xFFFFFFFE a:c1000", {}},
         {"old running[0].uncompressed=0xFFFFFFFFFFFFFFFF running[1].uncompressed=3 a:text", {}},
         {"old empty: folder|", {}},
