@@ -53,3 +53,21 @@ TEST_F(DisturbedWorld, AnyCallMayFailOrFallShortOrFindTheArchiveCutOrGone) {
         ExtractWithFaults(form, {}, [&] { fs::resize_file(m_Path, fs::file_size(m_Path) / 2); });
     }
 }
+
+// A folder that is there already, though nobody knows, and a disk that is found to be full when a file is closed.
+TEST_F(DisturbedWorld, AFolderThatCantBeMadeOrAFileThatCantBeClosedIsAFailure) {
+    struct NoFolders : FaultyFileSystem {
+        bool CreateAsDir(FileEntryData&) override { return false; }
+        FileEntryInfoQueryFlags GetFileEntryInfo(const FileEntryData&, FileEntryInfo&,
+                                                 FileEntryInfoQueryFlags) const override {
+            return kFileEntryQueryNone;
+        }
+    };
+    struct NoClosing : FaultyFileSystem {
+        bool Close(FileEntryData& entry) override { return FaultyFileSystem::Close(entry) && false; }
+    };
+    fs::create_directories(m_Path + "_data/a/b");
+    WriteFile(m_Path, BuildArchive(Archive(kFiles)).bytes);
+    EXPECT_FALSE((NoFolders(), Extract()));
+    EXPECT_FALSE((NoClosing(), Extract()));
+}
