@@ -5,6 +5,7 @@
 #include "Runtime/Allocator/Allocator.h"
 #include "Runtime/VirtualFileSystem/LocalFileSystemPosixCalls.h"
 
+#include <new>
 #include <sys/stat.h>
 #include <unistd.h>
 
@@ -24,8 +25,23 @@ FileSystemError FileSystemErrorFromErrno(int error) {
     }
 }
 
+namespace {
+
+constexpr SInt64 kUnknownPosition = -1;
+
+// What an open entry's handlerState points to.
+struct OpenFile {
+    int descriptor;
+    SInt64 position; // the descriptor's, so that a seek to where it is costs no call
+};
+
+OpenFile* GetOpenFile(const FileEntryData& entry) { return static_cast<OpenFile*>(entry.handlerState); }
+
+} // namespace
+
 int GetDescriptor(const FileEntryData& entry) {
-    return entry.handlerState != nullptr ? *static_cast<int*>(entry.handlerState) : kNoDescriptor;
+    const OpenFile* const file = GetOpenFile(entry);
+    return file != nullptr ? file->descriptor : kNoDescriptor;
 }
 
 static int GetOpenFlags(FilePermission permission) {
@@ -46,8 +62,8 @@ bool LocalFileSystemPosix::Open(FileEntryData& entry, FilePermission permission,
     if (descriptor != kNoDescriptor && permission == kFilePermissionAppend)
         (void)RepeatOnInterrupt([&] { return lseek(descriptor, 0, SEEK_END); });
 
-    void* cell =
-        malloc_internal(sizeof(int), alignof(int), kMemLabelFileSystem, kAllocateOptionNone, __FILE__, __LINE__);
+    void* cell = malloc_internal(sizeof(OpenFile), alignof(OpenFile), kMemLabelFileSystem, kAllocateOptionNone,
+                                 __FILE__, __LINE__);
     entry.handler = this;
     entry.accessorHandler = this;
     entry.handlerState = cell;
@@ -56,7 +72,7 @@ bool LocalFileSystemPosix::Open(FileEntryData& entry, FilePermission permission,
         entry.lastError = kFileSystemErrorUnknown;
         return false;
     }
-    *static_cast<int*>(cell) = descriptor;
+    new (cell) OpenFile{descriptor, kUnknownPosition};
     entry.lastError = FileSystemErrorFromErrno(error);
     return descriptor != kNoDescriptor;
 }
@@ -70,6 +86,9 @@ bool LocalFileSystemPosix::Read(FileEntryData& entry, UInt64 size, void* buffer,
     const int descriptor = GetDescriptor(entry);
     if (descriptor == kNoDescriptor) return false;
     const ssize_t count = RepeatOnInterrupt([&] { return read(descriptor, buffer, size); });
+    SInt64& position = GetOpenFile(entry)->position;
+    if (count < 0) position = kUnknownPosition;
+    if (position != kUnknownPosition) position += count;
     *actual = count > 0 ? static_cast<UInt64>(count) : 0;
     if (count < 0) entry.lastError = FileSystemErrorFromErrno(errno);
     return count > 0;
@@ -84,6 +103,7 @@ bool LocalFileSystemPosix::Write(FileEntryData& entry, UInt64 size, const void* 
     constexpr UInt64 kMaxPieceSize = 0x7FFFFFFF; // one call takes no more
     const int descriptor = GetDescriptor(entry);
     if (descriptor == kNoDescriptor) return false;
+    GetOpenFile(entry)->position = kUnknownPosition;
     const char* from = static_cast<const char*>(buffer);
     UInt64 total = 0;
     for (bool isLast = false; !isLast;) {
@@ -126,7 +146,11 @@ bool LocalFileSystemPosix::Seek(FileEntryData& entry, VFS::FileOffset offset, Fi
     const int descriptor = GetDescriptor(entry);
     if (descriptor == kNoDescriptor) return false;
     const int base = GetSeekBase(origin);
-    return RepeatOnInterrupt([&] { return lseek(descriptor, offset.Cast<SInt64>(), base); }) >= 0;
+    const SInt64 distance = offset.Cast<SInt64>();
+    SInt64& position = GetOpenFile(entry)->position;
+    if (base == SEEK_SET && distance == position && position != kUnknownPosition) return true;
+    position = RepeatOnInterrupt([&] { return lseek(descriptor, distance, base); });
+    return position >= 0;
 }
 
 VFS::FileSize LocalFileSystemPosix::Position(const FileEntryData& entry) const {
