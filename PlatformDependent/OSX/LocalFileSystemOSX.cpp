@@ -6,6 +6,7 @@
 #include "Runtime/Utilities/FileUtilities.h"
 #include "Runtime/Utilities/Format.h"
 #include "Runtime/Utilities/PathNameUtility.h"
+#include "Runtime/VirtualFileSystem/LocalFileSystemPosixCalls.h"
 #include "Runtime/VirtualFileSystem/VirtualFileSystem.h"
 
 #include <cerrno>
@@ -29,22 +30,30 @@ static_assert(kStatusQuery == 0x334);
 
 core::basic_string<char> HomeFolder() { return MakeString(Platform_HomeDirectory()); }
 
+bool GetPlatformStatus(const FileEntryData& entry, PlatformStatus* status) {
+    return RepeatOnInterrupt([&] { return PlatformStat(entry.path, status); }) == 0;
+}
+
+// What is not is no text for the platform, which takes an empty one for it.
+bool IsUtf8(const char* path) { return NSString_stringWithUTF8String(path) != nullptr; }
+
 } // namespace
 
 LocalFileSystemOSX::~LocalFileSystemOSX() = default;
 
 bool LocalFileSystemOSX::IsHidden(const FileEntryData& entry) const {
     PlatformStatus status;
-    return PlatformStat(entry.path, &status) == 0 && (status.st_flags & UF_HIDDEN) != 0;
+    return GetPlatformStatus(entry, &status) && (status.st_flags & UF_HIDDEN) != 0;
 }
 
 bool LocalFileSystemOSX::SetFlags(FileEntryData& entry, UInt32 mask, UInt32 flags) {
     PlatformStatus status;
-    if (PlatformStat(entry.path, &status) != 0) return false;
+    if (!GetPlatformStatus(entry, &status)) return false;
     UInt32 newFlags = status.st_flags;
     if (mask & kFileEntryIsHidden) newFlags &= ~UF_HIDDEN;
     if (flags & kFileEntryIsHidden) newFlags |= UF_HIDDEN;
-    if (newFlags == status.st_flags || chflags(entry.path, newFlags) == 0) return true;
+    if (newFlags == status.st_flags) return true;
+    if (RepeatOnInterrupt([&] { return chflags(entry.path, newFlags); }) == 0) return true;
     AssertImplementation(0, kSourceName, __LINE__, -1,
                          Format("Failed to change file flags for '%s'. errno: %i", entry.path, errno).c_str());
     return false;
@@ -58,21 +67,25 @@ bool LocalFileSystemOSX::CreateAsFile(FileEntryData& entry) {
 }
 
 bool LocalFileSystemOSX::MoveToTrash(FileEntryData& entry) {
+    if (!IsUtf8(entry.path)) return false;
     NSURL* url = NSURL_URLByResolvingSymlinksInPath(NSURL_fileURLWithPath(MakeNSString(entry.path)));
     const core::basic_string_ref<char> resolved = NSURL_fileSystemRepresentation(url);
     strcpy_truncate(entry.path, resolved.data(), sizeof(entry.path), resolved.length());
-    // What is cut, or has a backslash, would name something else further on; nothing takes the whole disk.
-    if (resolved.length() > kMaxPathLength || strchr(entry.path, '\\') != nullptr || resolved == "/") return false;
+    // What is cut, is no text, or has a backslash would name something else further on; nothing takes the whole disk.
+    if (resolved.length() > kMaxPathLength || !IsUtf8(entry.path)) return false;
+    if (strchr(entry.path, '\\') != nullptr || resolved == "/") return false;
     if (!IsPathCreated(entry.path)) return false;
 
     const core::basic_string<char> path = PathToAbsolutePath(entry.path);
+    if (path.empty()) return false; // memory was refused
     int tag = 0;
     // What counts is whether the path is gone, not what the workspace says.
     (void)NSWorkspace_performFileOperation(Platform_RecycleOperation(), MakeNSString(DeleteLastPathNameComponent(path)),
                                            MakeNSString(""),
                                            NSArray_arrayWithObject(MakeNSString(GetLastPathNameComponent(path))), &tag);
-    if (IsPathCreated(path)) (void)DeleteFileOrDirectory(path); // the test below tells
-    return !IsPathCreated(path);
+    FileSystemEntry gone(path);
+    if (gone.Exists()) (void)DeleteFileOrDirectory(path); // the test below tells
+    return !gone.Exists();
 }
 
 bool LocalFileSystemOSX::Target(const FileEntryData& entry, FileSystemEntry& target) const {
@@ -96,7 +109,7 @@ FileEntryInfoQueryFlags LocalFileSystemOSX::GetFileEntryInfo(const FileEntryData
     }
     if ((query & (kStatusQuery | kFileEntryQueryHidden)) == 0) return answer;
     PlatformStatus status;
-    if (PlatformStat(entry.path, &status) != 0) return answer;
+    if (!GetPlatformStatus(entry, &status)) return answer;
     if (query & kStatusQuery) answer = answer | LocalFileSystemPosix::GetFileEntryInfo(entry, status, info, query);
     if (query & kFileEntryQueryHidden) {
         info.flags = static_cast<UInt8>(info.flags & ~kFileEntryIsHidden);

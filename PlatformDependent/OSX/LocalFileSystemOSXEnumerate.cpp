@@ -6,6 +6,7 @@
 #include "PlatformDependent/OSX/StringConversions.h"
 #include "Runtime/Allocator/Allocator.h"
 #include "Runtime/Utilities/LogAssert.h"
+#include "Runtime/VirtualFileSystem/LocalFileSystemPosixCalls.h"
 #include "Runtime/VirtualFileSystem/VirtualFileSystem.h"
 
 #include <algorithm>
@@ -156,7 +157,7 @@ void ReportMissingAttributes(const Record& record) {
 bool IsFolder(const Record& record, const char* path) {
     if (record.type != VLNK) return record.type == VDIR;
     struct stat status;
-    return stat(path, &status) == 0 && S_ISDIR(status.st_mode);
+    return GetStatus(path, &status) && S_ISDIR(status.st_mode);
 }
 
 void AddSize(const Record& record, void** handlerData) {
@@ -196,6 +197,7 @@ public:
         core::basic_string<char> working(path, kMemLabelGeneral);
         working.reserve(kReservedPathLength);
         if (working.empty() || working.back() != '/') working.push_back('/');
+        if (working.length() < path.length() || working.back() != '/') return false; // memory was refused
 
         const Descriptor descriptor(PlatformOpen(path.c_str(), O_RDONLY, 0));
         if (descriptor.Get() < 1) return true; // 0, the number of standard input, is not listed from either
@@ -250,6 +252,7 @@ private:
 
         const size_t prefixLength = working.length();
         working.append(record.name);
+        if (working.length() == prefixLength) return; // memory was refused
         const bool isFolder = IsFolder(record, working.c_str());
         if (!FlaggedAsSkipped(isFolder, (record.flags & UF_HIDDEN) != 0, record.name, m_Flags)) {
             if ((m_Flags & kFileEnumerationSumSizes) == 0)

@@ -1,4 +1,4 @@
-// How the POSIX back end makes system calls. Private to its files.
+// How the POSIX back end, and the one that derives from it, make system calls. Private to their files.
 #pragma once
 
 #include "Runtime/VirtualFileSystem/VirtualFileSystemTypes.h"

@@ -146,7 +146,7 @@ std::string ResolveLinks(const std::string& path) {
         if (target[0] == '/') resolved = "/";
         rest = target + rest;
     }
-    return resolved;
+    return resolved.empty() && !path.empty() ? "." : resolved;
 }
 
 bool NSFileManager_fileExistsAtPath(NSString* path) {

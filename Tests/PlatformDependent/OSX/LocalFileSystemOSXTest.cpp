@@ -285,13 +285,17 @@ TEST_F(LocalFileSystemOSXTest, FilesAreMadeWhereThereAreNone) {
 }
 
 TEST_F(LocalFileSystemOSXTest, TrashTakesWhatThePathLeadsTo) {
-    Make("a/name b/name folder/sub/file target \xFF x\\y x/y link>target lost>none way>x\\y");
-    EXPECT_EQ(Try("trash", "a/name b/name folder link none lost way \xFF"),
-              "a/name=/a/name b/name=/b/name folder=/folder link=/target !none=/none !lost=/none !way=/x\\y !\xFF= ");
+    Make("a/name b/name folder/sub/file target \xFF x\\y x/y link>target lost>none way>x\\y p/\xFF out>p/\xFF");
+    EXPECT_EQ(
+        Try("trash", "a/name b/name folder link none lost way out \xFF"),
+        "a/name=/a/name b/name=/b/name folder=/folder link=/target !none=/none !lost=/none !way=/x\\y !out=/p/\xFF "
+        "!\xFF ");
     EXPECT_EQ(List(".Trash"), "true .Trash/folder:0:1 .Trash/name 2:6:0 .Trash/name:6:0 .Trash/target:6:0");
     gStandinFaults.trashRefuses = true; // what is still there then is deleted
     EXPECT_EQ(Try("trash", "b link /proc/version"), "b=/b !link=/target !/proc/version ") << "the last for nobody";
-    EXPECT_EQ(List("."), "true ./.Trash:0:5 ./a:0:1 ./link:6:2 ./lost:4:2 ./way:3:2 ./x:0:1 ./x\\y:3:0 ./\xFF:1:0");
+    EXPECT_EQ(
+        List("."),
+        "true ./.Trash:0:5 ./a:0:1 ./link:6:2 ./lost:4:2 ./out:3:2 ./p:0:1 ./way:3:2 ./x:0:1 ./x\\y:3:0 ./\xFF:1:0");
 }
 
 TEST_F(LocalFileSystemOSXTest, CopyTakesFoldersWholeAndReplacesNothing) {
