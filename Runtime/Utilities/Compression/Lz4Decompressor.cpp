@@ -5,10 +5,11 @@
 #include <limits>
 #include <lz4.h>
 
+static_assert(Lz4Decompressor::kSizeLimit == std::numeric_limits<int>::max());
+
 CompressionType Lz4Decompressor::GetType() const { return kCompressionLz4; }
 
 bool Lz4Decompressor::DecompressMemory(const void* src, size_t* srcSize, void* dst, size_t* dstSize) const {
-    constexpr size_t kSizeLimit = std::numeric_limits<int>::max();
     if (!Check(*srcSize < kSizeLimit && *dstSize < kSizeLimit,
                "Lz4 doesn't support input or output data size > INT_MAX"))
         return false;

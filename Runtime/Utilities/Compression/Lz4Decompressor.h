@@ -5,9 +5,11 @@
 
 class Lz4Decompressor : public IDecompressor {
 public:
+    static constexpr size_t kSizeLimit = 0x7FFFFFFF;
+
     CompressionType GetType() const override;
 
-    // Sizes of 2,147,483,647 and more are refused and reported as a failed check. An empty output counts as a
+    // Sizes of kSizeLimit and more are refused and reported as a failed check. An empty output counts as a
     // failure. *srcSize is left as it is; after a failure *dstSize means nothing.
     bool DecompressMemory(const void* src, size_t* srcSize, void* dst, size_t* dstSize) const override;
 

@@ -2,6 +2,7 @@
 // ZarvoWeb archive, and the use count.
 #include "Runtime/VirtualFileSystem/ArchiveFileSystem/ArchiveStorageReader.h"
 
+#include "Runtime/Utilities/Compression/Lz4Decompressor.h"
 #include "Runtime/Utilities/Format.h"
 #include "Runtime/Utilities/LogAssert.h"
 #include "Runtime/VirtualFileSystem/ArchiveFileSystem/ReadAheadFile.h"
@@ -182,7 +183,9 @@ constexpr UInt64 kMaxLz4Expansion = 255;
 
 bool IsPossibleSize(CompressionType type, UInt64 compressedSize, UInt64 uncompressedSize) {
     const bool isLz4 = type == kCompressionLz4 || type == kCompressionLz4HC;
-    return !isLz4 || uncompressedSize <= compressedSize * kMaxLz4Expansion;
+    // Sizes that the decompressor does not take are left to it: it reports them.
+    return !isLz4 || uncompressedSize >= Lz4Decompressor::kSizeLimit ||
+           uncompressedSize <= compressedSize * kMaxLz4Expansion;
 }
 
 } // namespace

@@ -2,6 +2,7 @@
 #include "Runtime/VirtualFileSystem/ArchiveFileSystem/ArchiveStorageReader.h"
 
 #include "Runtime/Threads/Thread.h"
+#include "Runtime/Utilities/Compression/Lz4Decompressor.h"
 #include "Runtime/Utilities/LogAssert.h"
 
 #include <algorithm>
@@ -325,7 +326,7 @@ ArchiveStorageReader::CacheResult ArchiveStorageReader::FillChunkCachedBlock(Cac
         if (!decompressor->DecompressMemory(loaded.data(), &consumed, block->buffer.data(), &produced) ||
             produced != stored.uncompressedSize) {
             // Sizes that LZ4 does not take are reported each time.
-            if (std::max(stored.uncompressedSize, stored.compressedSize) < 0x7FFFFFFF)
+            if (std::max(stored.uncompressedSize, stored.compressedSize) < Lz4Decompressor::kSizeLimit)
                 NoteBrokenBlock(block->blockIndex, 0);
             return kCacheResultDecompressError;
         }

@@ -41,7 +41,7 @@ bool ReadAheadFile::Read(UInt64 size, void* out, UInt64* actual, FileReadFlags f
             m_BufferEnd = m_FilePosition;
         }
     }
-    *actual = delivered;
+    if (actual != nullptr) *actual = delivered;
     return delivered != 0;
 }
 

@@ -23,6 +23,7 @@ TEST(Failures, HeadersAreRefusedAndDamageSpoilsTheReadsThatNeedIt) {
         {"data:a", "a:", "lz4 block[0].uncompressedSize=99999 node[0].size=99999; lzma block[0].compressedSize=0"},
         {"data:a", "a:", "lzma streamed block[0].compressedSize=4; lzma streamed block[0].compressedSize=10"},
         {"toolarge data:a", "a:", "lz4 block[0].uncompressedSize=0x7FFFFFFF"},
+        {"toolarge unread", "none", "lz4 section uncompressedBlocksInfoSize=0x7FFFFFFF"},
         {"unstarted data:a", "a:", "lz4 block[0].flags=0x42; old lz4hc running[0].streamed=3"},
         {"unsupported unsupported data:a", "a:", "block[0].flags=0x44"}, // asked for to start it, and to fill
         {"unknown unknown data:a", "a:", "block[0].flags=0x45; block[0].flags=0x7F"},
