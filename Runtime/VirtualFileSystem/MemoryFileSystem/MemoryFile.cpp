@@ -27,6 +27,8 @@ FileSystemEntry MemoryFile::CreateFileSystemEntry(MemLabelId memLabel, FilePermi
         contents->Release();
         if (file != nullptr) entry.accessorHandler = New<IFileAdapter>(memLabel, file, memLabel, true);
         if (entry.accessorHandler == nullptr) Delete(file, memLabel);
+    } else if (takeOwnership && size != 0) {
+        free_alloc_internal(data, memLabel, __FILE__, __LINE__);
     }
     return FileSystemEntry(entry);
 }

@@ -25,7 +25,7 @@ public:
     // size and takeOwnership). It serves one open: the close that ends it frees the file, and data if it was taken
     // over; neither the entry nor a copy of it may be opened again. Copies share the file, so destroying an entry
     // frees nothing: one that is never opened and closed leaks its file. When memory is refused the entry can't be
-    // opened.
+    // opened, and data that was to be taken over is freed.
     static FileSystemEntry CreateFileSystemEntry(MemLabelId memLabel, FilePermission filePermission, void* data,
                                                  size_t size, bool takeOwnership);
 

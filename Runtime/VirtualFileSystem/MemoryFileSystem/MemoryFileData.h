@@ -14,9 +14,6 @@
 #include "Runtime/Core/SharedObject.h"
 #include "Runtime/VirtualFileSystem/VirtualFileSystemTypes.h"
 
-#include <cstring>
-#include <utility>
-
 // The order of the virtual operations is fixed.
 class MemoryFileData : public ThreadSharedObject<MemoryFileData, SharedObjectFactory<MemoryFileData>> {
 public:
@@ -30,7 +27,8 @@ public:
     virtual bool Lock(void** contents) = 0;
     virtual void Unlock(void* contents) = 0;
 
-    // Copies the bytes from position on, as far as there are any, and returns their count.
+    // Copies the bytes from position on, as far as there are any, and returns their count. What is read into, or
+    // written from, is no part of the contents that Lock hands out.
     virtual UInt64 Read(VFS::FileSize position, UInt64 size, void* out) const = 0;
 
     // Stores bytes at position, which may lie past the end; returns the count stored, which is less than size when
@@ -43,24 +41,4 @@ public:
 
     // An independent copy with one reference, the caller's; null when memory is refused.
     virtual MemoryFileData* Clone() const = 0;
-
-protected:
-    // Makes room for count elements. The array owns its memory afterwards; when memory is refused it stays as it is.
-    template <typename T>
-    static bool TryReserve(dynamic_array<T>& array, size_t count, ResizePolicy policy);
 };
-
-// Built beside the old buffer: an array that is refused memory while it grows has lost its elements.
-template <typename T>
-bool MemoryFileData::TryReserve(dynamic_array<T>& array, size_t count, ResizePolicy policy) {
-    const size_t capacity = array.capacity();
-    if (count <= capacity) return true;
-    const bool doubles = policy == kResizeDouble && capacity > count - capacity;
-    dynamic_array<T> grown(array.get_memory_label());
-    grown.reserve(doubles ? 2 * capacity : count);
-    if (grown.data() == nullptr) return false;
-    grown.resize_uninitialized(array.size());
-    if (!array.empty()) memcpy(grown.data(), array.data(), array.size() * sizeof(T));
-    array = std::move(grown);
-    return true;
-}

@@ -3,6 +3,7 @@
 #include "Runtime/Utilities/LogAssert.h"
 
 #include <algorithm>
+#include <cstring>
 
 static constexpr size_t kReservedSlots = 64;
 static constexpr size_t kBlockAlignment = 16;
@@ -13,7 +14,7 @@ MultiBlocksMemoryFileData::MultiBlocksMemoryFileData(MemLabelId memLabel, size_t
 MultiBlocksMemoryFileData::MultiBlocksMemoryFileData(MemLabelId objectLabel, MemLabelId contentsLabel,
                                                      size_t sizeOfBlock)
     : MemoryFileData(objectLabel), label(contentsLabel), blockSize(sizeOfBlock), blocks(contentsLabel) {
-    (void)TryReserve(blocks, kReservedSlots, kResizeExact); // refused: the first write asks again
+    blocks.reserve(kReservedSlots); // refused: the first write asks again
 }
 
 MultiBlocksMemoryFileData::~MultiBlocksMemoryFileData() {
@@ -24,10 +25,7 @@ MultiBlocksMemoryFileData::~MultiBlocksMemoryFileData() {
 // A slot for every block up to lastSlot; false, and nothing changed, when memory is refused.
 bool MultiBlocksMemoryFileData::ReserveSlots(UInt64 lastSlot) {
     if (lastSlot < blocks.size()) return true;
-    constexpr UInt64 kMaxSlots = (~UInt64{0} >> 1) / sizeof(UInt8*);
-    if (lastSlot >= kMaxSlots || !TryReserve(blocks, lastSlot + 1, kResizeDouble)) return false;
-    blocks.resize_initialized(lastSlot + 1);
-    return true;
+    return lastSlot != ~UInt64{0} && blocks.resize_initialized(lastSlot + 1);
 }
 
 UInt8* MultiBlocksMemoryFileData::GetOrMakeBlock(UInt64 slot) {
@@ -72,7 +70,10 @@ UInt64 MultiBlocksMemoryFileData::Write(VFS::FileSize position, UInt64 size, con
     UInt64 offset = from % blockSize;
     for (UInt64 slot = from / blockSize; done < size; ++slot) {
         UInt8* const block = GetOrMakeBlock(slot);
-        if (block == nullptr) break;
+        if (block == nullptr) {
+            if (done == 0) return 0;
+            break;
+        }
         const UInt64 count = std::min(size - done, blockSize - offset);
         memcpy(block + offset, bytes + done, count);
         done += count;

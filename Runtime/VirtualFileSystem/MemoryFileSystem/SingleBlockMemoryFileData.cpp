@@ -1,6 +1,7 @@
 #include "Runtime/VirtualFileSystem/MemoryFileSystem/SingleBlockMemoryFileData.h"
 
 #include <algorithm>
+#include <cstring>
 
 dynamic_array<UInt8> SingleBlockMemoryFileData::MakeBuffer(MemLabelId memLabel, void* data, size_t size,
                                                            bool takeOwnership) {
@@ -10,7 +11,7 @@ dynamic_array<UInt8> SingleBlockMemoryFileData::MakeBuffer(MemLabelId memLabel, 
                              : dynamic_array<UInt8>::wrap(bytes, size, size, memLabel);
     }
     dynamic_array<UInt8> empty(memLabel);
-    (void)TryReserve(empty, size, kResizeExact); // refused: the first write asks again
+    empty.reserve(size); // refused: the first write asks again
     return empty;
 }
 
@@ -41,12 +42,9 @@ UInt64 SingleBlockMemoryFileData::Write(VFS::FileSize position, UInt64 size, con
     UInt64 count = size;
     // An array without a buffer counts as not owning one, but wraps nothing.
     const bool isWrapped = buffer.data() != nullptr && !buffer.owns_data();
-    if (isWrapped)
-        count = from < buffer.capacity() ? std::min<UInt64>(size, buffer.capacity() - from) : 0;
-    else if (size > ~UInt64{0} - from || !TryReserve(buffer, from + size, kResizeDouble))
-        count = 0;
-    if (count == 0) return 0;
-    if (from + count > buffer.size()) buffer.resize_uninitialized(from + count);
+    if (isWrapped) count = from < buffer.capacity() ? std::min<UInt64>(size, buffer.capacity() - from) : 0;
+    if (count == 0 || count > ~UInt64{0} - from) return 0;
+    if (from + count > buffer.size() && !buffer.resize_uninitialized(from + count)) return 0;
     memcpy(buffer.data() + from, in, count);
     return count;
 }
@@ -54,7 +52,7 @@ UInt64 SingleBlockMemoryFileData::Write(VFS::FileSize position, UInt64 size, con
 void SingleBlockMemoryFileData::SetLength(VFS::FileSize newLength) {
     Mutex::AutoLock lock(mutex);
     const UInt64 length = newLength.Cast<UInt64>();
-    if (TryReserve(buffer, length, kResizeExact)) buffer.resize_uninitialized(length);
+    (void)buffer.resize_uninitialized(length, kResizeExact); // refused: nothing has changed
 }
 
 VFS::FileSize SingleBlockMemoryFileData::Size() const {
