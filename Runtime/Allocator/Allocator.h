@@ -6,6 +6,7 @@
 //   Delete(thing, label);
 #pragma once
 
+#include "Footing/Process.h"
 #include "Runtime/Allocator/MemLabel.h"
 #include "Runtime/Core/SourceLocation.h"
 #include "Runtime/Core/Types.h"
@@ -72,8 +73,9 @@ struct stl_allocator {
     stl_allocator(const stl_allocator<U, label, align>&) {}
 
     T* allocate(size_t count) {
-        return static_cast<T*>(
-            malloc_internal(count * sizeof(T), align, label, kAllocateOptionNone, __FILE__, __LINE__));
+        void* memory = malloc_internal(count * sizeof(T), align, label, kAllocateOptionNone, __FILE__, __LINE__);
+        if (memory == nullptr) C99Api::Footing_Process_Abort(ZarvoClassic::Footing_ErrorCode_OutOfMemory);
+        return static_cast<T*>(memory);
     }
     void deallocate(T* pointer, size_t) { free_alloc_internal(pointer, label, __FILE__, __LINE__); }
 

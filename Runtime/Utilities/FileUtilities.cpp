@@ -18,7 +18,8 @@ bool CreateDirectory(string_ref path) {
     constexpr UInt32 kNewFolderFlags = 0x02;
 
     const core::string absolute = PathToAbsolutePath(path);
-    if (absolute.empty()) return true;
+    // Of other paths only refused memory leaves nothing.
+    if (absolute.empty()) return path.empty() || path == "~";
     FileSystemEntry entry(absolute);
     FileEntryInfo info;
     const FileEntryInfoQueryFlags answer =

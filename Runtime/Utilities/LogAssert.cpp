@@ -136,7 +136,7 @@ bool HasStackTraceForConsole(LogType type, const DebugStringToFileData& data) {
 }
 
 bool HasSourcePositionForConsole(const DebugStringToFileData& data) {
-    return data.line != 0 && data.file[0] != '\0' && (data.mode & kLogModeShowSourcePosition) != 0 &&
+    return (data.mode & kLogModeShowSourcePosition) != 0 && data.line != 0 && data.file[0] != '\0' &&
            strstr(data.file, "Debug.bindings") == nullptr;
 }
 

@@ -35,7 +35,7 @@ enum LogMode : UInt32 {
     kLogModeShowSourcePosition = 0x800000, // file and line follow the trace
 };
 
-// One report. Texts are the caller's and must outlive the call.
+// One report. Texts are the caller's, never null, and must outlive the call.
 struct DebugStringToFileData {
     const char* message = "";
     const char* auxiliaryText = "";   // carried along

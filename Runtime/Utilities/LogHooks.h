@@ -17,7 +17,7 @@
 // static object of a program and destroyed after them.
 extern Mutex g_LogHandlerListMutex;
 
-// A node of the circular list of clean log handlers.
+// A node of the circular list of clean log handlers. A handler does not change the list.
 struct CleanLogEntryHandlerNode {
     CleanLogEntryHandlerNode* next;
     void (*function)(LogType type, const char* format, va_list arguments); // of the anchor: not called

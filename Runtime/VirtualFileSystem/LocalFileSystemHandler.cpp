@@ -26,7 +26,7 @@ bool LocalFileSystemHandler::ToLocal(const FileEntryData& entry, core::string& p
     path = entry.path;
     offset = 0;
     size = Size(entry);
-    return true;
+    return path == entry.path; // not when memory was refused
 }
 
 core::string LocalFileSystemHandler::GetExecutablePath() const { return GetApplicationPath(); }
@@ -36,7 +36,8 @@ int LocalFileSystemHandler::LastError() { return 0; }
 
 core::string LocalFileSystemHandler::SetCurrentDirectory(string_ref path) {
     core::string previous(currentDirectory, kMemLabelGeneral);
-    const core::string given(path, kMemLabelGeneral); // it may be the buffer itself
-    strcpy_truncate(currentDirectory, given.data(), sizeof(currentDirectory), given.size());
+    char given[kPathBufferSize]; // the path may be the buffer itself
+    const size_t length = strcpy_truncate(given, path.data(), sizeof(given), path.size());
+    strcpy_truncate(currentDirectory, given, sizeof(currentDirectory), length);
     return previous;
 }

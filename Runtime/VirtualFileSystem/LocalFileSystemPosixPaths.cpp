@@ -24,12 +24,15 @@ LocalFileSystemPosix::LocalFileSystemPosix() : m_HomeFolder(kMemLabelPathString)
 core::string LocalFileSystemPosix::ToAbsolute(string_ref path) const {
     if (IsAbsoluteFilePath(path)) return core::string(path, kMemLabelGeneral);
     if (!path.empty() && path[0] == '~') {
-        core::string expanded(m_HomeFolder);
+        core::string expanded(m_HomeFolder.get_memory_label());
+        // Half a path would name something else.
+        if (expanded.grow(m_HomeFolder.size() + path.size()) == nullptr) return expanded;
+        expanded += m_HomeFolder;
         expanded += path.substr(1);
         return expanded;
     }
     core::string absolute(kMemLabelGeneral);
-    AppendPathNameImpl(GetFileSystem()->CurrentDirectory(), path, '/', absolute);
+    AppendPathNameImpl(currentDirectory, path, '/', absolute);
     return absolute;
 }
 
@@ -43,7 +46,7 @@ bool LocalFileSystemPosix::Parent(const FileEntryData& entry, core::string& pare
     const size_t separator = rest.rfind('/');
     if (separator == string_ref::npos) return false;
     parent = rest.substr(0, separator);
-    return true;
+    return parent.size() == separator;
 }
 
 const char* LocalFileSystemPosix::Filename(const FileEntryData& entry) const {
@@ -197,7 +200,10 @@ bool LocalFileSystemPosix::Enumerate(const char* path, dynamic_block_array<FileE
     FolderStream folder(path);
     if (!folder.IsOpen()) return false;
 
-    core::string working(path, kMemLabelGeneral);
+    core::string working(kMemLabelGeneral);
+    // All at once: where memory is refused later, half a path would be listed.
+    if (working.grow(strlen(path) + 1 + kMaxNameLength) == nullptr) return false;
+    working = path;
     if (working.back() != '/') working += '/';
     const size_t prefixLength = working.size();
     while (const char* name = folder.Next()) {

@@ -59,7 +59,7 @@ bool FileSystem::Enumerate(const char* path, dynamic_block_array<FileEntryInfo, 
     strcpy_truncate(entry.path, path, sizeof(entry.path), strlen(path));
     GetHandlerForPath(path)->InitializeFileEntry(entry);
     void* handlerData = nullptr;
-    return entry.handler->Enumerate(entry.path, out, recursive, &handlerData, flags);
+    return entry.handler != nullptr && entry.handler->Enumerate(entry.path, out, recursive, &handlerData, flags);
 }
 
 core::string FileSystem::LastErrorMessage() const { return localHandler->LastErrorMessage(); }
@@ -143,8 +143,10 @@ FileAccessor::~FileAccessor() {
 }
 
 bool FileAccessor::Open(FileSystemEntry& target, FilePermission permission, FileAutoBehavior behavior) {
-    Unbind(entry);
-    CopyBinding(entry, target);
+    if (&target != &entry) {
+        Unbind(entry);
+        CopyBinding(entry, target);
+    }
     entry.handlerState = nullptr;
     opened = true;
     openSucceeded = entry.accessorHandler != nullptr && entry.accessorHandler->Open(entry, permission, behavior);

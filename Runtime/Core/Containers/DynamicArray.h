@@ -108,11 +108,11 @@ public:
     // Uses memory of somebody else, which must outlive the array.
     static dynamic_array wrap(T* data, size_t size, size_t capacity, MemLabelId label) {
         static_assert(std::is_trivially_copyable_v<T>, "growth copies wrapped elements byte by byte");
-        return from_buffer(data, size, capacity * 2 + Untyped::kNotOwned, label);
+        return dynamic_array(data, size, capacity * 2 + Untyped::kNotOwned, label);
     }
     // Takes over a buffer of malloc_internal.
     static dynamic_array adopt(T* data, size_t size, size_t capacity, MemLabelId label) {
-        return from_buffer(data, size, capacity * 2, label);
+        return dynamic_array(data, size, capacity * 2, label);
     }
 
     size_t size() const { return m_Array.size; }
@@ -194,11 +194,8 @@ private:
     using Untyped = dynamic_array_detail::dynamic_array_data;
     static constexpr size_t kAlignment = Align == 0 ? alignof(T) : Align;
 
-    static dynamic_array from_buffer(T* data, size_t size, size_t capacityWord, MemLabelId label) {
-        dynamic_array array(label);
-        array.m_Array = {.data = data, .label = label, .size = size, .capacityWord = capacityWord};
-        return array;
-    }
+    dynamic_array(T* data, size_t size, size_t capacityWord, MemLabelId label)
+        : m_Array{.data = data, .label = label, .size = size, .capacityWord = capacityWord} {}
 
     template <typename... Arguments>
     T* construct(T* where, Arguments&&... arguments) {

@@ -38,6 +38,7 @@ public:
     void grow(size_t newSize) {
         while (newSize > m_Blocks.size() * BlockSize) {
             Block* block = New<Block>(m_Label, m_Label);
+            if (block == nullptr) C99Api::Footing_Process_Abort(ZarvoClassic::Footing_ErrorCode_OutOfMemory);
             m_Blocks.push_back(block);
             block->reserve(BlockSize);
         }

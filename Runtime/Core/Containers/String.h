@@ -109,20 +109,21 @@ public:
     friend bool operator==(const basic_string& a, const T* b) { return ref(a) == ref(b); }
     friend bool operator<(const basic_string& a, const basic_string& b) { return a.compare(ref(b)) < 0; }
 
-    // The sum has the left side's label.
-    friend basic_string operator+(const basic_string& lhs, const T* rhs) {
-        const ref right(rhs);
-        basic_string sum(lhs.get_memory_label());
-        const size_t total = lhs.size() + right.size();
-        if (total >= Storage::kInlineCapacity) sum.grow(total);
-        sum.assign(lhs);
-        sum.append(right);
-        return sum;
-    }
-
 private:
     Storage m_Storage;
 };
+
+// The sum has the left side's label.
+template <typename T, typename Storage>
+basic_string<T, Storage> operator+(const basic_string<T, Storage>& lhs, const T* rhs) {
+    const basic_string_ref<T> right(rhs);
+    basic_string<T, Storage> sum(lhs.get_memory_label());
+    const size_t total = lhs.size() + right.size();
+    if (total >= Storage::kInlineCapacity) sum.grow(total);
+    sum.assign(lhs);
+    sum.append(right);
+    return sum;
+}
 
 using string = basic_string<char>;
 

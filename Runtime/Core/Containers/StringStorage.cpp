@@ -8,6 +8,7 @@ namespace core {
 template <typename T>
 T* StringStorageDefault<T>::grow(size_t count) {
     if (count <= capacity()) return writable_data();
+    if (count == ~size_t{0}) return nullptr; // leaves no room for the NUL
 
     if (is_heap()) {
         T* buffer = static_cast<T*>(realloc_internal(load<T*>(kPointerOffset), count + 1, kBufferAlignment, m_Label,

@@ -25,7 +25,8 @@ TEST(String, AppendingAndGrowingMakeTheRoomThatTheRuleGives) {
         const std::string content(size, 'a'), tail(how == '+' ? added : 0, '+');
         string text = from == 'e' ? string::wrap(content.c_str()) : string();
         if (from != 'e') text.grow(size), text = content.c_str();
-        EXPECT_EQ(nullptr, text.grow(size_t{1} << 60)); // refused, and nothing has changed
+        for (const size_t tooMany : {size_t{1} << 60, string::npos})
+            EXPECT_EQ(nullptr, text.grow(tooMany)); // refused, and nothing has changed
         EXPECT_TRUE(how == '+' || text.grow(added) == text.data());
         EXPECT_TRUE(Is(content + tail, text += tail.c_str())) << from << size << how << added;
         EXPECT_EQ(std::pair(capacity, modeByte), std::pair(text.capacity(), ModeByte(text))) << from << size << how;
