@@ -2,8 +2,8 @@
 //
 // Reads ARCHIVE.plan (see PackFolder.cpp), so it parses and checks nothing of the archive; decodes the blocks into one
 // buffer that stays in the processor's cache, and makes each file of FOLDER with open, one write (a large one with one
-// for each piece) and close, each folder with mkdir. A block that is no larger than a piece is decoded in one call,
-// larger ones piece by piece. An unexpected result ends it with status 1.
+// for each piece) and close, each folder with mkdir. A stored block is copied piece by piece, and so is LZMA that is
+// larger than a piece decoded; other blocks are decoded in one call. An unexpected result ends it with status 1.
 #include "Runtime/Utilities/Compression/Compression.h"
 
 #include <algorithm>

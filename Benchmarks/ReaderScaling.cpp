@@ -30,7 +30,7 @@ std::string MakeText() {
 }
 
 // Bytes a second by that many threads; work(block) handles one block and says whether it came out right. Each thread
-// handles every block so many times, from another one on, so that two never handle the same at once.
+// handles every block so many times, from another one on, so that two hardly ever handle the same at once.
 template <typename Work>
 double Measure(UInt64 threadCount, UInt64 passes, Work work) {
     const auto start = std::chrono::steady_clock::now();

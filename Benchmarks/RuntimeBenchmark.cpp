@@ -1,5 +1,5 @@
 // What the operations cost that every extraction is made of (Google Benchmark). A row named "...Floor" does the same
-// with the standard library or the system alone. Every pass starts anew and its result is checked.
+// with the standard library or the system alone. Every result is checked.
 #include "Runtime/Core/Containers/DynamicArray.h"
 #include "Runtime/Core/Containers/String.h"
 #include "Runtime/Utilities/FileUtilities.h"

@@ -155,21 +155,24 @@ def place(archives, rows, folder):
             shutil.copyfile(f"{archives}/{name}", f"{folder}/{name}")
 
 
-def measure_in(parent, build, archives, tree, rows, rounds, counts_calls):
-    """Medians of every row, and system calls where they are wanted; before, each tree is compared with the source."""
+def measure_in(parent, build, archives, tree, rows, rounds, is_memory):
+    """Medians of every row, and in memory its system calls; before, each tree is compared with the source."""
     samples = {name: [] for name in rows}
     calls = {}
     with tempfile.TemporaryDirectory(prefix="varnex-bench-", dir=parent) as folder:
         place(archives, rows, folder)
+        spent = None
+        if not is_memory:
+            spent = f"{folder}/spent"
+            os.mkdir(spent)
         for name, row in rows.items():
-            verify(row, folder, tree)
-            if counts_calls:
+            verify(row, folder, tree, spent)
+            if is_memory:
                 calls[name] = count_calls(row, folder)
-            shutil.rmtree(os.path.join(folder, row.output))
         for number in range(rounds):
             print(f"{parent}: round {number + 1} of {rounds}", file=sys.stderr, flush=True)
             for name, row in rows.items():
-                samples[name].append(measure(build, row, folder))
+                samples[name].append(measure(build, row, folder, spent))
     return {name: median(taken) for name, taken in samples.items()}, calls
 
 
@@ -240,7 +243,7 @@ def describe_machine():
 
 
 def file_system_of(folder):
-    return run(["stat", "-f", "-c", "%T", folder]).strip()
+    return run(["findmnt", "-n", "-o", "FSTYPE", "-T", folder]).strip()
 
 
 def print_comparison(options):
