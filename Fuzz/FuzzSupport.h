@@ -56,5 +56,5 @@ public:
     FileAccessor file;
 };
 
-// Sends what the log sink prints to /dev/null. Call once.
+// Drops what the log sink prints. Call once.
 void SilenceConsole();

@@ -1,6 +1,6 @@
 // Allocation with a memory label. Every block is aligned to 16 bytes at least, all labels share one heap, and label,
 // options and source position change nothing about where a block comes from. A refused request gives null: nothing
-// here throws or aborts. Any thread.
+// here throws, and only what serves standard containers ends the program. Any thread.
 //
 //   Thing* thing = New<Thing>(label, constructorArguments...);   // null when memory is refused
 //   Delete(thing, label);

@@ -1,5 +1,5 @@
 // The global operator new and delete of our own programs: blocks aligned to 16 bytes, null when memory is refused.
-// Linked into the command and the tests only, so that a program that embeds the library keeps its own. Standard
+// Linked into these programs only, so that a program that embeds the library keeps its own. Standard
 // containers can't go on from null; the runtime itself uses the labelled form alone.
 #include <cstdlib>
 #include <new>

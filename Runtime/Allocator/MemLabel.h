@@ -1,5 +1,5 @@
-// Memory labels: every allocation names what it is for. All labels share one heap; containers compare labels to
-// decide whether a buffer may change hands, and keep theirs for life.
+// Memory labels: every allocation names what it is for. All labels share one heap; strings compare labels to
+// decide whether a buffer may change hands, and all containers keep theirs for life.
 #pragma once
 
 #include "Runtime/Core/Types.h"

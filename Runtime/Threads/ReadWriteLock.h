@@ -105,8 +105,6 @@ public:
     void ReleaseExclusive() VARNEX_RELEASE();
 
 private:
-    friend struct ReadWriteLockInspector; // tests look at the word
-
     std::atomic<UInt64> m_Word;
     ZarvoClassic::Footing_Semaphore m_ReadersSemaphore;
     ZarvoClassic::Footing_Semaphore m_WritersSemaphore;

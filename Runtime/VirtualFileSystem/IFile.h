@@ -14,7 +14,7 @@ public:
     virtual bool IsOpen() const = 0;
     virtual bool Close() = 0;
 
-    // actual may be null. A read at the very end delivers 0 bytes and answers true; one beyond it answers false.
+    // actual may be null. Whether a read at the very end is a success is for the file to say.
     virtual bool Read(VFS::FileSize position, UInt64 size, void* buffer, UInt64* actual, FileReadFlags flags) = 0;
     virtual bool Read(UInt64 size, void* buffer, UInt64* actual, FileReadFlags flags) = 0;
 
@@ -22,7 +22,7 @@ public:
     virtual bool Write(VFS::FileSize position, UInt64 size, const void* buffer, UInt64* written) = 0;
     virtual bool Write(UInt64 size, const void* buffer, UInt64* written) = 0;
 
-    // kFileOriginEnd counts backwards: the target is the size minus offset. A target past the end is refused.
+    // How kFileOriginEnd counts, and whether a target past the end is refused, is for the file to say.
     virtual bool Seek(VFS::FileOffset offset, FileOrigin origin) = 0;
     virtual VFS::FileSize Position() const = 0;
     virtual bool SetLength(VFS::FileSize length) = 0;

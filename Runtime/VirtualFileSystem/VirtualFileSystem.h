@@ -78,7 +78,7 @@ public:
     bool CreateAsDir();
     bool SetFlags(UInt32 mask, UInt32 flags);
     FileEntryInfoQueryFlags GetFileEntryInfo(FileEntryInfo& info, FileEntryInfoQueryFlags query) const;
-    DateTime LastModified() const; // lastError tells whether the answer counts
+    DateTime LastModified() const; // 0 when it can't be told; a handler may say why in lastError
     bool FolderExists() const;
 };
 
@@ -92,7 +92,7 @@ public:
     bool Open(FileSystemEntry& target, FilePermission permission, FileAutoBehavior behavior = kFileAutoBehaviorNone);
     bool Open(const char* path, FilePermission permission, FileAutoBehavior behavior = kFileAutoBehaviorNone);
 
-    // False: nothing could be read (*actual is then 0 if the file is open); a count below size is a success. Files on
+    // False: nothing could be read, and *actual is 0 or as it was; a count below size is a success. Files on
     // disk answer false at their end, memory files true with 0 bytes.
     bool Read(UInt64 size, void* buffer, UInt64* actual, FileReadFlags flags = kFileReadFlagsNone);
     bool Read(VFS::FileSize position, UInt64 size, void* buffer, UInt64* actual,

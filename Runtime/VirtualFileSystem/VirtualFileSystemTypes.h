@@ -155,7 +155,7 @@ constexpr FileEntryInfoQueryFlags operator|(FileEntryInfoQueryFlags a, FileEntry
     return static_cast<FileEntryInfoQueryFlags>(static_cast<UInt32>(a) | static_cast<UInt32>(b));
 }
 
-// What an enumeration leaves out. A name is hidden when it starts with "." (or, on macOS, carries the hidden flag).
+// What an enumeration leaves out. A name is hidden when it starts with "." (on macOS, when it carries the hidden flag).
 enum FileEnumerationFlag : UInt32 {
     kFileEnumerationAll = 0,
     kFileEnumerationSkipHiddenFiles = 0x02,

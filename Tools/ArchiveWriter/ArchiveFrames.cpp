@@ -60,9 +60,8 @@ FieldWriter MakeSection(const ArchiveDescription& description, GivenFields& give
 // 4    compressedBlocksInfoSize
 // 4    uncompressedBlocksInfoSize
 // 4    flags: 0x3F kind of the section, 0x40 directory, 0x80 at the end, 0x100 web signature, 0x200 padded
-// 1    only with flag 0x100. Without it the ninth byte of "ZarvoWeb" is not counted either, and what follows stands in
-// the
-//      place of the last byte of flags
+// 1    only with flag 0x100. Without it the ninth byte of "ZarvoWeb" is not counted either, and what follows
+//      stands in the place of the last byte of flags
 //      from version 7 on: NULs up to a multiple of 16
 //      the section; with flag 0x200: NULs up to a multiple of 16 from its start
 //      the data

@@ -129,8 +129,10 @@ UInt64 StoreBlock(const ArchiveDescription& description, const ArchiveBlock& blo
         return storedSize;
     }
     switch (const CompressionType type = TypeOf(description, block)) {
-    case kCompressionLz4:
-    case kCompressionLz4HC: store(Compress(type, stream.Read(block.size))); break;
+    case kCompressionNone:
+        while (left != 0)
+            store(next(kPieceSize));
+        break;
     case kCompressionLzma: {
         // The legacy stream has the size of its data, least significant byte first, behind the properties.
         std::string sizeField;
@@ -143,9 +145,7 @@ UInt64 StoreBlock(const ArchiveDescription& description, const ArchiveBlock& blo
         CompressLzma(next, storeCoded, description.lzma);
         break;
     }
-    default:
-        while (left != 0)
-            store(next(kPieceSize));
+    default: store(Compress(type, stream.Read(block.size)));
     }
     return storedSize;
 }

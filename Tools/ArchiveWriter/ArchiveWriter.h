@@ -59,8 +59,8 @@ struct ArchiveDescription {
     LzmaSettings lzma = {};
 
     std::optional<std::string> signature = {};
-    std::optional<UInt32> version =
-        {}; // else 7, 6, 3, 3, 5, in the order of the layouts; decides which fields there are
+    // Else 7, 6, 3, 3, 5, in the order of the layouts; decides which fields there are.
+    std::optional<UInt32> version = {};
     std::string engineVersion = "5.x.x";
     std::string engineRevision = "7041.3.0b12";
 
@@ -73,7 +73,7 @@ struct ArchiveDescription {
 
     UInt32 levelCount = 1; // kWeb and kRaw: all but the last entry are of no meaning
 
-    // Values that are stored instead of the true ones. Names are those in the layout tables of ArchiveWriter.cpp, with
+    // Values that are stored instead of the true ones. Names are those in the layout tables of ArchiveFrames.cpp, with
     // [i] for the i-th of a list: "block[2].compressedSize", "node[0].offset".
     std::map<std::string, UInt64> fields = {};
 };

@@ -29,7 +29,8 @@ enum ResizePolicy : SInt32 {
 
 namespace dynamic_array_detail {
 
-// An array without its element type, and how it grows. Each operation returns the new buffer.
+// An array without its element type, and how it grows. What changes the capacity returns the buffer, which is the old
+// one when memory is refused.
 struct dynamic_array_data {
     static constexpr size_t kMaxSize = ~size_t{0} >> 1;
     static constexpr size_t kNotOwned = 1;

@@ -11,7 +11,8 @@
 //   11xxxxxx    never
 //
 // The x are left as they were. Inline and heap text ends in a NUL at [size]. Nothing in the area points into the
-// object, so a string may be moved byte by byte. A buffer never shrinks, and stays until the string is moved from.
+// object, so a string may be moved byte by byte. A buffer never shrinks, and stays until the string is moved from or
+// to.
 #pragma once
 
 #include "Runtime/Allocator/Allocator.h"

@@ -9,8 +9,8 @@
 //   data:          at GetDataOffset
 //
 // All integers are big-endian, all strings NUL-terminated. The parsers print nothing and keep no state; a thread must
-// have the accessor and the records to itself. Values are stored as read: only counts that the rest of the file can't
-// hold are refused, so whoever uses a size or a position compares it first.
+// have the accessor and the records to itself. Sizes and positions are stored as read, but counts that the
+// rest of the file can't hold are refused: whoever uses a size or a position compares it first.
 #pragma once
 
 #include "Runtime/Core/Containers/DynamicArray.h"

@@ -34,6 +34,7 @@ public:
     // Always true. A closed file answers false, and 0 for its size.
     bool Close() override;
 
+    // A read at the very end delivers 0 bytes and answers true; one beyond it answers false.
     bool Read(VFS::FileSize from, UInt64 size, void* out, UInt64* actual, FileReadFlags flags) override;
     bool Read(UInt64 size, void* out, UInt64* actual, FileReadFlags flags) override;
 
@@ -41,7 +42,7 @@ public:
     bool Write(VFS::FileSize from, UInt64 size, const void* in, UInt64* written) override;
     bool Write(UInt64 size, const void* in, UInt64* written) override;
 
-    // kFileOriginEnd counts backwards: 10 is 10 bytes before the end.
+    // kFileOriginEnd counts backwards: 10 is 10 bytes before the end. A target past the end is refused.
     bool Seek(VFS::FileOffset offset, FileOrigin origin) override;
     VFS::FileSize Position() const override;
 

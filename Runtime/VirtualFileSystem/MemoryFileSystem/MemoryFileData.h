@@ -10,7 +10,6 @@
 //   kept n times over      goes on; Lock: n + 1               waits                n - 1; at 0 the next one goes on
 #pragma once
 
-#include "Runtime/Core/Containers/DynamicArray.h"
 #include "Runtime/Core/SharedObject.h"
 #include "Runtime/VirtualFileSystem/VirtualFileSystemTypes.h"
 

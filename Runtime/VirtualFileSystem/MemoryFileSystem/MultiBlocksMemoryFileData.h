@@ -3,6 +3,7 @@
 // b % blockSize. Any thread.
 #pragma once
 
+#include "Runtime/Core/Containers/DynamicArray.h"
 #include "Runtime/Threads/Mutex.h"
 #include "Runtime/VirtualFileSystem/MemoryFileSystem/MemoryFileData.h"
 

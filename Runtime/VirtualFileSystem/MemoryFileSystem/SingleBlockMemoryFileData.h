@@ -5,6 +5,7 @@
 // Contents that wrap the caller's memory do not grow by writing: what does not fit is not stored. Any thread.
 #pragma once
 
+#include "Runtime/Core/Containers/DynamicArray.h"
 #include "Runtime/Threads/Mutex.h"
 #include "Runtime/VirtualFileSystem/MemoryFileSystem/MemoryFileData.h"
 

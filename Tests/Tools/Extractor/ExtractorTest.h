@@ -12,6 +12,7 @@
 #include <algorithm>
 #include <cstring>
 #include <random>
+#include <set>
 #include <sstream>
 
 namespace fs = std::filesystem;
@@ -100,6 +101,9 @@ inline ArchiveDescription Archive(const std::string& words, ArchiveDescription a
         if (name == "version") archive.version = static_cast<UInt32>(value);
         if (name == "levels") archive.levelCount = static_cast<UInt32>(value);
         if (name == "chunk") archive.chunkSize = value;
+        const std::set<std::string> options = {"section", "streamed", "endmark", "end", "padded"};
+        const bool isOption = layout != std::end(layouts) || kind != std::end(kinds) || options.contains(word);
+        EXPECT_TRUE(isOption || name != word) << word << " says nothing";
         if (name != word && name != "version" && name != "levels" && name != "chunk") archive.fields[name] = value;
     }
     return archive;
