@@ -1,7 +1,5 @@
 #include "Runtime/Utilities/RegisterRuntimeInitializeAndCleanup.h"
 
-#include "Runtime/Core/Containers/DynamicArray.h"
-
 #include <algorithm>
 #include <functional>
 
@@ -33,24 +31,29 @@ bool Registration::Sort(const Registration* a, const Registration* b) {
     return std::less<const Registration*>()(a, b); // < itself is not defined between unrelated objects
 }
 
-void Registration::ExecuteInitializations() {
-    dynamic_array<Registration*> registrations(kMemLabelGeneral);
+// In the order of start-up; empty when memory is refused.
+dynamic_array<Registration*> Registration::Collect(MemLabelId label) {
+    dynamic_array<Registration*> registrations(label);
+    size_t count = 0;
+    for (const Registration* each = s_LastRegistered; each != nullptr; each = each->older)
+        ++count;
+    registrations.reserve(count);
+    if (registrations.capacity() < count) return registrations;
     for (Registration* each = s_LastRegistered; each != nullptr; each = each->older)
         registrations.push_back(each);
     std::sort(registrations.begin(), registrations.end(), Sort);
+    return registrations;
+}
 
-    for (Registration* each : registrations) {
+void Registration::ExecuteInitializations() {
+    for (Registration* each : Collect(kMemLabelGeneral)) {
         if (each->init != nullptr && !each->initialized) each->init(each->userData);
         each->initialized = true;
     }
 }
 
 void Registration::ExecuteCleanup() {
-    dynamic_array<Registration*> registrations(kMemLabelTemporary);
-    for (Registration* each = s_LastRegistered; each != nullptr; each = each->older)
-        registrations.push_back(each);
-    std::sort(registrations.begin(), registrations.end(), Sort);
-
+    const dynamic_array<Registration*> registrations = Collect(kMemLabelTemporary);
     for (size_t index = registrations.size(); index-- > 0;) {
         Registration* each = registrations[index];
         if (each->cleanup != nullptr && each->initialized) each->cleanup(each->userData);

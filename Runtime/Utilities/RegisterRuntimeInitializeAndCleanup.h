@@ -9,6 +9,7 @@
 // Main thread only: there is no lock.
 #pragma once
 
+#include "Runtime/Core/Containers/DynamicArray.h"
 #include "Runtime/Core/NonCopyable.h"
 #include "Runtime/Core/Types.h"
 
@@ -25,13 +26,16 @@ public:
     // Whether a runs before b at start-up: by order, then by the objects' addresses.
     static bool Sort(const RegisterRuntimeInitializeAndCleanup* a, const RegisterRuntimeInitializeAndCleanup* b);
 
-    // Runs the init callbacks of those that are not initialized. A second call has no effect.
+    // Runs the init callbacks of those that are not initialized. A second call has no effect. Nothing runs when memory
+    // is refused, here and at the end.
     static void ExecuteInitializations();
 
     // Runs the cleanup callbacks of those that are initialized, in the reverse order. A second call has no effect.
     static void ExecuteCleanup();
 
 private:
+    static dynamic_array<RegisterRuntimeInitializeAndCleanup*> Collect(MemLabelId label);
+
     static RegisterRuntimeInitializeAndCleanup* s_LastRegistered; // the newest; null when there is none
 
     const SInt32 order;

@@ -1,5 +1,6 @@
 #include "Runtime/VirtualFileSystem/VirtualFileSystem.h"
 
+#include "Footing/Process.h"
 #include "Runtime/Allocator/Allocator.h"
 #include "Runtime/Threads/ReadWriteLock.h"
 #include "Runtime/Utilities/PathNameUtility.h"
@@ -11,13 +12,22 @@ using core::string_ref;
 
 constinit FileSystem* gFileSystem = nullptr;
 
+// What no path can be served without.
+template <typename T>
+static T* Require(T* object) {
+    if (object == nullptr) C99Api::Footing_Process_Abort(ZarvoClassic::Footing_ErrorCode_OutOfMemory);
+    return object;
+}
+
 FileSystem* GetFileSystem() {
-    if (gFileSystem == nullptr) gFileSystem = New<FileSystem>(kMemLabelFileSystem, kMemLabelFileSystem);
+    if (gFileSystem == nullptr) gFileSystem = Require(New<FileSystem>(kMemLabelFileSystem, kMemLabelFileSystem));
     return gFileSystem;
 }
 
 FileSystem::FileSystem(MemLabelId label)
-    : localHandler(CreateLocalFileSystem(label)), handlers(label), handlersLock(New<ReadWriteLock>(label)) {
+    : localHandler(Require(CreateLocalFileSystem(label))),
+      handlers(label),
+      handlersLock(Require(New<ReadWriteLock>(label))) {
     defaultHandler = localHandler;
 }
 
