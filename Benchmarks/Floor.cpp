@@ -14,6 +14,7 @@
 #include <fcntl.h>
 #include <lz4.h>
 #include <lzma/LzmaDec.h>
+#include <memory>
 #include <string>
 #include <string_view>
 #include <sys/stat.h>
@@ -88,9 +89,8 @@ public:
             largestStored = std::max(largestStored, block.storedSize);
         }
         // Not vectors: what is about to be overwritten need not be cleared.
-        m_Buffer = static_cast<char*>(malloc(kSlack + kPiece + 2 * largestBlock));
-        m_Stored = static_cast<char*>(malloc(largestStored));
-        Require(m_Buffer != nullptr && m_Stored != nullptr, "malloc");
+        m_Buffer = std::make_unique_for_overwrite<char[]>(kSlack + kPiece + 2 * largestBlock);
+        m_Stored = std::make_unique_for_overwrite<char[]>(largestStored);
         LzmaDec_Construct(&m_Lzma);
     }
 
@@ -100,12 +100,12 @@ public:
             const UInt64 unwanted = std::min(m_Filled, offset - m_Start);
             if (unwanted > kSlack) {
                 m_Filled -= unwanted;
-                memmove(m_Buffer, m_Buffer + unwanted, m_Filled);
+                memmove(m_Buffer.get(), m_Buffer.get() + unwanted, m_Filled);
                 m_Start += unwanted;
             }
             DecodeNext();
         }
-        return m_Buffer + (offset - m_Start);
+        return m_Buffer.get() + (offset - m_Start);
     }
 
 private:
@@ -121,9 +121,9 @@ private:
     void DecodeNext() {
         Require(m_NextBlock < m_Plan.blocks.size(), "the blocks end too early");
         const Block& block = m_Plan.blocks[m_NextBlock];
-        char* const to = m_Buffer + m_Filled;
+        char* const to = m_Buffer.get() + m_Filled;
         if (!IsDecodedInPieces(block)) {
-            ReadStored(m_Stored, block.storedSize);
+            ReadStored(m_Stored.get(), block.storedSize);
             DecodeWhole(block, to);
             m_Filled += block.size;
             ++m_NextBlock;
@@ -144,12 +144,12 @@ private:
 
     void DecodeWhole(const Block& block, char* to) {
         if (block.type != kCompressionLzma) {
-            const int size =
-                LZ4_decompress_safe(m_Stored, to, static_cast<int>(block.storedSize), static_cast<int>(block.size));
+            const int size = LZ4_decompress_safe(m_Stored.get(), to, static_cast<int>(block.storedSize),
+                                                 static_cast<int>(block.size));
             return Require(size == static_cast<int>(block.size), "LZ4_decompress_safe");
         }
         SizeT size = block.size, storedSize = block.storedSize - block.behind;
-        const Byte* const stored = reinterpret_cast<const Byte*>(m_Stored);
+        const Byte* const stored = reinterpret_cast<const Byte*>(m_Stored.get());
         ELzmaStatus status;
         const SRes result = LzmaDecode(reinterpret_cast<Byte*>(to), &size, stored + block.behind, &storedSize, stored,
                                        kLzmaPropertiesSize, LZMA_FINISH_ANY, &status, &m_Allocator);
@@ -158,9 +158,9 @@ private:
 
     // The next bytes of a stream of LZMA.
     void DecodePiece(const Block& block, char* to, UInt64 size) {
-        const Byte* const stored = reinterpret_cast<const Byte*>(m_Stored);
+        const Byte* const stored = reinterpret_cast<const Byte*>(m_Stored.get());
         if (m_Taken == 0) {
-            ReadStored(m_Stored, block.behind);
+            ReadStored(m_Stored.get(), block.behind);
             m_StoredLeft = block.storedSize - block.behind;
             Require(LzmaDec_Allocate(&m_Lzma, stored, kLzmaPropertiesSize, &m_Allocator) == SZ_OK, "LzmaDec_Allocate");
             LzmaDec_Init(&m_Lzma);
@@ -170,7 +170,7 @@ private:
                 m_Loaded = std::min(kPiece, m_StoredLeft);
                 m_Consumed = 0;
                 m_StoredLeft -= m_Loaded;
-                ReadStored(m_Stored, m_Loaded);
+                ReadStored(m_Stored.get(), m_Loaded);
             }
             SizeT produced = size, consumed = m_Loaded - m_Consumed;
             ELzmaStatus status;
@@ -190,8 +190,8 @@ private:
     UInt64 m_Taken = 0;     // of it, when it is decoded in pieces
     UInt64 m_Start = 0;     // in the data stream, of the buffer's first byte
     UInt64 m_Filled = 0;    // of the buffer
-    char* m_Buffer;         // until the program ends
-    char* m_Stored;         // one block's bytes, or a piece of them
+    std::unique_ptr<char[]> m_Buffer;
+    std::unique_ptr<char[]> m_Stored; // one block's bytes, or a piece of them
 
     ISzAlloc m_Allocator = {AllocateForDecoder, FreeForDecoder};
     CLzmaDec m_Lzma;

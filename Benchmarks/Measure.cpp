@@ -9,8 +9,7 @@
 #include <sys/resource.h>
 #include <sys/wait.h>
 #include <time.h>
-
-extern char** environ;
+#include <unistd.h>
 
 static double Seconds(const timeval& time) { return double(time.tv_sec) + double(time.tv_usec) / 1e6; }
 
