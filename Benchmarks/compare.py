@@ -161,8 +161,9 @@ def measure_in(parent, build, archives, tree, rows, rounds, is_memory):
     calls = {}
     with tempfile.TemporaryDirectory(prefix="varnex-bench-", dir=parent) as folder:
         place(archives, rows, folder)
+        files = sum(len(names) for _, _, names in os.walk(tree))
         spent = None
-        if not is_memory:
+        if not is_memory and os.statvfs(folder).f_favail > 2 * files * len(rows) * (rounds + 1):
             spent = f"{folder}/spent"
             os.mkdir(spent)
         for name, row in rows.items():

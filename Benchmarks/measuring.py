@@ -29,7 +29,7 @@ def discard(output, spent):
     """Frees what a command has made. With a folder for it, emptied files stay there: ext4 searches the inodes that were
     deleted in the last minutes for each file that it makes, which would be most of what is measured."""
     if spent is None:
-        shutil.rmtree(output)
+        shutil.rmtree(output, ignore_errors=True)
         return
     for parent, _, names in os.walk(output):
         for name in names:
@@ -43,9 +43,9 @@ def measure(build, row, folder, spent=None):
     output = prepare(row, folder)
     os.sync()
     words = run([f"{build}/Benchmarks/Measure", *row.command], cwd=folder).split()
-    discard(output, spent)
     if words[4] != "0":
         sys.exit(f"{' '.join(row.command)} ended with status {words[4]}")
+    discard(output, spent)
     return Sample(*map(float, words[:4]))
 
 
