@@ -67,7 +67,10 @@ bool LocalFileSystemOSX::CreateAsFile(FileEntryData& entry) {
 }
 
 bool LocalFileSystemOSX::MoveToTrash(FileEntryData& entry) {
-    if (!IsUtf8(entry.path)) return false;
+    if (!IsUtf8(entry.path)) {
+        entry.path[0] = '\0'; // nothing is what it resolves to
+        return false;
+    }
     NSURL* url = NSURL_URLByResolvingSymlinksInPath(NSURL_fileURLWithPath(MakeNSString(entry.path)));
     const core::basic_string_ref<char> resolved = NSURL_fileSystemRepresentation(url);
     strcpy_truncate(entry.path, resolved.data(), sizeof(entry.path), resolved.length());

@@ -1,6 +1,6 @@
-// The global operator new and delete of our own programs: blocks aligned to 16 bytes, null when memory is refused.
-// Linked into these programs only, so that a program that embeds the library keeps its own. Standard
-// containers can't go on from null; the runtime itself uses the labelled form alone.
+// A global operator new and delete: blocks aligned to 16 bytes, null when memory is refused.
+// Linked into the command, the tests and what makes archives for them, and not into the library, so that a program that
+// embeds it keeps its own. Standard containers can't go on from null; the runtime itself uses the labelled form alone.
 #include <cstdlib>
 #include <new>
 

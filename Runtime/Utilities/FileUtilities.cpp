@@ -18,7 +18,7 @@ bool CreateDirectory(string_ref path) {
     constexpr UInt32 kNewFolderFlags = 0x02;
 
     const core::string absolute = PathToAbsolutePath(path);
-    // Of other paths only refused memory leaves nothing.
+    // Of any other path on the local disk only refused memory leaves nothing.
     if (absolute.empty()) return path.empty() || path == "~";
     FileSystemEntry entry(absolute);
     FileEntryInfo info;

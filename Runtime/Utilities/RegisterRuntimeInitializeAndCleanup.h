@@ -26,8 +26,8 @@ public:
     // Whether a runs before b at start-up: by order, then by the objects' addresses.
     static bool Sort(const RegisterRuntimeInitializeAndCleanup* a, const RegisterRuntimeInitializeAndCleanup* b);
 
-    // Runs the init callbacks of those that are not initialized. A second call has no effect. Nothing runs when memory
-    // is refused, here and at the end.
+    // Runs the init callbacks of those that are not initialized, so that a second call has no effect. When memory is
+    // refused, nothing runs, nor does it at the end.
     static void ExecuteInitializations();
 
     // Runs the cleanup callbacks of those that are initialized, in the reverse order. A second call has no effect.

@@ -2,8 +2,8 @@
 // paths are relative to the process's working directory. Every call that a signal interrupts is repeated.
 //
 // lastError is recorded by Open, Read, Write, Close and CreateAsDir in the entry, by AtomicMove in from, and by
-// SynchronizeMode in the one whose call failed; by nothing else, but through these. Any thread: nothing here is shared
-// but the home folder, which does not change.
+// SynchronizeMode in the one whose call failed; other operations change it only by calling these. Any thread: nothing
+// here is shared but the home folder, which does not change.
 #pragma once
 
 #include "Runtime/VirtualFileSystem/LocalFileSystemHandler.h"

@@ -1,4 +1,5 @@
 // The POSIX back end's paths and listings: absolute paths, folders of the application and the user, enumeration.
+#include "Footing/Process.h"
 #include "Runtime/Utilities/FileUtilities.h"
 #include "Runtime/Utilities/PathNameUtility.h"
 #include "Runtime/VirtualFileSystem/LocalFileSystemPosix.h"
@@ -15,10 +16,13 @@
 using core::string_ref;
 
 LocalFileSystemPosix::LocalFileSystemPosix() : m_HomeFolder(kMemLabelPathString) {
-    if (const char* home = getenv("HOME"))
-        m_HomeFolder = home;
-    else if (const passwd* user = getpwuid(getuid()); user != nullptr && user->pw_dir != nullptr)
-        m_HomeFolder = user->pw_dir;
+    const char* home = getenv("HOME");
+    if (home == nullptr)
+        if (const passwd* user = getpwuid(getuid())) home = user->pw_dir;
+    if (home == nullptr) return;
+    m_HomeFolder = home;
+    // Without it "~/x" would be "/x".
+    if (!(m_HomeFolder == home)) C99Api::Footing_Process_Abort(ZarvoClassic::Footing_ErrorCode_OutOfMemory);
 }
 
 core::string LocalFileSystemPosix::ToAbsolute(string_ref path) const {
@@ -32,6 +36,7 @@ core::string LocalFileSystemPosix::ToAbsolute(string_ref path) const {
         return expanded;
     }
     core::string absolute(kMemLabelGeneral);
+    (void)GetFileSystem(); // which the folder belongs to
     AppendPathNameImpl(currentDirectory, path, '/', absolute);
     return absolute;
 }
@@ -72,8 +77,9 @@ core::string LocalFileSystemPosix::GetApplicationManagedPath() const {
 core::string LocalFileSystemPosix::GetUserConfigFolder() const {
     constexpr mode_t kConfigFolderMode = 0700;
     const char* home = getenv("HOME");
-    if (home == nullptr || home[0] == '\0') return core::string();
-    core::string folder = AppendPathName(core::string(home), ".config/zarvo3d");
+    const core::string homeFolder(home != nullptr ? home : "");
+    if (homeFolder.empty()) return homeFolder;
+    core::string folder = AppendPathName(homeFolder, ".config/zarvo3d");
     if (!IsDirectoryCreated(folder)) {
         printf_console("Creating user config folder: %s\n", folder.c_str());
         // Without ".config" there is none, and whoever writes there sees it.
@@ -201,7 +207,8 @@ bool LocalFileSystemPosix::Enumerate(const char* path, dynamic_block_array<FileE
     if (!folder.IsOpen()) return false;
 
     core::string working(kMemLabelGeneral);
-    // All at once: where memory is refused later, half a path would be listed.
+    // All at once: where memory is refused later, half a path would be listed. Of a recursion, each folder takes its
+    // own.
     if (working.grow(strlen(path) + 1 + kMaxNameLength) == nullptr) return false;
     working = path;
     if (working.back() != '/') working += '/';

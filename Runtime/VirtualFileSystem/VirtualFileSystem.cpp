@@ -153,10 +153,8 @@ FileAccessor::~FileAccessor() {
 }
 
 bool FileAccessor::Open(FileSystemEntry& target, FilePermission permission, FileAutoBehavior behavior) {
-    if (&target != &entry) {
-        Unbind(entry);
-        CopyBinding(entry, target);
-    }
+    Unbind(entry);
+    CopyBinding(entry, target);
     entry.handlerState = nullptr;
     opened = true;
     openSucceeded = entry.accessorHandler != nullptr && entry.accessorHandler->Open(entry, permission, behavior);

@@ -119,7 +119,7 @@ basic_string<T, Storage> operator+(const basic_string<T, Storage>& lhs, const T*
     const basic_string_ref<T> right(rhs);
     basic_string<T, Storage> sum(lhs.get_memory_label());
     const size_t total = lhs.size() + right.size();
-    if (total >= Storage::kInlineCapacity) sum.grow(total);
+    if (total >= Storage::kInlineCapacity && sum.grow(total) == nullptr) return sum; // half of it would be another text
     sum.assign(lhs);
     sum.append(right);
     return sum;

@@ -289,7 +289,7 @@ TEST_F(LocalFileSystemOSXTest, TrashTakesWhatThePathLeadsTo) {
     EXPECT_EQ(
         Try("trash", "a/name b/name folder link none lost way out \xFF"),
         "a/name=/a/name b/name=/b/name folder=/folder link=/target !none=/none !lost=/none !way=/x\\y !out=/p/\xFF "
-        "!\xFF ");
+        "!\xFF= ");
     EXPECT_EQ(List(".Trash"), "true .Trash/folder:0:1 .Trash/name 2:6:0 .Trash/name:6:0 .Trash/target:6:0");
     gStandinFaults.trashRefuses = true; // what is still there then is deleted
     EXPECT_EQ(Try("trash", "b link /proc/version"), "b=/b !link=/target !/proc/version ") << "the last for nobody";
