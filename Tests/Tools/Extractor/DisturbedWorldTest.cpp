@@ -57,7 +57,11 @@ TEST_F(DisturbedWorld, AnyCallMayFailOrFallShortOrFindTheArchiveCutOrGone) {
 // A folder that is there already, though nobody knows, and a disk that is found to be full when a file is closed.
 TEST_F(DisturbedWorld, AFolderThatCantBeMadeOrAFileThatCantBeClosedIsAFailure) {
     struct NoFolders : FaultyFileSystem {
-        bool CreateAsDir(FileEntryData&) override { return false; }
+        bool CreateAsDir(FileEntryData& entry) override { // a file has come there meanwhile
+            entry.lastError = kFileSystemErrorAlreadyExists;
+            return false;
+        }
+        bool IsDir(const FileEntryData&) const override { return false; }
         FileEntryInfoQueryFlags GetFileEntryInfo(const FileEntryData&, FileEntryInfo&,
                                                  FileEntryInfoQueryFlags) const override {
             return kFileEntryQueryNone;
