@@ -49,7 +49,7 @@ def measure(build, row, folder, spent=None):
     return Sample(*map(float, words[:4]))
 
 
-def verify(row, folder, tree, spent=None):
+def verify(row, folder, tree, spent):
     output = prepare(row, folder)
     run(row.command, cwd=folder)
     run(["diff", "-rq", "--no-dereference", tree, output])

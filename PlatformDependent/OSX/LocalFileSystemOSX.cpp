@@ -34,7 +34,7 @@ bool GetPlatformStatus(const FileEntryData& entry, PlatformStatus* status) {
     return RepeatOnInterrupt([&] { return PlatformStat(entry.path, status); }) == 0;
 }
 
-// What is not is no text for the platform, which takes an empty one for it.
+// Whether the platform has a text for it; where it has none, it is handed the empty one.
 bool IsUtf8(const char* path) { return NSString_stringWithUTF8String(path) != nullptr; }
 
 } // namespace
@@ -67,10 +67,6 @@ bool LocalFileSystemOSX::CreateAsFile(FileEntryData& entry) {
 }
 
 bool LocalFileSystemOSX::MoveToTrash(FileEntryData& entry) {
-    if (!IsUtf8(entry.path)) {
-        entry.path[0] = '\0'; // nothing is what it resolves to
-        return false;
-    }
     NSURL* url = NSURL_URLByResolvingSymlinksInPath(NSURL_fileURLWithPath(MakeNSString(entry.path)));
     const core::basic_string_ref<char> resolved = NSURL_fileSystemRepresentation(url);
     strcpy_truncate(entry.path, resolved.data(), sizeof(entry.path), resolved.length());
@@ -86,9 +82,9 @@ bool LocalFileSystemOSX::MoveToTrash(FileEntryData& entry) {
     (void)NSWorkspace_performFileOperation(Platform_RecycleOperation(), MakeNSString(DeleteLastPathNameComponent(path)),
                                            MakeNSString(""),
                                            NSArray_arrayWithObject(MakeNSString(GetLastPathNameComponent(path))), &tag);
-    FileSystemEntry gone(path);
-    if (gone.Exists()) (void)DeleteFileOrDirectory(path); // the test below tells
-    return !gone.Exists();
+    const FileSystemEntry thing(path);
+    if (thing.Exists()) (void)DeleteFileOrDirectory(path); // the test below tells
+    return !thing.Exists();
 }
 
 bool LocalFileSystemOSX::Target(const FileEntryData& entry, FileSystemEntry& target) const {

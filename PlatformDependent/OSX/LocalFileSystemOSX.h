@@ -27,8 +27,7 @@ public:
 
     // Of a link, what it leads to goes to the trash. The entry's path becomes the resolved one, also on failure; when
     // that is longer than an entry holds it is cut and nothing is thrown away, nor is what is not valid UTF-8, has a
-    // backslash, or is "/".
-    // What the trash does not take is deleted. True when the path is gone.
+    // backslash, or is "/". What the trash does not take is deleted. True when the path is gone.
     bool MoveToTrash(FileEntryData& entry) override;
 
     // Always true: the target need not exist. A path that is longer than an entry holds is cut.

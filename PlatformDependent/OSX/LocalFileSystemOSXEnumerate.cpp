@@ -194,10 +194,11 @@ public:
 
     // A folder that can't be opened, or is listed already further up, adds nothing and is no failure.
     bool Enumerate_Internal(const core::basic_string<char>& path, const OpenFolder* parent) {
-        core::basic_string<char> working(path, kMemLabelGeneral);
-        working.reserve(kReservedPathLength);
+        core::basic_string<char> working(kMemLabelGeneral);
+        // Where memory is refused later, half a path would be listed.
+        if (working.grow(std::max(path.length() + 1, kReservedPathLength)) == nullptr) return false;
+        working = path;
         if (working.empty() || working.back() != '/') working.push_back('/');
-        if (working.length() < path.length() || working.back() != '/') return false; // memory was refused
 
         const Descriptor descriptor(PlatformOpen(path.c_str(), O_RDONLY, 0));
         if (descriptor.Get() < 1) return true; // 0, the number of standard input, is not listed from either

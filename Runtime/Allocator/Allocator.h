@@ -1,6 +1,6 @@
 // Allocation with a memory label. Every block is aligned to 16 bytes at least, all labels share one heap, and label,
 // options and source position change nothing about where a block comes from. A refused request gives null: nothing
-// here throws, and only what serves standard containers ends the program. Any thread.
+// here throws, and only RequireMemory ends the program. Any thread.
 //
 //   Thing* thing = New<Thing>(label, constructorArguments...);   // null when memory is refused
 //   Delete(thing, label);
@@ -58,6 +58,13 @@ void Delete(T* object, MemLabelHere here) {
     free_alloc_internal(object, here.label, here.where.file, here.where.line);
 }
 
+// For what can't go on without it: the pointer, or the end of the program when memory was refused.
+template <typename T>
+T* RequireMemory(T* pointer) {
+    if (pointer == nullptr) C99Api::Footing_Process_Abort(ZarvoClassic::Footing_ErrorCode_OutOfMemory);
+    return pointer;
+}
+
 // For standard containers: allocates under the label and alignment of its template arguments. Memory that is refused
 // ends the program, as a standard container can't go on without it.
 template <typename T, MemLabelIdentifier label, int align>
@@ -73,9 +80,8 @@ struct stl_allocator {
     stl_allocator(const stl_allocator<U, label, align>&) {}
 
     T* allocate(size_t count) {
-        void* memory = malloc_internal(count * sizeof(T), align, label, kAllocateOptionNone, __FILE__, __LINE__);
-        if (memory == nullptr) C99Api::Footing_Process_Abort(ZarvoClassic::Footing_ErrorCode_OutOfMemory);
-        return static_cast<T*>(memory);
+        return static_cast<T*>(
+            RequireMemory(malloc_internal(count * sizeof(T), align, label, kAllocateOptionNone, __FILE__, __LINE__)));
     }
     void deallocate(T* pointer, size_t) { free_alloc_internal(pointer, label, __FILE__, __LINE__); }
 

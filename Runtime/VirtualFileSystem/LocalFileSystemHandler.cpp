@@ -36,8 +36,6 @@ int LocalFileSystemHandler::LastError() { return 0; }
 
 core::string LocalFileSystemHandler::SetCurrentDirectory(string_ref path) {
     core::string previous(currentDirectory, kMemLabelGeneral);
-    char given[kPathBufferSize]; // the path may be the buffer itself
-    const size_t length = strcpy_truncate(given, path.data(), sizeof(given), path.size());
-    strcpy_truncate(currentDirectory, given, sizeof(currentDirectory), length);
+    strcpy_truncate(currentDirectory, path.data(), sizeof(currentDirectory), path.size());
     return previous;
 }

@@ -22,7 +22,7 @@ LocalFileSystemPosix::LocalFileSystemPosix() : m_HomeFolder(kMemLabelPathString)
     if (home == nullptr) return;
     m_HomeFolder = home;
     // Without it "~/x" would be "/x".
-    if (!(m_HomeFolder == home)) C99Api::Footing_Process_Abort(ZarvoClassic::Footing_ErrorCode_OutOfMemory);
+    if (m_HomeFolder != home) C99Api::Footing_Process_Abort(ZarvoClassic::Footing_ErrorCode_OutOfMemory);
 }
 
 core::string LocalFileSystemPosix::ToAbsolute(string_ref path) const {

@@ -1,6 +1,5 @@
 #include "Runtime/VirtualFileSystem/VirtualFileSystem.h"
 
-#include "Footing/Process.h"
 #include "Runtime/Allocator/Allocator.h"
 #include "Runtime/Threads/ReadWriteLock.h"
 #include "Runtime/Utilities/PathNameUtility.h"
@@ -12,22 +11,15 @@ using core::string_ref;
 
 constinit FileSystem* gFileSystem = nullptr;
 
-// What no path can be served without.
-template <typename T>
-static T* Require(T* object) {
-    if (object == nullptr) C99Api::Footing_Process_Abort(ZarvoClassic::Footing_ErrorCode_OutOfMemory);
-    return object;
-}
-
 FileSystem* GetFileSystem() {
-    if (gFileSystem == nullptr) gFileSystem = Require(New<FileSystem>(kMemLabelFileSystem, kMemLabelFileSystem));
+    if (gFileSystem == nullptr) gFileSystem = RequireMemory(New<FileSystem>(kMemLabelFileSystem, kMemLabelFileSystem));
     return gFileSystem;
 }
 
 FileSystem::FileSystem(MemLabelId label)
-    : localHandler(Require(CreateLocalFileSystem(label))),
+    : localHandler(RequireMemory(CreateLocalFileSystem(label))),
       handlers(label),
-      handlersLock(Require(New<ReadWriteLock>(label))) {
+      handlersLock(RequireMemory(New<ReadWriteLock>(label))) {
     defaultHandler = localHandler;
 }
 

@@ -37,8 +37,7 @@ public:
     // Makes room for newSize elements; the size stays.
     void grow(size_t newSize) {
         while (newSize > m_Blocks.size() * BlockSize) {
-            Block* block = New<Block>(m_Label, m_Label);
-            if (block == nullptr) C99Api::Footing_Process_Abort(ZarvoClassic::Footing_ErrorCode_OutOfMemory);
+            Block* block = RequireMemory(New<Block>(m_Label, m_Label));
             m_Blocks.push_back(block);
             block->reserve(BlockSize);
         }

@@ -87,7 +87,7 @@ template class basic_string_ref<char>;
 size_t strcpy_truncate(char* dst, const char* src, size_t dstSize, size_t srcLen) {
     if (dstSize == 0) return 0;
     const size_t count = std::min(srcLen, dstSize - 1);
-    if (count != 0) memcpy(dst, src, count);
+    if (count != 0) memmove(dst, src, count);
     dst[count] = '\0';
     return count;
 }

@@ -80,6 +80,6 @@ extern template class basic_string_ref<char>;
 
 } // namespace core
 
-// Copies what fits of the srcLen characters at src, writes a NUL behind them and returns how many were copied. A
-// dstSize of 0 writes nothing at all.
+// Copies what fits of the srcLen characters at src, which may be a part of dst, writes a NUL behind them and returns
+// how many were copied. A dstSize of 0 writes nothing at all.
 size_t strcpy_truncate(char* dst, const char* src, size_t dstSize, size_t srcLen);

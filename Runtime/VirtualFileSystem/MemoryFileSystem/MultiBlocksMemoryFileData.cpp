@@ -70,16 +70,13 @@ UInt64 MultiBlocksMemoryFileData::Write(VFS::FileSize position, UInt64 size, con
     UInt64 offset = from % blockSize;
     for (UInt64 slot = from / blockSize; done < size; ++slot) {
         UInt8* const block = GetOrMakeBlock(slot);
-        if (block == nullptr) {
-            if (done == 0) return 0;
-            break;
-        }
+        if (block == nullptr) break;
         const UInt64 count = std::min(size - done, blockSize - offset);
         memcpy(block + offset, bytes + done, count);
         done += count;
         offset = 0;
     }
-    length = std::max(length, from + done);
+    if (done != 0 || size == 0) length = std::max(length, from + done);
     return done;
 }
 

@@ -57,9 +57,9 @@ TEST_F(DisturbedWorld, AnyCallMayFailOrFallShortOrFindTheArchiveCutOrGone) {
 // A folder that is there already, though nobody knows, and a disk that is found to be full when a file is closed.
 TEST_F(DisturbedWorld, AFolderThatCantBeMadeOrAFileThatCantBeClosedIsAFailure) {
     struct NoFolders : FaultyFileSystem {
-        bool CreateAsDir(FileEntryData& entry) override { // a file has come there meanwhile
-            entry.lastError = kFileSystemErrorAlreadyExists;
-            return false;
+        // A file has come there meanwhile.
+        bool CreateAsDir(FileEntryData& entry) override {
+            return entry.lastError = kFileSystemErrorAlreadyExists, false;
         }
         bool IsDir(const FileEntryData&) const override { return false; }
         FileEntryInfoQueryFlags GetFileEntryInfo(const FileEntryData&, FileEntryInfo&,

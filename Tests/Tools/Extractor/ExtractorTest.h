@@ -12,7 +12,6 @@
 #include <algorithm>
 #include <cstring>
 #include <random>
-#include <set>
 #include <sstream>
 
 namespace fs = std::filesystem;
@@ -84,6 +83,8 @@ inline std::vector<ArchiveEntry> Entries(const std::string& words) {
 // field.
 inline ArchiveDescription Archive(const std::string& words, ArchiveDescription archive = {}) {
     const std::string layouts[] = {"fs", "web6", "web", "raw", "old"}, kinds[] = {"stored", "lzma", "lz4", "lz4hc"};
+    const std::string options[] = {"streamed", "endmark", "end", "padded"};
+    bool* const set[] = {&archive.streamed, &archive.lzma.endMark, &archive.sectionAtEnd, &archive.sectionPadded};
     archive.entries = Entries(words);
     std::istringstream stream(words);
     for (std::string word; stream >> word;) {
@@ -91,19 +92,17 @@ inline ArchiveDescription Archive(const std::string& words, ArchiveDescription a
         const std::string name = word.substr(0, word.find('='));
         const UInt64 value = name == word ? 0 : std::stoull(word.substr(name.size() + 1), nullptr, 0);
         const auto layout = std::find(layouts, std::end(layouts), word), kind = std::find(kinds, std::end(kinds), word);
-        if (layout != std::end(layouts)) archive.layout = static_cast<ArchiveLayout>(layout - layouts);
-        if (kind != std::end(kinds)) archive.type = static_cast<CompressionType>(kind - kinds);
+        const auto option = std::find(options, std::end(options), word);
+        const bool isLayout = layout != std::end(layouts), isKind = kind != std::end(kinds);
+        if (isLayout) archive.layout = static_cast<ArchiveLayout>(layout - layouts);
+        if (isKind) archive.type = static_cast<CompressionType>(kind - kinds);
         if (word == "section") archive.sectionType = archive.type;
-        if (word == "streamed") archive.streamed = true;
-        if (word == "endmark") archive.lzma.endMark = true;
-        if (word == "end") archive.sectionAtEnd = true;
-        if (word == "padded") archive.sectionPadded = true;
+        if (option != std::end(options)) *set[option - options] = true;
         if (name == "version") archive.version = static_cast<UInt32>(value);
         if (name == "levels") archive.levelCount = static_cast<UInt32>(value);
         if (name == "chunk") archive.chunkSize = value;
-        const std::set<std::string> options = {"section", "streamed", "endmark", "end", "padded"};
-        const bool isOption = layout != std::end(layouts) || kind != std::end(kinds) || options.contains(word);
-        EXPECT_TRUE(isOption || name != word) << word << " says nothing";
+        const bool isOption = option != std::end(options) || word == "section" || name != word;
+        EXPECT_TRUE(isLayout || isKind || isOption) << word;
         if (name != word && name != "version" && name != "levels" && name != "chunk") archive.fields[name] = value;
     }
     return archive;

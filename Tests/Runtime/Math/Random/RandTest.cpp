@@ -20,7 +20,8 @@ TEST(Rand, StateIsTheEntropyOrTheHashOfABlockOfThisProcess) {
 
 TEST(SystemEntropy, OneReadOfTheFirstDeviceThatOpensMustFillTheBuffer) {
     UInt8 bytes[17] = "................";
-    const char* const shortDevice = "/proc/self/comm"; // ten bytes
-    EXPECT_FALSE(ReadEntropyDevice("-", "-", bytes, 16) || ReadEntropyDevice(shortDevice, "/dev/zero", bytes, 16));
+    // The second holds ten bytes.
+    EXPECT_FALSE(ReadEntropyDevice("-", "-", bytes, 16) ||
+                 ReadEntropyDevice("/proc/self/comm", "/dev/zero", bytes, 16));
     EXPECT_TRUE(bytes[15] == '.' && ReadEntropyDevice("-", "/dev/zero", bytes, 16) && bytes[15] == 0);
 }
