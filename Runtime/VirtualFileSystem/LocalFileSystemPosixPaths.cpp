@@ -78,7 +78,7 @@ core::string LocalFileSystemPosix::GetUserConfigFolder() const {
     constexpr mode_t kConfigFolderMode = 0700;
     const char* home = getenv("HOME");
     const core::string homeFolder(home != nullptr ? home : "");
-    if (homeFolder.empty()) return homeFolder;
+    if (homeFolder.empty()) return core::string();
     core::string folder = AppendPathName(homeFolder, ".config/zarvo3d");
     if (!IsDirectoryCreated(folder)) {
         printf_console("Creating user config folder: %s\n", folder.c_str());
