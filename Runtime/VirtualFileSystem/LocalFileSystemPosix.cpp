@@ -25,23 +25,9 @@ FileSystemError FileSystemErrorFromErrno(int error) {
     }
 }
 
-namespace {
-
-constexpr SInt64 kUnknownPosition = -1;
-
-// What an open entry's handlerState points to.
-struct OpenFile {
-    int descriptor;
-    SInt64 position; // the descriptor's, so that a seek to where it is costs no call
-};
-
-OpenFile* GetOpenFile(const FileEntryData& entry) { return static_cast<OpenFile*>(entry.handlerState); }
-
-} // namespace
-
 int GetDescriptor(const FileEntryData& entry) {
-    const OpenFile* const file = GetOpenFile(entry);
-    return file != nullptr ? file->descriptor : kNoDescriptor;
+    const int* const cell = static_cast<const int*>(entry.handlerState);
+    return cell != nullptr ? *cell : kNoDescriptor;
 }
 
 static int GetOpenFlags(FilePermission permission) {
@@ -62,8 +48,8 @@ bool LocalFileSystemPosix::Open(FileEntryData& entry, FilePermission permission,
     if (descriptor != kNoDescriptor && permission == kFilePermissionAppend)
         (void)RepeatOnInterrupt([&] { return lseek(descriptor, 0, SEEK_END); });
 
-    void* cell = malloc_internal(sizeof(OpenFile), alignof(OpenFile), kMemLabelFileSystem, kAllocateOptionNone,
-                                 __FILE__, __LINE__);
+    void* cell =
+        malloc_internal(sizeof(int), alignof(int), kMemLabelFileSystem, kAllocateOptionNone, __FILE__, __LINE__);
     entry.handler = this;
     entry.accessorHandler = this;
     entry.handlerState = cell;
@@ -72,7 +58,7 @@ bool LocalFileSystemPosix::Open(FileEntryData& entry, FilePermission permission,
         entry.lastError = kFileSystemErrorUnknown;
         return false;
     }
-    new (cell) OpenFile{descriptor, kUnknownPosition};
+    new (cell) int(descriptor);
     entry.lastError = FileSystemErrorFromErrno(error);
     return descriptor != kNoDescriptor;
 }
@@ -86,9 +72,6 @@ bool LocalFileSystemPosix::Read(FileEntryData& entry, UInt64 size, void* buffer,
     const int descriptor = GetDescriptor(entry);
     if (descriptor == kNoDescriptor) return false;
     const ssize_t count = RepeatOnInterrupt([&] { return read(descriptor, buffer, size); });
-    SInt64& position = GetOpenFile(entry)->position;
-    if (count < 0) position = kUnknownPosition;
-    if (position != kUnknownPosition) position += count;
     *actual = count > 0 ? static_cast<UInt64>(count) : 0;
     if (count < 0) entry.lastError = FileSystemErrorFromErrno(errno);
     return count > 0;
@@ -103,7 +86,6 @@ bool LocalFileSystemPosix::Write(FileEntryData& entry, UInt64 size, const void* 
     constexpr UInt64 kMaxPieceSize = 0x7FFFFFFF; // one call takes no more
     const int descriptor = GetDescriptor(entry);
     if (descriptor == kNoDescriptor) return false;
-    GetOpenFile(entry)->position = kUnknownPosition;
     const char* from = static_cast<const char*>(buffer);
     UInt64 total = 0;
     for (bool isLast = false; !isLast;) {
@@ -147,10 +129,7 @@ bool LocalFileSystemPosix::Seek(FileEntryData& entry, VFS::FileOffset offset, Fi
     if (descriptor == kNoDescriptor) return false;
     const int base = GetSeekBase(origin);
     const SInt64 distance = offset.Cast<SInt64>();
-    SInt64& position = GetOpenFile(entry)->position;
-    if (base == SEEK_SET && distance == position && position != kUnknownPosition) return true;
-    position = RepeatOnInterrupt([&] { return lseek(descriptor, distance, base); });
-    return position >= 0;
+    return RepeatOnInterrupt([&] { return lseek(descriptor, distance, base); }) >= 0;
 }
 
 VFS::FileSize LocalFileSystemPosix::Position(const FileEntryData& entry) const {

@@ -15,9 +15,8 @@ public:
     // Learns the home folder: "HOME", or else what the password database says of the real user.
     LocalFileSystemPosix();
 
-    // Contents. An open entry's handlerState is a heap cell that starts with the descriptor (-1 after a failed open),
-    // whose position nobody else may move: a seek to where it is makes no call. Open does not close what the entry had
-    // open before.
+    // Contents. An open entry's handlerState is a heap cell of one int: the descriptor, -1 after a failed open. The
+    // position is the descriptor's own. Open does not close what the entry had open before.
     bool Open(FileEntryData& entry, FilePermission permission, FileAutoBehavior behavior) override;
     bool Read(FileEntryData& entry, VFS::FileSize position, UInt64 size, void* buffer, UInt64* actual,
               FileReadFlags flags) override;

@@ -2,6 +2,7 @@
 #include "Tests/Runtime/VirtualFileSystem/LocalDiskTest.h"
 #include "Tests/Support/ReportRecorder.h"
 
+#include <functional>
 #include <map>
 
 class LocalFileSystemPosixTest : public LocalDiskTest {
@@ -66,6 +67,35 @@ TEST_F(LocalFileSystemPosixTest, ReadsAndSeeksGoWhereTheySay) {
     ASSERT_TRUE(local.Read(entry, 8, 2, buffer, &count, kFileReadFlagsNone));
     EXPECT_EQ("X9", std::string(buffer, count));
     EXPECT_TRUE(local.Close(entry));
+}
+
+TEST_F(LocalFileSystemPosixTest, AReadGoesToItsPositionWhoeverMovesTheFile) {
+    Run("printf 0123456789 > file");
+    char buffer[2] = {};
+    UInt64 count = 0;
+    const auto readDescriptor = [&](FileSystemEntry& entry) { return read(GetDescriptor(entry), buffer, 2) == 2; };
+    const auto readInFork = [&](FileSystemEntry& entry) {
+        return IsTrueForAnybody([&] { return local.Read(entry, 2, buffer, &count, kFileReadFlagsNone); });
+    };
+    struct Case {
+        const char* mover;
+        std::function<bool(FileSystemEntry&)> move;
+    };
+    const Case kCases[] = {
+        {.mover = "nobody", .move = [](FileSystemEntry&) { return true; }},
+        {.mover = "a read of the descriptor", .move = readDescriptor},
+        {.mover = "a read in a fork", .move = readInFork},
+    };
+    for (const Case& c : kCases) {
+        SCOPED_TRACE(c.mover);
+        FileSystemEntry entry = Entry("file");
+        ASSERT_TRUE(Open(entry, 0));
+        EXPECT_TRUE(local.Read(entry, 0, 2, buffer, &count, kFileReadFlagsNone));
+        EXPECT_TRUE(c.move(entry));
+        EXPECT_TRUE(local.Read(entry, 2, 2, buffer, &count, kFileReadFlagsNone));
+        EXPECT_EQ(std::string(buffer, count), "23");
+        EXPECT_TRUE(local.Close(entry));
+    }
 }
 
 TEST_F(LocalFileSystemPosixTest, FailuresOfTheSystemAreRecordedAndInterruptedCallsRepeated) {
