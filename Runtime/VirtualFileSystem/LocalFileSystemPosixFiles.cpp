@@ -217,7 +217,7 @@ bool LocalFileSystemPosix::Copy(FileEntryData& from, FileEntryData& to) {
     if (!source.Open(sourceEntry, kFilePermissionRead)) return false;
     if (!target.Open(to.path, kFilePermissionWrite)) return false;
 
-    const UInt64 size = sourceEntry.accessorHandler->Size(sourceEntry).Cast<UInt64>();
+    const UInt64 size = source.Size().Cast<UInt64>();
     dynamic_array<UInt8> buffer(kMemLabelGeneral);
     buffer.resize_uninitialized(static_cast<size_t>(std::min(size, kTransferSize)), kResizeExact);
     UInt64 total = 0;

@@ -179,6 +179,10 @@ VFS::FileSize FileAccessor::Position() const {
     return entry.accessorHandler != nullptr ? entry.accessorHandler->Position(entry) : VFS::FileSize();
 }
 
+VFS::FileSize FileAccessor::Size() const {
+    return entry.accessorHandler != nullptr ? entry.accessorHandler->Size(entry) : VFS::FileSize();
+}
+
 bool FileAccessor::Close() {
     if (!opened) return true;
     openSucceeded = false;

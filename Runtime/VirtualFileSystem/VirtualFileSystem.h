@@ -103,6 +103,7 @@ public:
 
     bool Seek(VFS::FileOffset offset, FileOrigin origin);
     VFS::FileSize Position() const;
+    VFS::FileSize Size() const;
 
     // True when nothing was open.
     bool Close();

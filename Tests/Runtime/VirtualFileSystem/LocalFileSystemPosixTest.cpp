@@ -208,6 +208,21 @@ TEST_F(LocalFileSystemPosixTest, CopiesAreWholeAndMovesAreRenames) {
     EXPECT_FALSE(local.SynchronizeMode(to, missing) || missing.lastError != 1);
 }
 
+TEST_F(LocalFileSystemPosixTest, ACopyAsksTheOpenFileForItsSize) {
+    struct OpenFilesOnly : LocalFileSystemPosix {
+        OpenFilesOnly() { GetFileSystem()->RegisterHandler(this); }
+        ~OpenFilesOnly() override { GetFileSystem()->UnregisterHandler(this); }
+        VFS::FileSize Size(const FileEntryData& entry) const override {
+            return entry.handlerState != nullptr ? LocalFileSystemPosix::Size(entry) : VFS::FileSize();
+        }
+    } handler;
+    Run("printf data > from");
+    FileSystemEntry from = Entry("from");
+    FileSystemEntry to = Entry("to");
+    EXPECT_TRUE(handler.Copy(from, to));
+    EXPECT_EQ(ReadFile(to.path), "data");
+}
+
 TEST_F(LocalFileSystemPosixTest, PathsAreTakenApartAndResolved) {
     FileEntryData entry; // an entry that is set has no backslashes
     core::string parent("none");
