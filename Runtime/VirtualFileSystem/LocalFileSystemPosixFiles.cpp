@@ -9,9 +9,12 @@
 #include <cstdio>
 #include <cstdlib>
 #include <cstring>
+#include <optional>
 #include <sys/file.h>
 #include <unistd.h>
 #include <utime.h>
+
+using core::string_ref;
 
 constexpr mode_t kAllWriteBits = S_IWUSR | S_IWGRP | S_IWOTH;
 constexpr mode_t kModeBits = 07777;
@@ -107,16 +110,37 @@ static bool IsSameFile(const char* a, const char* b) {
            statusA.st_ino == statusB.st_ino;
 }
 
-// Whether a listed path names something in the folder, also after an entry has taken it over: a listing may write the
-// folder's path in another way or cut it, and an entry takes a backslash for a separator, so that the name "..\x"
+namespace {
+
+// Tells whether a listed path names something in the folder, also after an entry has taken it over: a listing may write
+// the folder's path in another way or cut it, and an entry takes a backslash for a separator, so that the name "..\x"
 // would lead out.
-static bool NamesChildOf(const char* folder, const char* path) {
-    const char* const separator = strrchr(path, '/');
-    const char* const name = separator != nullptr ? separator + 1 : path;
-    if (*name == '\0' || strchr(name, '\\') != nullptr) return false;
-    const core::string parent(core::string_ref(path, static_cast<size_t>(name - path)), kMemLabelGeneral);
-    return IsSameFile(parent.empty() ? "." : parent.c_str(), folder);
-}
+class ChildTest {
+public:
+    explicit ChildTest(const char* folder) : m_Folder(folder) {}
+
+    // path must stay as it is until the next call.
+    bool IsChild(string_ref path) {
+        const size_t nameStart = path.rfind('/') + 1; // 0 without a "/"
+        const string_ref name = path.substr(nameStart);
+        const string_ref parent = path.substr(0, nameStart);
+        if (name.empty() || name.find('\\') != string_ref::npos) return false;
+        // A listing writes the same parent for all that it lists: the disk is asked once.
+        if (m_Parent != parent) {
+            m_Parent = parent;
+            m_IsParentFolder =
+                IsSameFile(parent.empty() ? "." : core::string(parent, kMemLabelGeneral).c_str(), m_Folder);
+        }
+        return m_IsParentFolder;
+    }
+
+private:
+    const char* m_Folder;
+    std::optional<string_ref> m_Parent; // the one that was compared last
+    bool m_IsParentFolder = false;
+};
+
+} // namespace
 
 bool LocalFileSystemPosix::Delete(FileEntryData& entry, bool recursive) {
     if (!IsDir(entry)) return RepeatOnInterrupt([&] { return unlink(entry.path); }) == 0;
@@ -124,15 +148,16 @@ bool LocalFileSystemPosix::Delete(FileEntryData& entry, bool recursive) {
     size_t length = strlen(entry.path);
     while (length > 1 && entry.path[length - 1] == '/')
         --length;
-    const FileSystemEntry bare(core::string_ref(entry.path, length));
+    const FileSystemEntry bare(string_ref(entry.path, length));
     if (IsSymLink(bare)) return RepeatOnInterrupt([&] { return unlink(bare.path); }) == 0;
     if (recursive) {
         dynamic_block_array<FileEntryInfo, 32> children(kMemLabelFileList);
         (void)Enumerate(entry.path, &children, false, nullptr, kFileEnumerationAll); // rmdir tells what is left
+        ChildTest test(entry.path);
         for (size_t index = 0; index < children.size(); ++index) {
-            const char* const path = children[index].path;
-            if (!NamesChildOf(entry.path, path)) continue;
-            FileSystemEntry child{core::string_ref(path)};
+            const string_ref path(children[index].path);
+            if (!test.IsChild(path)) continue;
+            FileSystemEntry child(path);
             (void)child.handler->Delete(child, true); // rmdir tells what is left
         }
     }
@@ -211,7 +236,7 @@ bool LocalFileSystemPosix::Copy(FileEntryData& from, FileEntryData& to) {
     constexpr UInt64 kTransferSize = 65'536;
     // Opened to write, the file would be emptied before it is read.
     if (IsSameFile(from.path, to.path)) return false;
-    FileSystemEntry sourceEntry{core::string_ref(from.path)};
+    FileSystemEntry sourceEntry{string_ref(from.path)};
     FileAccessor source;
     FileAccessor target;
     if (!source.Open(sourceEntry, kFilePermissionRead)) return false;

@@ -2,8 +2,16 @@
 #include "Tests/Runtime/VirtualFileSystem/LocalDiskTest.h"
 #include "Tests/Support/ReportRecorder.h"
 
+#include <fcntl.h>
 #include <functional>
 #include <map>
+
+// Counts what this program asks the system's stat, in place of which it stands.
+static int gStatCalls = 0;
+extern "C" int stat(const char* path, struct stat* status) noexcept {
+    ++gStatCalls;
+    return fstatat(AT_FDCWD, path, status, 0);
+}
 
 class LocalFileSystemPosixTest : public LocalDiskTest {
 protected:
@@ -168,6 +176,15 @@ TEST_F(LocalFileSystemPosixTest, DeletingTakesATreeButNothingOutsideIt) {
     Run("rm -r odd theirs kept; mkdir -p deep$(printf '/d%.0s' $(seq 199)) wide; cd wide; seq 10000 | xargs touch");
     EXPECT_EQ(List().size(), 200u + 1 + 10'000);
     EXPECT_TRUE(DeleteTree("deep") && DeleteTree("wide") && List().empty());
+}
+
+TEST_F(LocalFileSystemPosixTest, DeletingAsksOnceAFileAndThriceAFolder) {
+    constexpr int kFiles = 100;
+    Run("mkdir -p tree/sub; cd tree; touch $(seq 100)");
+    gStatCalls = 0;
+    EXPECT_TRUE(DeleteTree("tree"));
+    // Whether each is a folder; and of "tree", whether that is the folder which the listing names: twice more.
+    EXPECT_EQ(gStatCalls, kFiles + 1 + 3);
 }
 
 TEST_F(LocalFileSystemPosixTest, ALockKeepsOthersOutUntilItIsGivenBack) {
