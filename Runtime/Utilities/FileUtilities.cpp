@@ -17,9 +17,10 @@ bool CreateDirectory(string_ref path) {
     constexpr UInt32 kNewFolderFlagsMask = 0x0B;
     constexpr UInt32 kNewFolderFlags = 0x02;
 
-    const core::string absolute = PathToAbsolutePath(path);
-    // Of any other path on the local disk only refused memory leaves nothing.
-    if (absolute.empty()) return path.empty() || path == "~";
+    bool isLocal;
+    const core::string absolute = GetFileSystem()->ToAbsolute(path, &isLocal);
+    // Of any other path the local back end leaves nothing only when memory is refused.
+    if (absolute.empty()) return !isLocal || path.empty() || path == "~";
     FileSystemEntry entry(absolute);
     FileEntryInfo info;
     const FileEntryInfoQueryFlags answer =

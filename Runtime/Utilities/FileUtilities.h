@@ -26,7 +26,8 @@ bool IsDirectoryCreated(core::basic_string_ref<char> path);
 bool IsFileCreated(core::basic_string_ref<char> path);
 bool IsPathCreated(core::basic_string_ref<char> path);
 
-// True when the folder is there afterwards. A failed creation prints one message; a file in the way does not.
+// True when the folder is there afterwards, and for a path that a handler makes nothing of. A failed creation prints
+// one message; a file in the way does not.
 bool CreateDirectory(core::basic_string_ref<char> path);
 
 // The same for a folder and every folder above it that is missing, outermost first. Recurses once a component: the path

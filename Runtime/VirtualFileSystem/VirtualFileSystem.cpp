@@ -31,6 +31,12 @@ FileSystemHandler* FileSystem::GetHandlerForPath(string_ref path) const {
 }
 
 core::string FileSystem::ToAbsolute(string_ref path) const {
+    bool isLocal;
+    return ToAbsolute(path, &isLocal);
+}
+
+core::string FileSystem::ToAbsolute(string_ref path, bool* isLocal) const {
+    *isLocal = false;
     {
         ReadWriteLock::AutoShared lock(*handlersLock);
         for (size_t index = handlers.size(); index != 0; --index) {
@@ -39,6 +45,7 @@ core::string FileSystem::ToAbsolute(string_ref path) const {
             if (handler.CanConvertToAbsolutePath(path)) return handler.ToAbsolute(path);
         }
     }
+    *isLocal = true;
     return localHandler->ToAbsolute(path);
 }
 

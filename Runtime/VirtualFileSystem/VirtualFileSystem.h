@@ -27,8 +27,11 @@ public:
     // Never null.
     FileSystemHandler* GetHandlerForPath(core::basic_string_ref<char> path) const;
 
-    // The path from the root; "." and ".." are not resolved.
+    // The path from the root; "." and ".." are not resolved. Empty when a handler makes nothing of the path, and when
+    // memory is refused.
     core::basic_string<char> ToAbsolute(core::basic_string_ref<char> path) const;
+    // The same, and whether the local back end has answered, because no registered handler did.
+    core::basic_string<char> ToAbsolute(core::basic_string_ref<char> path, bool* isLocal) const;
 
     // The directory that ToAbsolute puts before relative paths (cut at kMaxPathLength); returns the one before it.
     // The process's working directory is not changed.

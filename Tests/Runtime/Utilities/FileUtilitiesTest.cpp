@@ -1,5 +1,6 @@
 #include "Runtime/Utilities/FileUtilities.h"
 
+#include "Runtime/VirtualFileSystem/LocalFileSystemPosix.h"
 #include "Runtime/VirtualFileSystem/VirtualFileSystem.h"
 #include "Tests/Support/ConsoleCapture.h"
 #include "Tests/Support/TemporaryFolder.h"
@@ -25,4 +26,16 @@ TEST(FileUtilities, FoldersAreMadeOnceListedInThreeWaysOfWritingPathsAndDeleted)
     }
     EXPECT_TRUE(DeleteFileOrDirectory("t") && !IsPathCreated("t") && !DeleteFileOrDirectory("t"));
     EXPECT_TRUE(!GetFileSystem()->SetCurrentDirectory("").empty() && CreateDirectoryRecursive("")); // nothing to make
+}
+
+TEST(FileUtilities, AFolderThatAHandlerMakesNothingOfIsThere) {
+    struct Nowhere : LocalFileSystemPosix {
+        Nowhere() { GetFileSystem()->RegisterHandler(this); }
+        ~Nowhere() override { GetFileSystem()->UnregisterHandler(this); }
+        bool CanConvertToAbsolutePath(core::string_ref path) const override { return path == "nowhere"; }
+        core::string ToAbsolute(core::string_ref) const override { return core::string(); }
+    } handler;
+    const ConsoleCapture console;
+    EXPECT_TRUE(CreateDirectory("nowhere"));
+    EXPECT_EQ(console.Text(), "");
 }
