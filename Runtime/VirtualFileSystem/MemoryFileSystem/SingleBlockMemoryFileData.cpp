@@ -36,7 +36,6 @@ UInt64 SingleBlockMemoryFileData::Read(VFS::FileSize position, UInt64 size, void
 }
 
 UInt64 SingleBlockMemoryFileData::Write(VFS::FileSize position, UInt64 size, const void* in) {
-    if (size == 0) return 0;
     Mutex::AutoLock lock(mutex);
     const UInt64 from = position.Cast<UInt64>();
     UInt64 count = size;

@@ -3,6 +3,7 @@
 #include "Runtime/VirtualFileSystem/MemoryFileSystem/SingleBlockMemoryFileData.h"
 #include "Tests/Support/ReportRecorder.h"
 
+#include <future>
 #include <gtest/gtest.h>
 #include <random>
 
@@ -47,6 +48,22 @@ TEST(MemoryFileData, HoldsWhatATwinDoes) {
             EXPECT_EQ(data->Write(from, 1, "x") + data->Write(2, from, "x") + Read(*data, from).size(), 0u) << from;
         }
         EXPECT_EQ(Read(*data), twin);
+        data->Release();
+    }
+}
+
+TEST(MemoryFileData, EveryWriteWaitsForTheLock) {
+    MemoryFileData* const kForms[] = {New<SingleBlockMemoryFileData>(kLabel, kLabel, nullptr, 0u, false),
+                                      New<MultiBlocksMemoryFileData>(kLabel, kLabel, size_t{8})};
+    for (MemoryFileData* data : kForms) {
+        for (const UInt64 size : {0u, 1u}) {
+            void* contents = nullptr;
+            data->Lock(&contents);
+            std::future<UInt64> write = std::async(std::launch::async, [&] { return data->Write(0, size, "x"); });
+            EXPECT_EQ(write.wait_for(std::chrono::milliseconds(100)), std::future_status::timeout) << size;
+            data->Unlock(contents);
+            EXPECT_EQ(write.get(), size);
+        }
         data->Release();
     }
 }
