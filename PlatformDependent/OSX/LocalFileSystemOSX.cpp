@@ -50,7 +50,7 @@ bool LocalFileSystemOSX::SetFlags(FileEntryData& entry, UInt32 mask, UInt32 flag
     PlatformStatus status;
     if (!GetPlatformStatus(entry, &status)) return false;
     UInt32 newFlags = status.st_flags;
-    if (mask & kFileEntryIsHidden) newFlags &= ~UF_HIDDEN;
+    if (mask & kFileEntryIsHidden) newFlags &= ~UInt32{UF_HIDDEN};
     if (flags & kFileEntryIsHidden) newFlags |= UF_HIDDEN;
     if (newFlags == status.st_flags) return true;
     if (RepeatOnInterrupt([&] { return chflags(entry.path, newFlags); }) == 0) return true;

@@ -10,15 +10,15 @@
 // nil, an empty text or false, also where the message itself would not take it. Any thread; a pool and what was made
 // inside it belong to one thread.
 //
-// Behind this header stands one of two folders, chosen by CMake. Standin/ is a small layer over POSIX, for systems that
-// have none of this. On a Mac a folder of its own takes its place: a PlatformSystem.h that includes <sys/attr.h>,
-// <sys/vnode.h>, <sys/stat.h> and <unistd.h>, names struct stat PlatformStatus and lets PlatformStat call stat; and one
-// Objective-C++ file that includes Foundation and AppKit before this header and forwards each function to what it is
-// named after. The pool forwards to objc_autoreleasePoolPush and objc_autoreleasePoolPop. This header and the code
-// above it stay as they are.
+// Behind this header stands Standin/, a small layer over POSIX for systems that have none of this. For a Mac there is
+// nothing yet: a port adds a folder of its own, and has CMakeLists.txt take it in Standin's place. It holds a
+// PlatformSystem.h that includes <sys/attr.h>, <sys/vnode.h>, <sys/stat.h> and <unistd.h>, names struct stat
+// PlatformStatus and lets PlatformStat call stat; and one Objective-C++ file that includes Foundation and AppKit before
+// this header and forwards each function to what it is named after. The pool forwards to objc_autoreleasePoolPush and
+// objc_autoreleasePoolPop. This header and the code above it stay as they are.
 #pragma once
 
-#include <PlatformSystem.h> // PlatformStatus, PlatformStat, chflags, getattrlistbulk; from the folder that CMake chose
+#include <PlatformSystem.h> // PlatformStatus, PlatformStat, chflags, getattrlistbulk; Standin's, as CMakeLists.txt says
 
 #include <cstddef>
 

@@ -8,7 +8,7 @@
 #include <sys/stat.h>
 
 // File flags. They are kept with the file, in an extended attribute, or where that can't be written, in this process.
-constexpr uint32_t UF_HIDDEN = 0x8000;
+constexpr int UF_HIDDEN = 0x8000; // of this type on a Mac too
 
 struct PlatformStatus : stat {
     uint32_t st_flags;
