@@ -1,5 +1,7 @@
 #include "Runtime/Utilities/PathNameUtility.h"
 
+#include <cstring>
+
 using core::string_ref;
 
 void AppendPathNameImpl(string_ref base, string_ref tail, char separator, core::string& out) {
@@ -54,6 +56,6 @@ string_ref SkipPathPrefix(string_ref path, string_ref prefix, bool atStart, Comp
 }
 
 void ConvertSeparatorsToZarvo(char* path) {
-    for (; *path != '\0'; ++path)
-        if (*path == '\\') *path = '/';
+    while ((path = strchr(path, '\\')) != nullptr)
+        *path = '/';
 }
