@@ -77,6 +77,34 @@ public:
     // Initialize has returned 0; by the thread that makes the reads.
     bool CanDirectoryBecomeReady() const;
 
+    // For tools that work block by block: one storage block, and where it lies. All numbers are the archive's own and
+    // nobody has compared them with the file: a piece may pass the file's end, and a block may promise any amount of
+    // memory. Before its bytes are used, compare a piece with the file's size, as
+    // offset <= fileSize && size <= fileSize - offset; a sum of its own could wrap.
+    struct Block {
+        struct Piece {
+            UInt64 offset; // in the file, whatever the archive's own offset in it
+            UInt64 size;
+        };
+
+        UInt64 position;      // of its first byte, in the data stream
+        UInt32 size;          // in the data stream; 0 is allowed
+        UInt32 storedSize;    // of the pieces together
+        CompressionType type; // 0 to 63: also kinds that have no decompressor
+        bool isStreamed;      // decompressed from its start on, as one stream; never true of a block stored as is
+
+        // The stored bytes, in their order. A second piece that is not empty is only in a ZarvoWeb archive, where 8
+        // bytes between the LZMA properties and the stream belong to neither. Of a block stored as is, Read takes size
+        // bytes from here and not storedSize; a block that is not streamed and has two equal sizes is stored as is,
+        // too, whatever its type.
+        Piece pieces[2];
+    };
+
+    // Blocks in the order of the data stream. Once Initialize has returned 0, from any thread; index is below the
+    // count.
+    UInt32 GetBlockCount() const { return static_cast<UInt32>(m_BlocksInfo.storageBlocks.size()); }
+    Block GetBlock(UInt32 index) const;
+
 private:
     friend struct ArchiveStorageReaderTestAccess;
 

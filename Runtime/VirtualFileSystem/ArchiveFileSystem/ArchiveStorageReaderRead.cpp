@@ -173,6 +173,26 @@ bool ArchiveStorageReader::ReadFromStorage(UInt64 position, UInt64 size, void* d
     return isRead;
 }
 
+ArchiveStorageReader::Block ArchiveStorageReader::GetBlock(UInt32 index) const {
+    const StorageBlock& stored = m_BlocksInfo.storageBlocks[index];
+    const CompressionType type = GetBlockType(index);
+    const UInt64 storedPosition = m_CompressedBlocksOffsets[index];
+    Block block{
+        .position = m_UncompressedBlocksOffsets[index],
+        .size = stored.uncompressedSize,
+        .storedSize = stored.compressedSize,
+        .type = type,
+        .isStreamed = type != kCompressionNone && IsBlockStreamed(index),
+        .pieces = {{m_DataOffset + storedPosition, stored.compressedSize}, {0, 0}},
+    };
+    if (m_HideLzmaSizeField && stored.compressedSize > kLzmaPropertiesSize) { // the only block
+        block.pieces[0].size = kLzmaPropertiesSize;
+        block.pieces[1] = {m_DataOffset + kLzmaPropertiesSize + kLzmaSizeFieldSize,
+                           stored.compressedSize - kLzmaPropertiesSize};
+    }
+    return block;
+}
+
 // Whether the file has no stored byte at or behind this position.
 bool ArchiveStorageReader::IsBehindStorageEnd(UInt64 position) {
     if (m_HideLzmaSizeField && position >= kLzmaPropertiesSize) position += kLzmaSizeFieldSize;

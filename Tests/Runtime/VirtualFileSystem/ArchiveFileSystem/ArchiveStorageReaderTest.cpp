@@ -80,3 +80,58 @@ TEST(ArchiveReader, UseCountOpensAndClosesTheFileUnlessItHasChanged) {
     kept.MakeStorageUnused();
     EXPECT_EQ(descriptors + 2, CountOpenDescriptors());
 }
+
+TEST(ArchiveReader, BlocksNameTheirBytesInTheFile) {
+    constexpr size_t kOffset = 100;
+    const std::string text = SampleText(3'000);
+    const std::string lzma = CompressLzma(text.substr(0, 1'000), {});
+    const std::string unknown = "of another kind";
+    struct {
+        const char* what;
+        ArchiveDescription description;
+        std::vector<std::string> stored; // of each block
+        std::vector<bool> streamed;
+        size_t firstPieceSize;
+    } const cases[] = {
+        {.what = "block-based",
+         .description = {.entries = {{"", text}},
+                         .blocks = {{1'000, kCompressionLzma, true, lzma},
+                                    {500, kCompressionNone, true},
+                                    {1'500, static_cast<CompressionType>(63), true, unknown}}},
+         .stored = {lzma, text.substr(1'000, 500), unknown},
+         .streamed = {true, false, true},
+         .firstPieceSize = lzma.size()},
+        {.what = "ZarvoWeb",
+         .description = {.layout = ArchiveLayout::kWeb,
+                         .blocks = {{4, {}, {}, lzma.substr(0, 5) + "8 bytes!" + lzma.substr(5)}}},
+         .stored = {lzma},
+         .streamed = {true},
+         .firstPieceSize = 5},
+        {.what = "ZarvoWeb, nothing but properties",
+         .description = {.layout = ArchiveLayout::kWeb, .blocks = {{4, {}, {}, "prop8 bytes!"}}},
+         .stored = {"prop"},
+         .streamed = {true},
+         .firstPieceSize = 4},
+    };
+    for (const auto& test : cases) {
+        SCOPED_TRACE(test.what);
+        const BuiltArchive built = BuildArchive(test.description);
+        OpenedArchive archive(built.bytes, kOffset);
+        const std::string file = std::string(kOffset, '!') + built.bytes;
+        ASSERT_EQ(test.stored.size(), archive.reader.GetBlockCount());
+        UInt64 position = 0;
+        for (UInt32 index = 0; index < test.stored.size(); ++index) {
+            const ArchiveStorageReader::Block block = archive.reader.GetBlock(index);
+            std::string stored;
+            for (const auto& piece : block.pieces)
+                stored += file.substr(piece.offset, piece.size);
+            EXPECT_EQ(test.stored[index], stored);
+            EXPECT_EQ(test.stored[index].size(), block.storedSize);
+            EXPECT_EQ(test.streamed[index], block.isStreamed);
+            EXPECT_EQ(position, block.position);
+            position += block.size;
+        }
+        EXPECT_EQ(built.stream.size(), position);
+        EXPECT_EQ(test.firstPieceSize, archive.reader.GetBlock(0).pieces[0].size);
+    }
+}
