@@ -20,8 +20,9 @@ template <typename T>
 }
 
 // Reads a string up to its NUL, or to the end of the file once there is a character, and leaves the position just past
-// what was read. Any length. A read that fails behind the first characters counts as the end of the file.
-[[nodiscard]] bool ReadString(FileAccessor& file, core::string* out);
+// what was read. Any length, unless maxSize bytes, with the NUL, have come without one: what they hold is then the
+// string. A read that fails behind the first characters counts as the end of the file.
+[[nodiscard]] bool ReadString(FileAccessor& file, core::string* out, size_t maxSize = ~size_t{0});
 
 // Reads a node's path by way of scratch, which is used for one path after another: *path then takes no more memory than
 // it needs, and none when it is short.

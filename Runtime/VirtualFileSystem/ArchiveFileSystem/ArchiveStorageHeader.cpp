@@ -3,6 +3,7 @@
 #include "Runtime/Utilities/ZarvoConfig.h"
 #include "Runtime/VirtualFileSystem/ArchiveFileSystem/ArchiveFieldReading.h"
 
+#include <algorithm>
 #include <cstring>
 
 namespace ArchiveStorageHeader {
@@ -10,6 +11,7 @@ namespace ArchiveStorageHeader {
 const char* const kSignature = "ZarvoFS";
 
 constexpr size_t kStringPieceSize = 64;
+constexpr size_t kLongestSignatureSize = 13; // "ZarvoArchive" and its NUL
 constexpr UInt64 kAlignment = 16;
 
 constexpr UInt64 kStoredBlockSize = 10;
@@ -30,15 +32,15 @@ bool ReadBytes(FileAccessor& file, void* buffer, size_t size) {
     return file.Read(size, buffer, &actual) && actual == size;
 }
 
-bool ReadString(FileAccessor& file, core::string* out) {
+bool ReadString(FileAccessor& file, core::string* out, size_t maxSize) {
     out->clear();
     if (out->capacity() <= kStringPieceSize && out->grow(kStringPieceSize) == nullptr) return false;
     const UInt64 start = file.Position().Cast<UInt64>();
     char piece[kStringPieceSize];
     size_t terminatorLength = 0;
-    while (terminatorLength == 0) {
+    while (terminatorLength == 0 && out->size() != maxSize) {
         UInt64 actual = 0;
-        if (!file.Read(sizeof(piece), piece, &actual) || actual == 0) {
+        if (!file.Read(std::min(sizeof(piece), maxSize - out->size()), piece, &actual) || actual == 0) {
             if (out->empty()) return false;
             break; // a failed read ends the text as the file's end does: what is read next fails, too
         }
@@ -85,7 +87,7 @@ HeaderResult ReadHeaderSignature(FileAccessor& file, Header& header) {
     constexpr UInt32 kTypeAndDirectoryMask = kArchiveCompressionTypeMask | kArchiveDirectoryInBlocksInfo;
 
     // What can't be read leaves an empty signature, which matches nothing.
-    if (!ReadString(file, &header.signature)) header.signature.clear();
+    if (!ReadString(file, &header.signature, kLongestSignatureSize)) header.signature.clear();
     if (header.signature == kSignature) return kHeaderOk;
     if (header.signature == kSignatureArchive || header.signature == kSignatureRaw) {
         header.flags = (header.flags & ~kTypeAndDirectoryMask) | kArchiveDirectoryInBlocksInfo;

@@ -56,3 +56,14 @@ TEST(ArchiveLayouts, EndUpInTheSameRecordsUnlessTheyAreCutOrHostile) {
         }
     }
 }
+
+TEST(ArchiveLayouts, AFileThatIsNoArchiveIsNotReadWhole) {
+    for (const char* const start : {"some text", "ZarvoFS is a signature", "ZarvoArchive of something"}) {
+        SCOPED_TRACE(start);
+        const ConsoleCapture console;
+        DisturbedDisk disk;
+        const OpenedArchive archive(start + std::string(1'000'000, '.'));
+        EXPECT_EQ(-1, archive.result);
+        EXPECT_LE(disk.bytes, 16'384u); // one fill of the buffer that headers are read through
+    }
+}
