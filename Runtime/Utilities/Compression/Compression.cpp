@@ -6,6 +6,18 @@
 #include "Runtime/Utilities/Format.h"
 #include "Runtime/Utilities/LogAssert.h"
 
+// What a kind does that takes no memory.
+DecompressResult IDecompressor::TryDecompressMemory(const void* src, size_t* srcSize, void* dst,
+                                                    size_t* dstSize) const {
+    return DecompressMemory(src, srcSize, dst, dstSize) ? DecompressResult::kOk : DecompressResult::kDamaged;
+}
+
+DecompressResult IDecompressor::TryDecompressStream(void* state, const void* src, size_t* srcSize, void* dst,
+                                                    size_t* dstSize, bool isLastInput) const {
+    return DecompressStream(state, src, srcSize, dst, dstSize, isLastInput) ? DecompressResult::kOk
+                                                                            : DecompressResult::kDamaged;
+}
+
 IDecompressor* CreateDecompressor(CompressionType type, MemLabelId label) {
     if (type == kCompressionNone) return nullptr;
     if (type == kCompressionLzma) return New<LzmaDecompressor>(label);

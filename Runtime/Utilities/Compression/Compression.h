@@ -20,7 +20,13 @@ enum CompressionType : UInt32 {
     kCompressionCount = 5,    // the bound of tables indexed by kind
 };
 
-// The order of the virtual operations is fixed.
+enum class DecompressResult {
+    kOk,
+    kDamaged,     // the data can't be decoded, or not by this kind: trying again is of no use
+    kOutOfMemory, // the decoder was refused memory: the same call may succeed later
+};
+
+// The order of the virtual operations is fixed; new ones follow the last.
 class IDecompressor {
 public:
     virtual ~IDecompressor() = default;
@@ -44,6 +50,11 @@ public:
     // state is reset.
     [[nodiscard]] virtual bool DecompressStream(void* state, const void* src, size_t* srcSize, void* dst,
                                                 size_t* dstSize, bool isLastInput) const = 0;
+
+    // The same as DecompressMemory and DecompressStream, for callers who treat damage and refused memory differently.
+    virtual DecompressResult TryDecompressMemory(const void* src, size_t* srcSize, void* dst, size_t* dstSize) const;
+    virtual DecompressResult TryDecompressStream(void* state, const void* src, size_t* srcSize, void* dst,
+                                                 size_t* dstSize, bool isLastInput) const;
 };
 
 // A new decompressor, allocated under label: destroy it with Delete(decompressor, label). Null for kCompressionNone,

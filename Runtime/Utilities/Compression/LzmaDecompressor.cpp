@@ -26,22 +26,31 @@ struct LzmaStreamState {
     bool failed;  // the decoder reported an error: called again it would read and write wild memory
 };
 
+DecompressResult FailureOf(SRes result) {
+    return result == SZ_ERROR_MEM ? DecompressResult::kOutOfMemory : DecompressResult::kDamaged;
+}
+
 } // namespace
 
 CompressionType LzmaDecompressor::GetType() const { return kCompressionLzma; }
 
 bool LzmaDecompressor::DecompressMemory(const void* src, size_t* srcSize, void* dst, size_t* dstSize) const {
-    if (*srcSize < LZMA_PROPS_SIZE) return false;
+    return TryDecompressMemory(src, srcSize, dst, dstSize) == DecompressResult::kOk;
+}
+
+DecompressResult LzmaDecompressor::TryDecompressMemory(const void* src, size_t* srcSize, void* dst,
+                                                       size_t* dstSize) const {
+    if (*srcSize < LZMA_PROPS_SIZE) return DecompressResult::kDamaged;
     const auto* const properties = static_cast<const Byte*>(src);
     SizeT consumed = *srcSize - LZMA_PROPS_SIZE;
     SizeT produced = *dstSize;
     ELzmaStatus status;
-    if (LzmaDecode(static_cast<Byte*>(dst), &produced, properties + LZMA_PROPS_SIZE, &consumed, properties,
-                   LZMA_PROPS_SIZE, LZMA_FINISH_ANY, &status, &s_LzmaDecAlloc) != SZ_OK)
-        return false;
+    const SRes result = LzmaDecode(static_cast<Byte*>(dst), &produced, properties + LZMA_PROPS_SIZE, &consumed,
+                                   properties, LZMA_PROPS_SIZE, LZMA_FINISH_ANY, &status, &s_LzmaDecAlloc);
+    if (result != SZ_OK) return FailureOf(result);
     *srcSize = consumed + LZMA_PROPS_SIZE;
     *dstSize = produced;
-    return true;
+    return DecompressResult::kOk;
 }
 
 bool LzmaDecompressor::DecompressStreamInit(void** state) const {
@@ -66,13 +75,20 @@ void LzmaDecompressor::DecompressStreamDeinit(void* state) const {
 
 bool LzmaDecompressor::DecompressStream(void* state, const void* src, size_t* srcSize, void* dst, size_t* dstSize,
                                         bool isLastInput) const {
+    return TryDecompressStream(state, src, srcSize, dst, dstSize, isLastInput) == DecompressResult::kOk;
+}
+
+DecompressResult LzmaDecompressor::TryDecompressStream(void* state, const void* src, size_t* srcSize, void* dst,
+                                                       size_t* dstSize, bool isLastInput) const {
     auto* const stream = static_cast<LzmaStreamState*>(state);
-    if (stream == nullptr || stream->failed) return false;
+    if (stream == nullptr) return DecompressResult::kOutOfMemory; // only memory is ever missing to make one
+    if (stream->failed) return DecompressResult::kDamaged;
     const Byte* const input = src != nullptr ? static_cast<const Byte*>(src) : &kNoInput;
     size_t consumed = 0;
     if (!stream->started) {
-        if (*srcSize < LZMA_PROPS_SIZE) return false;
-        if (LzmaDec_Allocate(&stream->decoder, input, LZMA_PROPS_SIZE, &s_LzmaDecAlloc) != SZ_OK) return false;
+        if (*srcSize < LZMA_PROPS_SIZE) return DecompressResult::kDamaged;
+        const SRes result = LzmaDec_Allocate(&stream->decoder, input, LZMA_PROPS_SIZE, &s_LzmaDecAlloc);
+        if (result != SZ_OK) return FailureOf(result);
         LzmaDec_Init(&stream->decoder);
         stream->started = true;
         consumed = LZMA_PROPS_SIZE;
@@ -87,7 +103,7 @@ bool LzmaDecompressor::DecompressStream(void* state, const void* src, size_t* sr
         if (LzmaDec_DecodeToBuf(&stream->decoder, static_cast<Byte*>(dst) + produced, &made, input + consumed, &taken,
                                 isLastInput ? LZMA_FINISH_END : LZMA_FINISH_ANY, &status) != SZ_OK) {
             stream->failed = true;
-            return false;
+            return DecompressResult::kDamaged;
         }
         consumed += taken;
         produced += made;
@@ -95,5 +111,5 @@ bool LzmaDecompressor::DecompressStream(void* state, const void* src, size_t* sr
     }
     *srcSize = consumed;
     *dstSize = produced;
-    return true;
+    return DecompressResult::kOk;
 }

@@ -22,4 +22,8 @@ public:
     // are as they were.
     bool DecompressStream(void* state, const void* src, size_t* srcSize, void* dst, size_t* dstSize,
                           bool isLastInput) const override;
+
+    DecompressResult TryDecompressMemory(const void* src, size_t* srcSize, void* dst, size_t* dstSize) const override;
+    DecompressResult TryDecompressStream(void* state, const void* src, size_t* srcSize, void* dst, size_t* dstSize,
+                                         bool isLastInput) const override;
 };
