@@ -1,7 +1,7 @@
 // Hashes every file of an archive from several threads through one reader, prints "hash  path" in the order of the
 // directory, and says on standard error how fast it was: ParallelReader ARCHIVE [THREADS]
-#include "Examples/FindDirectory.h"
 #include "Runtime/Utilities/SpookyHash.h"
+#include "Runtime/VirtualFileSystem/ArchiveFileSystem/ArchiveStorageReader.h"
 
 #include <algorithm>
 #include <atomic>
@@ -9,6 +9,7 @@
 #include <cstdio>
 #include <cstdlib>
 #include <thread>
+#include <vector>
 
 namespace {
 
@@ -50,7 +51,7 @@ int main(int argumentCount, char** arguments) {
     }
     // The file system comes to be before a second thread may need it: Initialize sees to that.
     ArchiveStorageReader reader(kMemLabelFileSystem);
-    if (reader.Initialize(core::string(arguments[1]), 0) != 0 || !FindDirectory(reader)) {
+    if (reader.Initialize(core::string(arguments[1]), 0) != 0 || !reader.FindDirectory()) {
         fprintf(stderr, "%s: not a readable archive\n", arguments[1]);
         return 1;
     }

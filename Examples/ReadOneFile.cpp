@@ -1,8 +1,9 @@
 // Writes one file of an archive to standard output: ReadOneFile ARCHIVE PATH
-#include "Examples/FindDirectory.h"
+#include "Runtime/VirtualFileSystem/ArchiveFileSystem/ArchiveStorageReader.h"
 
 #include <algorithm>
 #include <cstdio>
+#include <vector>
 
 namespace {
 
@@ -30,7 +31,7 @@ int main(int argumentCount, char** arguments) {
         return 2;
     }
     ArchiveStorageReader reader(kMemLabelFileSystem);
-    if (reader.Initialize(core::string(arguments[1]), 0) != 0 || !FindDirectory(reader)) {
+    if (reader.Initialize(core::string(arguments[1]), 0) != 0 || !reader.FindDirectory()) {
         fprintf(stderr, "%s: not a readable archive\n", arguments[1]);
         return 1;
     }

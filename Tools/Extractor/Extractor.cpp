@@ -82,18 +82,6 @@ void PrintHeader(const ArchiveStorageHeader::Header& header) {
     printf_console("  data size: %llu bytes\n", header.size);
 }
 
-// Reads the stream from its start until the reader has met the directory in it.
-bool PullDirectory(ArchiveStorageReader& reader, dynamic_array<UInt8>& buffer) {
-    UInt64 position = 0;
-    while (!reader.IsDirectoryReady()) {
-        UInt64 delivered = 0;
-        if (!reader.Read(position, kTransferSize, buffer.data(), &delivered)) return false;
-        if (!reader.CanDirectoryBecomeReady()) return false; // and no later read would change that
-        position += delivered;
-    }
-    return true;
-}
-
 bool CopyNode(ArchiveStorageReader& reader, const Node& node, FileAccessor& file, dynamic_array<UInt8>& buffer) {
     UInt64 copied = 0;
     while (copied < node.size) {
@@ -161,7 +149,8 @@ bool ExtractArchive(const char* archivePath) {
     PrintHeader(reader.GetHeader());
 
     dynamic_array<UInt8> buffer(kMemLabelGeneral);
-    if (!buffer.resize_uninitialized(kTransferSize, kResizeExact) || !PullDirectory(reader, buffer)) {
+    if (!buffer.resize_uninitialized(kTransferSize, kResizeExact) ||
+        !reader.FindDirectory(ArchiveStorageReader::kDirectoryPiecesWhole)) {
         printf_console("ERROR: failed to parse files information\n");
         return false;
     }

@@ -10,6 +10,8 @@
 #include "Runtime/VirtualFileSystem/MemoryFileSystem/MultiBlocksMemoryFileData.h"
 #include "Runtime/VirtualFileSystem/MemoryFileSystem/SingleBlockMemoryFileData.h"
 
+#include <algorithm>
+
 using namespace ArchiveStorageHeader;
 
 static_assert(kHeaderShortRead == 1 && kHeaderNotAnArchive == -1, "the reader passes the parsers' codes on");
@@ -23,7 +25,9 @@ ArchiveStorageReader::ArchiveStorageReader(MemLabelId memLabel)
       m_DirectoryInfo(memLabel),
       m_UncompressedBlocksOffsets(memLabel),
       m_CompressedBlocksOffsets(memLabel),
+      m_NextBlocks(memLabel),
       m_CachedBlocks(memLabel),
+      m_BrokenBlocks(memLabel),
       m_Label(memLabel) {}
 
 ArchiveStorageReader::~ArchiveStorageReader() {
@@ -71,6 +75,15 @@ int ArchiveStorageReader::Initialize(FileSystemEntry& entry, VFS::FileSize offse
     return kHeaderOk;
 }
 
+// Whether a block has nothing to deliver and no read of it can fail: nothing of it is decoded, and its kind is known.
+static bool CanBeLeftOut(const StorageBlock& block) {
+    if (block.uncompressedSize != 0) return false;
+    const UInt32 type = block.flags & kStorageBlockCompressionTypeMask;
+    if (type == kCompressionNone) return true;
+    if ((block.flags & kStorageBlockStreamed) != 0) return type == kCompressionLzma;
+    return block.compressedSize == 0 && type < kCompressionReserved;
+}
+
 bool ArchiveStorageReader::BuildOffsetTables() {
     const size_t count = m_BlocksInfo.storageBlocks.size();
     if (!m_UncompressedBlocksOffsets.resize_uninitialized(count + 1, kResizeExact)) return false;
@@ -82,6 +95,13 @@ bool ArchiveStorageReader::BuildOffsetTables() {
         m_UncompressedBlocksOffsets[index + 1] = m_UncompressedBlocksOffsets[index] + block.uncompressedSize;
         m_CompressedBlocksOffsets[index + 1] = m_CompressedBlocksOffsets[index] + block.compressedSize;
     }
+
+    if (std::none_of(m_BlocksInfo.storageBlocks.begin(), m_BlocksInfo.storageBlocks.end(), CanBeLeftOut)) return true;
+    if (!m_NextBlocks.resize_uninitialized(count + 1, kResizeExact)) return false;
+    m_NextBlocks[count] = static_cast<UInt32>(count);
+    for (size_t index = count; index-- > 0;)
+        m_NextBlocks[index] =
+            CanBeLeftOut(m_BlocksInfo.storageBlocks[index]) ? m_NextBlocks[index + 1] : static_cast<UInt32>(index);
     return true;
 }
 
@@ -255,16 +275,34 @@ void ArchiveStorageReader::MakeStorageUnused() {
     EmptyCache();
 }
 
+bool ArchiveStorageReader::FindDirectory(DirectoryPieces pieces) {
+    if (IsDirectoryReady()) return true;
+    dynamic_array<UInt8> piece(kMemLabelGeneral);
+    if (!piece.resize_uninitialized(kDirectoryPieceSize, kResizeExact)) return false;
+    const bool isWhole = pieces == kDirectoryPiecesWhole;
+    // Through the cache, a stream that is cut short delivers what it holds.
+    const FileReadFlags flags = isWhole ? kFileReadFlagsNone : kFileReadFlagsThroughCache;
+    UInt64 position = m_DirectoryScanner.Position();
+    while (!IsDirectoryReady() && CanDirectoryBecomeReady()) {
+        const UInt64 rest = m_UncompressedBlocksOffsets.back() - position;
+        UInt64 delivered = 0;
+        if (!Read(position, isWhole ? kDirectoryPieceSize : std::min(kDirectoryPieceSize, rest), piece.data(),
+                  &delivered, flags))
+            return false;
+        position += delivered;
+    }
+    return IsDirectoryReady();
+}
+
 bool ArchiveStorageReader::CanDirectoryBecomeReady() const {
     return m_DirectoryScanner.CanCompleteWithin(m_UncompressedBlocksOffsets.back());
 }
 
 void ArchiveStorageReader::TryToReadDirectoryFromBlockData(UInt64 from, const void* data, size_t size) {
     const UInt64 collected = m_DirectoryFile != nullptr ? m_DirectoryFile->Size().Cast<UInt64>() : 0;
-    if (collected > from) return;
-    // Only bytes that follow one another from the stream's start are scanned: a gap would read as an empty directory.
-    const bool follows = from == collected && from == m_DirectoryScanner.Position();
-    const bool isComplete = follows && m_DirectoryScanner.Scan(static_cast<const UInt8*>(data), size);
+    // Only bytes that follow one another from the stream's start are collected: a gap would read as an empty directory.
+    if (from != collected || from != m_DirectoryScanner.Position()) return;
+    const bool isComplete = m_DirectoryScanner.Scan(static_cast<const UInt8*>(data), size);
     // What can't end in a directory is not collected.
     if (!CanDirectoryBecomeReady()) return;
 

@@ -2,15 +2,15 @@
 // directory, and serves any range of the stream, decompressing blocks on demand and keeping them in a small cache.
 //
 //   ArchiveStorageReader reader(kMemLabelFileSystem);
-//   if (reader.Initialize(core::string("archive.zarvo"), 0) != 0) return;
+//   if (reader.Initialize(core::string("archive.zarvo"), 0) != 0 || !reader.FindDirectory()) return;
 //   for (const ArchiveStorageHeader::Node& node : reader.GetDirectoryInfo().nodes) {
 //       UInt64 count = 0;                                     // may be less than asked: go on from there
 //       reader.Read(node.offset, node.size, buffer, &count);
 //   }
 //
 // Threads: once Initialize has returned 0, Read, MakeStorageUsed and MakeStorageUnused may be called from any thread.
-// While IsDirectoryReady is false (a ZarvoWeb archive keeps its directory inside the compressed data), reads are made
-// by one thread, from the start of the stream in order, until it is true. The object is shared by reference count.
+// While IsDirectoryReady is false (a ZarvoWeb archive keeps its directory inside the compressed data), only one thread
+// calls FindDirectory or reads, until it is true. The object is shared by reference count.
 //
 // States by operations (n: calls of MakeStorageUsed less those of MakeStorageUnused; Initialize counts as one):
 //
@@ -30,6 +30,7 @@
 #include "Runtime/Threads/ThreadAnnotations.h"
 #include "Runtime/Utilities/Compression/Compression.h"
 #include "Runtime/VirtualFileSystem/ArchiveFileSystem/ArchiveStorageHeader.h"
+#include "Runtime/VirtualFileSystem/ArchiveFileSystem/BrokenBlocks.h"
 #include "Runtime/VirtualFileSystem/ArchiveFileSystem/LegacyDirectoryScanner.h"
 #include "Runtime/VirtualFileSystem/IFile.h"
 #include "Runtime/VirtualFileSystem/VirtualFileSystem.h"
@@ -73,7 +74,20 @@ public:
     // Whether GetDirectoryInfo holds the archive's directory.
     bool IsDirectoryReady() const { return m_DirectoryReady.load(std::memory_order_acquire); }
 
-    // False once what has been read shows that the stream holds no directory: reading on is then of no use. Once
+    // How FindDirectory cuts the stream.
+    enum DirectoryPieces {
+        kDirectoryPiecesUpToTheEnd, // the last is as short as the rest of the stream
+        kDirectoryPiecesWhole,      // kDirectoryPieceSize each: in a stream with less left, the directory is not found
+    };
+    static constexpr UInt64 kDirectoryPieceSize = 65'536;
+
+    // Makes sure that GetDirectoryInfo holds the directory: where it lies inside the compressed data, reads the stream
+    // in order, as far as is needed. False when there is none to be found, when the data before its end is damaged, or
+    // when memory is refused. Once Initialize has returned 0; by one thread, and no other reads meanwhile.
+    [[nodiscard]] bool FindDirectory(DirectoryPieces pieces = kDirectoryPiecesUpToTheEnd);
+
+    // False once what has been read shows that the stream holds no directory: reading on is then of no use. For callers
+    // that read by themselves, from the start of the stream in order; only what follows the reads before counts. Once
     // Initialize has returned 0; by the thread that makes the reads.
     bool CanDirectoryBecomeReady() const;
 
@@ -171,7 +185,6 @@ private:
     static constexpr UInt64 kBatchSize = 4'194'304;
     static constexpr UInt32 kLzmaPropertiesSize = 5;
     static constexpr UInt32 kLzmaSizeFieldSize = 8; // behind the properties, in ZarvoWeb archives
-    static constexpr UInt64 kNotBroken = ~UInt64{0};
 
     // Set-up, in ArchiveStorageReader.cpp. Runs while no other thread uses the reader, so it takes no lock.
     int ReadHeader(UInt64 offset) VARNEX_NO_THREAD_SAFETY_ANALYSIS;
@@ -196,14 +209,15 @@ private:
     CacheResult FillChunkCachedBlock(CachedBlock* block, BatchingFileReader* reader);
     void StampCachedBlock(CachedBlock* block);
     void EmptyCache();
-    void NoteBrokenBlock(UInt32 blockIndex, UInt64 brokenFrom);
-    UInt64 GetBrokenFrom(UInt32 blockIndex);
+    void NoteBrokenBlock(const BrokenBlocks::Record& record);
+    BrokenBlocks::Record FindBrokenBlock(UInt32 blockIndex);
     IDecompressor* GetDecompressor(CompressionType type);
     CompressionType GetBlockType(UInt32 blockIndex) const;
     bool IsBlockStreamed(UInt32 blockIndex) const;
 
     // Reads, in ArchiveStorageReaderRead.cpp.
     bool FindBlock(UInt64 position, UInt32* blockIndex) const;
+    UInt32 NextBlock(UInt32 blockIndex) const;
     bool ReadCompleteBlock(UInt32 blockIndex, void* destination, UInt64* delivered, BatchingFileReader* batch);
     bool ReadBlock(UInt32 blockIndex, UInt64 offsetInBlock, UInt64 size, void* destination, UInt64* delivered,
                    BatchingFileReader* batch);
@@ -220,6 +234,10 @@ private:
     // bytes start, relative to m_DataOffset; the last entry is the end.
     dynamic_array<UInt64> m_UncompressedBlocksOffsets;
     dynamic_array<UInt64> m_CompressedBlocksOffsets;
+
+    // For each block and the end, the first block at or behind it that a read can't leave out. Without an entry when
+    // that is always the next one.
+    dynamic_array<UInt32> m_NextBlocks;
 
     MemoryFile* m_DirectoryFile = nullptr; // owned; the start of the stream, until a directory can be parsed from it
     LegacyDirectoryScanner m_DirectoryScanner;
@@ -238,10 +256,8 @@ private:
     DateTime m_LastModified;
     dynamic_array<CachedBlock*> m_CachedBlocks VARNEX_GUARDED_BY(m_CacheLock);
 
-    // Blocks whose data is known to be damaged, so that not every file in them pays for finding out: for each block,
-    // the start of the first window that can't be decoded (in a stream, the whole size where only a decoding in one
-    // window has failed). Empty until a block has failed.
-    dynamic_array<UInt64> m_BrokenFrom VARNEX_GUARDED_BY(m_CacheLock);
+    // A stream of which only a decoding in one window has failed is noted as broken from its end on.
+    BrokenBlocks m_BrokenBlocks VARNEX_GUARDED_BY(m_CacheLock);
     std::atomic<bool> m_HasBrokenBlocks{false};
 
     Mutex m_CacheLock;

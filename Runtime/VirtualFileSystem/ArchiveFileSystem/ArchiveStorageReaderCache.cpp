@@ -76,13 +76,16 @@ ArchiveStorageReader::CachedBlock* ArchiveStorageReader::AcquireCachedBlock(UInt
     } else if (found != nullptr) {
         // As a reader first: the record can't be pointed at another block while this thread waits for its filler.
         found->bufferReaders.fetch_add(1);
-        m_CacheLock.Unlock();
-        while (found->beingWritten.load() != 0)
-            CurrentThread::SleepForSeconds(kFillPollSeconds);
-        m_CacheLock.Lock();
-        if (found->blockIndex == kNoBlock) {
-            found->bufferReaders.fetch_sub(1);
-            found = nullptr;
+        // Asked under the lock, where only a filler has the mark: a victim scan has given it back before it unlocks.
+        if (found->beingWritten.load() != 0) {
+            m_CacheLock.Unlock();
+            while (found->beingWritten.load() != 0)
+                CurrentThread::SleepForSeconds(kFillPollSeconds);
+            m_CacheLock.Lock();
+            if (found->blockIndex == kNoBlock) {
+                found->bufferReaders.fetch_sub(1);
+                found = nullptr;
+            }
         }
     }
 
@@ -202,7 +205,7 @@ void ArchiveStorageReader::DeinitCachedBlock(CachedBlock* block) {
 void ArchiveStorageReader::EmptyCache() {
     Mutex::AutoLock lock(m_CacheLock);
     m_HasBrokenBlocks = false;
-    m_BrokenFrom.clear();
+    m_BrokenBlocks.Clear();
     size_t kept = 0;
     for (CachedBlock* block : m_CachedBlocks) {
         const bool isClaimed = TryToClaim(block->beingWritten);
@@ -217,22 +220,18 @@ void ArchiveStorageReader::EmptyCache() {
     m_CachedBlocks.resize_initialized(kept);
 }
 
-// Remembers that a block's data can't be decoded from some place on. Only what would fail in the same way, and as
-// silently, every time is noted; but a decoder does not tell refused memory from damage. Kept until the file is closed.
-void ArchiveStorageReader::NoteBrokenBlock(UInt32 blockIndex, UInt64 brokenFrom) {
+// Remembers that a block's data can't be had from some place on. Only what would fail in the same way, and as silently,
+// every time is noted. Kept until the file is closed.
+void ArchiveStorageReader::NoteBrokenBlock(const BrokenBlocks::Record& record) {
     Mutex::AutoLock lock(m_CacheLock);
-    if (m_BrokenFrom.empty()) {
-        if (!m_BrokenFrom.resize_uninitialized(m_BlocksInfo.storageBlocks.size(), kResizeExact)) return;
-        std::fill(m_BrokenFrom.begin(), m_BrokenFrom.end(), kNotBroken);
-        m_HasBrokenBlocks = true;
-    }
-    m_BrokenFrom[blockIndex] = std::min(m_BrokenFrom[blockIndex], brokenFrom);
+    m_BrokenBlocks.Note(record);
+    m_HasBrokenBlocks = true;
 }
 
-UInt64 ArchiveStorageReader::GetBrokenFrom(UInt32 blockIndex) {
-    if (!m_HasBrokenBlocks) return kNotBroken;
+BrokenBlocks::Record ArchiveStorageReader::FindBrokenBlock(UInt32 blockIndex) {
+    if (!m_HasBrokenBlocks) return {};
     Mutex::AutoLock lock(m_CacheLock);
-    return m_BrokenFrom.empty() ? kNotBroken : m_BrokenFrom[blockIndex];
+    return m_BrokenBlocks.Find(blockIndex);
 }
 
 // Produces the next window of a streamed block: up to maxSize bytes that follow the window before.
@@ -251,6 +250,10 @@ ArchiveStorageReader::CacheResult ArchiveStorageReader::FillStreamCachedBlock(Ca
     }
     // A whole block that fails in one window says nothing of where.
     const UInt64 brokenFrom = maxSize <= kStreamWindowSize ? block->blockOffset : stored.uncompressedSize;
+    // What has no stream has reported that, and does so each time.
+    const auto noteDamage = [&] {
+        if (block->streamState != nullptr) NoteBrokenBlock({.from = brokenFrom, .blockIndex = block->blockIndex});
+    };
     const bool reachesBlockEnd = block->blockOffset + UInt64{want} == stored.uncompressedSize;
 
     size_t produced = 0;
@@ -265,7 +268,7 @@ ArchiveStorageReader::CacheResult ArchiveStorageReader::FillStreamCachedBlock(Ca
                 UInt64 delivered = 0;
                 if (!hasRoom || !reader->Read(block->compressedBuffer.data(), position, piece, &delivered)) {
                     block->compressedBuffer.clear();
-                    if (IsBehindStorageEnd(position)) NoteBrokenBlock(block->blockIndex, brokenFrom);
+                    if (IsBehindStorageEnd(position)) noteDamage();
                     result = kCacheResultReadError;
                     break;
                 }
@@ -284,9 +287,11 @@ ArchiveStorageReader::CacheResult ArchiveStorageReader::FillStreamCachedBlock(Ca
         static constexpr UInt8 kNoInput = 0; // never read: decoders are spared a null pointer
         const UInt8* source = available != 0 ? block->compressedBuffer.data() + block->compressedPos : &kNoInput;
         size_t room = want - produced;
-        if (!decompressor->DecompressStream(block->streamState, source, &available, block->buffer.data() + produced,
-                                            &room, isAllLoaded && reachesBlockEnd)) {
-            if (block->streamState != nullptr) NoteBrokenBlock(block->blockIndex, brokenFrom);
+        const DecompressResult decoded =
+            decompressor->TryDecompressStream(block->streamState, source, &available, block->buffer.data() + produced,
+                                              &room, isAllLoaded && reachesBlockEnd);
+        if (decoded != DecompressResult::kOk) {
+            if (decoded == DecompressResult::kDamaged) noteDamage();
             result = kCacheResultDecompressError;
             break;
         }
@@ -318,16 +323,23 @@ ArchiveStorageReader::CacheResult ArchiveStorageReader::FillChunkCachedBlock(Cac
         return kCacheResultDecompressError;
 
     UInt64 delivered = 0;
-    if (!reader->Read(loaded.data(), storedStart, stored.compressedSize, &delivered)) return kCacheResultReadError;
-    if (delivered != stored.compressedSize) return kCacheResultIncomplete;
+    const bool isRead = reader->Read(loaded.data(), storedStart, stored.compressedSize, &delivered);
+    if (!isRead || delivered != stored.compressedSize) {
+        // A block whose last byte is missing stays what it is now; any other failure may pass.
+        if (stored.compressedSize != 0 && IsBehindStorageEnd(storedStart + stored.compressedSize - 1))
+            NoteBrokenBlock({.from = 0, .blockIndex = block->blockIndex, .isCut = isRead});
+        return isRead ? kCacheResultIncomplete : kCacheResultReadError;
+    }
     if (!isStoredAsIs) {
         size_t consumed = stored.compressedSize;
         size_t produced = stored.uncompressedSize;
-        if (!decompressor->DecompressMemory(loaded.data(), &consumed, block->buffer.data(), &produced) ||
-            produced != stored.uncompressedSize) {
+        const DecompressResult decoded =
+            decompressor->TryDecompressMemory(loaded.data(), &consumed, block->buffer.data(), &produced);
+        if (decoded != DecompressResult::kOk || produced != stored.uncompressedSize) {
             // Sizes that LZ4 does not take are reported each time.
-            if (std::max(stored.uncompressedSize, stored.compressedSize) < Lz4Decompressor::kSizeLimit)
-                NoteBrokenBlock(block->blockIndex, 0);
+            if (decoded != DecompressResult::kOutOfMemory &&
+                std::max(stored.uncompressedSize, stored.compressedSize) < Lz4Decompressor::kSizeLimit)
+                NoteBrokenBlock({.from = 0, .blockIndex = block->blockIndex});
             return kCacheResultDecompressError;
         }
     }

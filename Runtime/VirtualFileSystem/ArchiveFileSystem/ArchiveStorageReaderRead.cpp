@@ -17,6 +17,10 @@ bool ArchiveStorageReader::FindBlock(UInt64 position, UInt32* blockIndex) const 
     return true;
 }
 
+UInt32 ArchiveStorageReader::NextBlock(UInt32 blockIndex) const {
+    return m_NextBlocks.empty() ? blockIndex + 1 : m_NextBlocks[blockIndex + 1];
+}
+
 bool ArchiveStorageReader::Read(VFS::FileSize fromPosition, UInt64 size, void* buffer, UInt64* read,
                                 FileReadFlags flags) {
     if (m_UncompressedBlocksOffsets.empty()) return false;
@@ -41,10 +45,10 @@ bool ArchiveStorageReader::Read(VFS::FileSize fromPosition, UInt64 size, void* b
                              wantedEnd);
     UInt8* const destination = static_cast<UInt8*>(buffer);
     UInt64 delivered = 0;
-    for (UInt32 index = start; index <= end; ++index) {
+    for (UInt32 index = start; index <= end; index = NextBlock(index)) {
         const UInt64 blockStart = m_UncompressedBlocksOffsets[index];
         const UInt64 blockSize = m_BlocksInfo.storageBlocks[index].uncompressedSize;
-        Check(blockStart + blockSize >= from + delivered,
+        Check(blockStart <= from + delivered && blockStart + blockSize >= from + delivered,
               "Assertion failed on expression: 'm_UncompressedBlocksOffsets[blockInd] <= from.Cast<UInt64>() + dstPos "
               "&& m_UncompressedBlocksOffsets[blockInd] + uncompressedBlockSize >= from.Cast<UInt64>() + dstPos'");
         const UInt64 offsetInBlock = index == start ? from - blockStart : 0;
@@ -73,7 +77,7 @@ bool ArchiveStorageReader::ReadCompleteBlock(UInt32 blockIndex, void* destinatio
     if (GetBlockType(blockIndex) == kCompressionNone)
         return batch->Read(destination, m_CompressedBlocksOffsets[blockIndex], uncompressedSize, delivered);
 
-    if (GetBrokenFrom(blockIndex) != kNotBroken) return false;
+    if (const BrokenBlocks::Record broken = FindBrokenBlock(blockIndex); broken.IsKnown()) return broken.isCut;
     CachedBlock temporary(kMemLabelGeneral);
     temporary.buffer = dynamic_array<UInt8>::wrap(static_cast<UInt8*>(destination), uncompressedSize, uncompressedSize,
                                                   kMemLabelGeneral);
@@ -91,9 +95,9 @@ bool ArchiveStorageReader::ReadBlock(UInt32 blockIndex, UInt64 offsetInBlock, UI
     if (GetBlockType(blockIndex) == kCompressionNone)
         return batch->Read(destination, m_CompressedBlocksOffsets[blockIndex] + offsetInBlock, size, delivered);
 
-    if (offsetInBlock >= GetBrokenFrom(blockIndex)) {
+    if (const BrokenBlocks::Record broken = FindBrokenBlock(blockIndex); offsetInBlock >= broken.from) {
         *delivered = 0;
-        return false;
+        return broken.isCut;
     }
     CacheResult result = kCacheResultOk;
     CachedBlock* record = AcquireCachedBlock(blockIndex, static_cast<UInt32>(offsetInBlock));

@@ -2,6 +2,15 @@
 #include "Tests/Runtime/VirtualFileSystem/ArchiveFileSystem/ReaderTest.h"
 
 #include <thread>
+#include <time.h>
+
+// Every sleep of the runtime.
+static thread_local int t_Sleeps = 0;
+
+extern "C" int nanosleep(const timespec* interval, timespec* left) {
+    ++t_Sleeps;
+    return clock_nanosleep(CLOCK_REALTIME, 0, interval, left);
+}
 
 // Threads read a part of a block at once, all of the same or each of its own, and the first is inside its fill before
 // the others start: the disk is shut until all of them use a record, and then fails so often.
@@ -92,4 +101,24 @@ TEST(ArchiveReaderThreads, RandomReadsOfAMixedArchiveDeliverWhatIsThere) {
         disk.failsEvery = ~UInt64{0}; // what could not be read then can be now
         EXPECT_TRUE(archive.reader.MakeStorageUsed(true) && archive.Read(0, kWholeSize) == start);
     }
+}
+
+// A record that nobody fills is taken at once, although other threads look for records that they may take.
+TEST(ArchiveReaderThreads, ACacheHitDoesNotWaitForAVictimScan) {
+    const std::string text = SampleText(1'000);
+    OpenedArchive archive({.entries = {{.bytes = text}}, .chunkSize = 1'000, .type = kCompressionLz4});
+    EXPECT_EQ(text.substr(1, 9), archive.Read(1, 9)); // fills the record
+    std::atomic<bool> isOver = false;
+    std::jthread scanner([&] {
+        while (!isOver)
+            Access::LookForVictim(archive.reader);
+    });
+    t_Sleeps = 0;
+    for (int hit = 0; hit < 100'000; ++hit) {
+        char bytes[9];
+        UInt64 count = 0;
+        ASSERT_TRUE(archive.reader.Read(1, 9, bytes, &count));
+    }
+    isOver = true;
+    EXPECT_EQ(0, t_Sleeps);
 }

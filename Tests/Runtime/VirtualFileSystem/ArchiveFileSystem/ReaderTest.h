@@ -26,6 +26,18 @@ struct ArchiveStorageReaderTestAccess {
         return cache;
     }
     static void EmptyCache(ArchiveStorageReader& reader) { reader.EmptyCache(); }
+    // What every read does that finds its block in no record.
+    static void LookForVictim(ArchiveStorageReader& reader) {
+        Mutex::AutoLock lock(reader.m_CacheLock);
+        if (auto* const victim = reader.ClaimVictim()) victim->beingWritten = 0;
+    }
+    // How many blocks a read of the whole stream looks at.
+    static UInt32 CountBlocksToRead(const ArchiveStorageReader& reader) {
+        UInt32 count = 0;
+        for (UInt32 index = 0; index < reader.GetBlockCount(); index = reader.NextBlock(index))
+            ++count;
+        return count;
+    }
     static const auto& Blocks(const ArchiveStorageReader& reader) { return reader.m_BlocksInfo.storageBlocks; }
 };
 using Access = ArchiveStorageReaderTestAccess;
