@@ -1,10 +1,14 @@
-// Property: any range that a fresh reader delivers holds the same bytes as the same range read in order, piece by
-// piece, through another reader; and a range that lies outside the stream is refused.
+// Property: two ways to read agree, or both fail. What one reader delivers in order, piece by piece, a fresh one
+// delivers in any range; and where the first fails, the second does. Of an archive that the writer has made and nobody
+// has touched, every range inside the stream is delivered.
 #include "Fuzz/FuzzSupport.h"
 #include "Runtime/VirtualFileSystem/ArchiveFileSystem/ArchiveStorageReader.h"
+#include "Tools/ArchiveWriter/ArchiveWriter.h"
 
 #include <algorithm>
 #include <cstring>
+#include <span>
+#include <string_view>
 
 namespace {
 
@@ -40,19 +44,41 @@ std::vector<UInt8> ReadInOrder(ArchiveStorageReader& reader) {
     return stream;
 }
 
-} // namespace
+// An archive that the writer makes of the input's bytes, with blocks of the kinds and sizes that are drawn from it.
+BuiltArchive BuildFrom(FuzzInput& input) {
+    constexpr CompressionType kTypes[] = {kCompressionNone, kCompressionLzma, kCompressionLz4, kCompressionLz4HC};
+    constexpr ArchiveLayout kLayouts[] = {ArchiveLayout::kBlockBased, ArchiveLayout::kArchive, ArchiveLayout::kWeb};
+    ArchiveDescription description;
+    description.layout = kLayouts[input.TakeBelow(std::size(kLayouts))];
+    // Repeated, so that a stream has several windows.
+    const UInt64 copies = 1 + input.TakeBelow(300);
+    std::vector<ArchiveBlock> blocks(input.TakeBelow(6));
+    for (ArchiveBlock& block : blocks) {
+        block.type = kTypes[input.TakeBelow(std::size(kTypes))];
+        block.streamed = (block.type == kCompressionLzma || block.type == kCompressionNone) && input.TakeBelow(2) != 0;
+        block.size = input.TakeBelow(100'000);
+    }
+    const std::string_view bytes(reinterpret_cast<const char*>(input.data()), input.size());
+    std::string text;
+    for (UInt64 copy = 0; copy < copies && text.size() < kMaxStream / 2; ++copy)
+        text += bytes;
+    UInt64 left = text.size();
+    for (ArchiveBlock& block : blocks) {
+        block.size = std::min(block.size, left);
+        left -= block.size;
+    }
+    // What decodes to nothing is damage in the eyes of LZ4.
+    std::erase_if(blocks, [](const ArchiveBlock& block) { return block.size == 0; });
+    if (description.layout != ArchiveLayout::kWeb) description.blocks = std::move(blocks);
+    description.entries = {{.path = "file", .bytes = std::move(text)}};
+    description.lzma.endMark = input.TakeBelow(2) != 0;
+    return BuildArchive(description);
+}
 
-extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, size_t size) {
-    [[maybe_unused]] static const bool isSilent = (SilenceConsole(), true);
-    FuzzInput input(data, size);
-    const UInt64 seeds[] = {input.TakeBelow(~UInt64{0}), input.TakeBelow(~UInt64{0}), input.TakeBelow(~UInt64{0}),
-                            input.TakeBelow(~UInt64{0})};
-
-    OpenArchive ordered(input);
-    if (ordered.result != 0) return 0;
-    const std::vector<UInt8> stream = ReadInOrder(ordered.reader);
-
-    OpenArchive jumping(input);
+// Reads ranges through a fresh reader, and holds what it answers against what was read in order: up to its end every
+// range is delivered, and what lies behind it is refused.
+void CheckRanges(const FuzzInput& archive, const std::vector<UInt8>& stream, std::span<const UInt64> seeds) {
+    OpenArchive jumping(archive);
     FuzzCheck(jumping.result == 0);
     std::vector<UInt8> range;
     for (UInt64 seed : seeds) {
@@ -61,11 +87,32 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, size_t size) {
         range.resize(static_cast<size_t>(length) + 1);
         UInt64 delivered = 0;
         const auto flags = static_cast<FileReadFlags>(seed & 1);
-        if (!jumping.reader.Read(from, length, range.data(), &delivered, flags)) continue;
-        FuzzCheck(delivered <= length && (delivered != 0 || length == 0));
-        if (from >= stream.size()) continue;
-        const size_t comparable = std::min(static_cast<size_t>(delivered), stream.size() - static_cast<size_t>(from));
-        FuzzCheck(comparable == 0 || memcmp(range.data(), stream.data() + from, comparable) == 0);
+        const bool isRead = jumping.reader.Read(from, length, range.data(), &delivered, flags);
+        FuzzCheck(!isRead || (delivered <= length && (delivered != 0 || length == 0)));
+        const UInt64 inOrder = from < stream.size() ? stream.size() - from : 0;
+        if (length != 0 && length <= inOrder) FuzzCheck(isRead && delivered == length);
+        // Behind the last byte that was tried in order, nothing is known.
+        if (isRead && from <= stream.size() && stream.size() < kMaxStream) FuzzCheck(delivered <= inOrder);
+        const UInt64 comparable = isRead ? std::min(delivered, inOrder) : 0;
+        FuzzCheck(comparable == 0 || memcmp(range.data(), stream.data() + from, static_cast<size_t>(comparable)) == 0);
     }
+}
+
+} // namespace
+
+extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, size_t size) {
+    [[maybe_unused]] static const bool isSilent = (SilenceConsole(), true);
+    FuzzInput input(data, size);
+    const UInt64 seeds[] = {input.TakeBelow(~UInt64{0}), input.TakeBelow(~UInt64{0}), input.TakeBelow(~UInt64{0}),
+                            input.TakeBelow(~UInt64{0})};
+
+    if (input.TakeBelow(4) == 1) {
+        const BuiltArchive built = BuildFrom(input);
+        const FuzzInput archive(reinterpret_cast<const UInt8*>(built.bytes.data()), built.bytes.size());
+        CheckRanges(archive, std::vector<UInt8>(built.stream.begin(), built.stream.end()), seeds);
+        return 0;
+    }
+    OpenArchive ordered(input);
+    if (ordered.result == 0) CheckRanges(input, ReadInOrder(ordered.reader), seeds);
     return 0;
 }
