@@ -26,11 +26,7 @@ struct ArchiveStorageReaderTestAccess {
         return cache;
     }
     static void EmptyCache(ArchiveStorageReader& reader) { reader.EmptyCache(); }
-    // What every read does that finds its block in no record.
-    static void LookForVictim(ArchiveStorageReader& reader) {
-        Mutex::AutoLock lock(reader.m_CacheLock);
-        if (auto* const victim = reader.ClaimVictim()) victim->beingWritten = 0;
-    }
+    static Mutex& CacheLock(ArchiveStorageReader& reader) { return reader.m_CacheLock; }
     // How many blocks a read of the whole stream looks at.
     static UInt32 CountBlocksToRead(const ArchiveStorageReader& reader) {
         UInt32 count = 0;
