@@ -1,5 +1,5 @@
-// dynamic_block_array: a sequence in blocks of BlockSize elements. Growing adds blocks and copies nothing: an element
-// keeps its address for as long as the sequence lives.
+// dynamic_block_array: a sequence in blocks of BlockSize elements. Growing adds blocks and moves no element: each keeps
+// its address for as long as the sequence lives. Memory that is refused ends the process.
 //
 //   dynamic_block_array<FileEntryInfo, 32> files(kMemLabelFileList);
 //   FileEntryInfo& file = files.emplace_back();
@@ -40,6 +40,7 @@ public:
             Block* block = RequireMemory(New<Block>(m_Label, m_Label));
             m_Blocks.push_back(block);
             block->reserve(BlockSize);
+            RequireMemory(block->data()); // a block with less room would move its elements when it grows
         }
     }
 

@@ -2,6 +2,7 @@
 #include "Runtime/Core/Containers/String.h"
 #include "Tests/Support/ConsoleCapture.h"
 
+#include <csignal>
 #include <gtest/gtest.h>
 #include <random>
 #include <vector>
@@ -72,4 +73,9 @@ TEST(DynamicBlockArray, ElementsStayWhereTheyWerePlaced) {
     for (size_t i = 0; i < 65; ++i)
         EXPECT_TRUE(texts.size() == 65 && places[i] == &texts[i]) << i;
     EXPECT_EQ(texts[64].get_memory_label(), MemLabelId(kMemLabelFileList));
+}
+
+TEST(DynamicBlockArray, RefusedBlockEndsTheProcess) {
+    dynamic_block_array<UInt64, size_t{1} << 60> numbers(kMemLabelFileList); // in blocks of 2^63 bytes
+    EXPECT_EXIT(numbers.emplace_back(), testing::KilledBySignal(SIGABRT), "");
 }
