@@ -1,10 +1,13 @@
-// A global operator new and delete: blocks aligned to 16 bytes, null when memory is refused.
+// The global operators new and delete: blocks aligned to 16 bytes or what was asked, null when memory is refused.
+// Every form is replaced. One that is left out would throw, and under the address sanitizer it would be the sanitizer's
+// own, whose blocks only its own delete may free.
 // Linked into the command, the tests and what makes archives for them, and not into the library, so that a program that
 // embeds it keeps its own. Standard containers can't go on from null; the runtime itself uses the labelled form alone.
+#include <algorithm>
 #include <cstdlib>
 #include <new>
 
-// clang's thread sanitizer links a pair of its own and refuses a second.
+// clang's thread sanitizer links a set of its own and refuses a second.
 #if defined(__has_feature)
 #if __has_feature(thread_sanitizer)
 #define VARNEX_KEEP_SANITIZER_NEW
@@ -13,14 +16,44 @@
 
 #ifndef VARNEX_KEEP_SANITIZER_NEW
 
-// Compilers take plain new for never null, and the undefined behaviour sanitizer holds us to that.
-__attribute__((no_sanitize("returns-nonnull-attribute"))) void* operator new(size_t size) {
+namespace {
+
+void* Allocate(size_t size, std::align_val_t alignment = std::align_val_t{16}) {
     void* pointer = nullptr;
-    if (posix_memalign(&pointer, 16, size) != 0) pointer = nullptr;
+    if (posix_memalign(&pointer, std::max<size_t>(static_cast<size_t>(alignment), 16), size) != 0) return nullptr;
     return pointer;
 }
 
+} // namespace
+
+// Compilers take a form without nothrow for never null, and the undefined behaviour sanitizer holds us to that.
+#define VARNEX_MAY_BE_NULL __attribute__((no_sanitize("returns-nonnull-attribute")))
+
+VARNEX_MAY_BE_NULL void* operator new(size_t size) { return Allocate(size); }
+VARNEX_MAY_BE_NULL void* operator new[](size_t size) { return Allocate(size); }
+VARNEX_MAY_BE_NULL void* operator new(size_t size, std::align_val_t alignment) { return Allocate(size, alignment); }
+VARNEX_MAY_BE_NULL void* operator new[](size_t size, std::align_val_t alignment) { return Allocate(size, alignment); }
+
+void* operator new(size_t size, const std::nothrow_t&) noexcept { return Allocate(size); }
+void* operator new[](size_t size, const std::nothrow_t&) noexcept { return Allocate(size); }
+void* operator new(size_t size, std::align_val_t alignment, const std::nothrow_t&) noexcept {
+    return Allocate(size, alignment);
+}
+void* operator new[](size_t size, std::align_val_t alignment, const std::nothrow_t&) noexcept {
+    return Allocate(size, alignment);
+}
+
 void operator delete(void* pointer) noexcept { free(pointer); }
+void operator delete[](void* pointer) noexcept { free(pointer); }
 void operator delete(void* pointer, size_t) noexcept { free(pointer); }
+void operator delete[](void* pointer, size_t) noexcept { free(pointer); }
+void operator delete(void* pointer, const std::nothrow_t&) noexcept { free(pointer); }
+void operator delete[](void* pointer, const std::nothrow_t&) noexcept { free(pointer); }
+void operator delete(void* pointer, std::align_val_t) noexcept { free(pointer); }
+void operator delete[](void* pointer, std::align_val_t) noexcept { free(pointer); }
+void operator delete(void* pointer, size_t, std::align_val_t) noexcept { free(pointer); }
+void operator delete[](void* pointer, size_t, std::align_val_t) noexcept { free(pointer); }
+void operator delete(void* pointer, std::align_val_t, const std::nothrow_t&) noexcept { free(pointer); }
+void operator delete[](void* pointer, std::align_val_t, const std::nothrow_t&) noexcept { free(pointer); }
 
 #endif
