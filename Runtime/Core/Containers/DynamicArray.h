@@ -6,9 +6,10 @@
 //   auto window = dynamic_array<UInt8>::wrap(destination, 0, room, kMemLabelFileSystem);
 //
 // Growth moves elements byte by byte without calling anything of theirs, so an element must hold no pointer to itself
-// (core::string does not). Elements that can be constructed from a MemLabelId get the array's label. When memory is
-// refused the array stays as it was: whoever sizes one by a number from outside looks at the answer. Adding single
-// elements has no answer, and needs the memory.
+// (core::string does not). Elements that the array constructs get its label if they can be constructed from a
+// MemLabelId; those of a buffer that it takes over keep theirs.
+// When memory is refused, resizing and reserving leave the array as it was, and a copy is empty: whoever sizes one by a
+// number from outside looks at the answer. Adding single elements has no answer: without the memory the process ends.
 // An array belongs to one thread at a time.
 #pragma once
 

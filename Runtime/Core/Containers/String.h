@@ -5,7 +5,8 @@
 //   path += "/archive.zarvo";
 //   core::string name = core::string::wrap("borrowed until it is written to");
 //
-// Wherever text is passed, a part of the string's own text is fine. A string belongs to one thread at a time.
+// Wherever text is passed, a part of the string's own text is fine. When memory is refused, appending leaves the string
+// as it was, and what assigns, copies or adds up leaves an empty one. A string belongs to one thread at a time.
 #pragma once
 
 #include "Runtime/Core/Containers/StringRef.h"

@@ -63,7 +63,7 @@ void StringStorageDefault<T>::assign(const T* text, size_t count) {
         set_size_and_terminate(count);
         return;
     } else {
-        set_size_and_terminate(0); // growing then need not keep the old text
+        set_size_and_terminate(0); // what is left when memory is refused
     }
     T* buffer = grow(count);
     if (buffer == nullptr) return;

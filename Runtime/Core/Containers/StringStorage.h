@@ -10,9 +10,9 @@
 //   10xxxxxx    external   the same with capacity 0; the text is somebody else's, never written or freed
 //   11xxxxxx    never
 //
-// The x are left as they were. Inline and heap text ends in a NUL at [size]. Nothing in the area points into the
-// object, so a string may be moved byte by byte. A buffer never shrinks, and stays until the string is moved from or
-// to.
+// The x mean nothing: growing leaves them as they were, moving and borrowing set them. Inline and heap text ends in a
+// NUL at [size]. Nothing in the area points into the object, so a string may be moved byte by byte. A buffer never
+// shrinks, and stays until the string is moved from or to.
 #pragma once
 
 #include "Runtime/Allocator/Allocator.h"
