@@ -25,3 +25,35 @@ TEST(Semaphore, WakesNobodyForAnInterruptionAndAsksTheSystemOnlyForThreadsThatWa
     EXPECT_TRUE(gSemaphore.count == 0 && gSemaphore.storage.count == 0);
     Footing_Semaphore_FreeInplace(&gSemaphore);
 }
+
+TEST(SystemSemaphore, ReleasesBeyondTheMostAreDropped) {
+    constexpr int32_t kMost = Footing_SystemSemaphore_MaxCount;
+    struct Case {
+        int32_t before;
+        uint32_t released;
+        int32_t after;
+        int signals;
+    };
+    constexpr Case kCases[] = {
+        {.before = 0, .released = 3, .after = 3, .signals = 3},
+        {.before = kMost - 2, .released = 2, .after = kMost, .signals = 2},
+        {.before = kMost - 2, .released = 3, .after = kMost, .signals = 2},
+        {.before = kMost, .released = 1, .after = kMost, .signals = 0},
+        {.before = kMost, .released = 0x80000001, .after = kMost, .signals = 0}, // 2^32 in all
+        {.before = kMost, .released = 0xFFFFFFFF, .after = kMost, .signals = 0},
+    };
+    for (const Case& row : kCases) {
+        SCOPED_TRACE(testing::Message() << row.before << " and " << row.released);
+        Footing_SystemSemaphore_Storage storage;
+        const Footing_SystemSemaphore_Handle handle = Footing_SystemSemaphore_CreateInplace(&storage);
+        storage.count = row.before;
+        Footing_SystemSemaphore_Release(handle, row.released);
+        EXPECT_EQ(row.after, storage.count);
+
+        int signals = 0;
+        while (dispatch_semaphore_wait(storage.platformSemaphore, DISPATCH_TIME_NOW) == 0)
+            ++signals;
+        EXPECT_EQ(row.signals, signals);
+        Footing_SystemSemaphore_FreeInplace(handle);
+    }
+}

@@ -2,6 +2,7 @@
 #include "Runtime/Threads/ReadWriteLock.h"
 #include "Runtime/Threads/Thread.h"
 #include "Runtime/Threads/ThreadHelper.h"
+#include "Tests/Support/ConsoleCapture.h"
 
 #include <gtest/gtest.h>
 #include <thread>
@@ -54,6 +55,23 @@ TEST(ReadWriteLock, EveryStateAndOperationGivesTheNextWordAndWakesWhomItMust) {
         const Transition got = step(before);
         EXPECT_TRUE(got.word == after && got.verdict == verdict) << std::hex << before;
         EXPECT_EQ(SInt64{got.wokenReaders} - got.wokenWriters, woken) << std::hex << before;
+    }
+}
+
+TEST(ReadWriteLock, ReleaseOfWhatIsNotHeldIsReported) {
+    struct Case {
+        void (ReadWriteLock::*release)(); // called by its address, as the thread-safety analysis refuses it by name
+        const char* report;
+    };
+    constexpr Case kCases[] = {
+        {.release = &ReadWriteLock::ReleaseShared, .report = "ReadWriteLock::readers underflow!\n"},
+        {.release = &ReadWriteLock::ReleaseExclusive, .report = "ReadWriteLock::writers underflow!\n"},
+    };
+    for (const Case& row : kCases) {
+        const ConsoleCapture console;
+        ReadWriteLock lock;
+        (lock.*row.release)();
+        EXPECT_EQ(row.report, console.Text());
     }
 }
 

@@ -1,9 +1,11 @@
 #include "Runtime/Utilities/RegisterRuntimeInitializeAndCleanup.h"
 
 #include "Runtime/Math/Random/Rand.h"
+#include "Runtime/RuntimeStatics.h"
 #include "Runtime/Threads/Thread.h"
 #include "Runtime/Utilities/LogAssert.h"
 
+#include <functional>
 #include <gtest/gtest.h>
 #include <optional>
 
@@ -32,4 +34,17 @@ TEST(RuntimeRegistry, RunsByOrderThenAddressAndCleansUpInReverse) {
     all[2].reset(), all[0].reset(); // the newest, the oldest
     EXPECT_EQ(callsOf(Registration::ExecuteInitializations), "+e");
     EXPECT_EQ(kSeenThread, PlatformThread::GetCurrentThreadID());
+}
+
+TEST(RuntimeStatics, GeneratorIsRegisteredWithOrderZero) {
+    const Registration before(nullptr, nullptr, -1), beside(nullptr, nullptr, 0), after(nullptr, nullptr, 1);
+    EXPECT_TRUE(Registration::Sort(&before, &gScriptingRandInitAndCleanup));
+    EXPECT_TRUE(Registration::Sort(&gScriptingRandInitAndCleanup, &after));
+    // Between equal orders the address decides.
+    EXPECT_EQ(std::less<const Registration*>()(&beside, &gScriptingRandInitAndCleanup),
+              Registration::Sort(&beside, &gScriptingRandInitAndCleanup));
+}
+
+TEST(RuntimeStatics, RelaunchArgumentsHaveTheLabelOfFileLists) {
+    EXPECT_EQ(kMemLabelFileList, relaunchArguments.get_memory_label().identifier);
 }

@@ -17,3 +17,23 @@ TEST(SpookyHash, KnownAnswersHold) {
         EXPECT_TRUE(hash[0] == first && hash[1] == second) << length;
     }
 }
+
+TEST(SpookyHash, EachHalfStartsWithItsOwnSeed) {
+    struct Case {
+        size_t length;
+        UInt64 first, second;
+    };
+    constexpr Case kCases[] = {
+        {.length = 0, .first = 0xeec07ed910bce07a, .second = 0xfce8383cffab081d},
+        {.length = 191, .first = 0x98ce42bc92692a5e, .second = 0x712f7e174cfef5c9},
+        {.length = 192, .first = 0x7d454f3fdd6b7b22, .second = 0x99a8552cc6795fed},
+    };
+    UInt8 bytes[192];
+    std::iota(bytes, bytes + 192, UInt8{0});
+    for (const Case& row : kCases) {
+        UInt64 first = 1, second = 2;
+        SpookyHash::Hash128(bytes, row.length, &first, &second);
+        EXPECT_EQ(row.first, first) << row.length;
+        EXPECT_EQ(row.second, second) << row.length;
+    }
+}

@@ -64,6 +64,60 @@ TEST(DynamicArray, BehavesAsItsTwinUnderRandomEdits) {
     }
 }
 
+TEST(DynamicArray, PushedElementGetsTheLabelOfTheArray) {
+    Strings array(kMemLabelFileSystem);
+    array.push_back(core::string(kLong, kMemLabelGeneral));
+    EXPECT_EQ(kMemLabelFileSystem, array[0].get_memory_label().identifier);
+    EXPECT_EQ(std::string(kLong), array[0].c_str());
+}
+
+TEST(DynamicArray, ElementsAreDestroyedInTheirOrder) {
+    static std::string destroyed;
+    struct Element {
+        explicit Element(char elementName = '-') : name(elementName) {}
+        ~Element() { destroyed += name; }
+        char name;
+    };
+    {
+        dynamic_array<Element> array(kMemLabelGeneral);
+        for (const char name : {'a', 'b', 'c', 'd', 'e'})
+            array.emplace_back(name);
+        array.resize_initialized(3);
+        EXPECT_EQ("de", destroyed);
+        destroyed.clear();
+    }
+    EXPECT_EQ("abc", destroyed);
+}
+
+TEST(DynamicArray, TakingOverTheLargestForeignSizeIsReported) {
+    struct Case {
+        size_t size;
+        const char* report;
+    };
+    constexpr size_t kLargest = (size_t{1} << 63) - 1;
+    constexpr Case kCases[] = {
+        {.size = kLargest - 1, .report = ""},
+        {.size = kLargest, .report = "Assertion failed on expression: 'm_size < max_size()'\n"},
+    };
+    for (const Case& row : kCases) {
+        const ConsoleCapture console;
+        UInt8 byte = 0;
+        dynamic_array<UInt8> array(kMemLabelGeneral);
+        array = dynamic_array<UInt8>::wrap(&byte, row.size, row.size, kMemLabelGeneral);
+        EXPECT_EQ(row.report, console.Text());
+        EXPECT_EQ(row.size, array.size());
+    }
+}
+
+TEST(DynamicArray, ForeignMemoryResizedToNothingIsLetGo) {
+    UInt8 byte = 0;
+    auto array = dynamic_array<UInt8>::wrap(&byte, 0, 1, kMemLabelGeneral);
+    array.resize_buffer_nocheck(0, kResizeExact);
+    EXPECT_TRUE(array.owns_data());
+    EXPECT_EQ(0, array.capacity());
+    EXPECT_EQ(nullptr, array.data());
+}
+
 TEST(DynamicBlockArray, ElementsStayWhereTheyWerePlaced) {
     dynamic_block_array<core::string, 32> texts(kMemLabelFileList);
     core::string* places[65];

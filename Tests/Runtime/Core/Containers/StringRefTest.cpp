@@ -28,3 +28,23 @@ TEST(StringRef, BehavesAsItsTwinOnEveryShortText) {
     char copy[] = "####";
     EXPECT_TRUE(strcpy_truncate(copy, "abc", 3, 3) == 2 && memcmp(copy, "ab\0#", 4) == 0);
 }
+
+TEST(StringRef, OnlyTheTypeOneIgnoresCase) {
+    struct Case {
+        int type;
+        int difference;
+        bool startsWith;
+    };
+    constexpr Case kCases[] = {
+        {.type = 0, .difference = 'A' - 'a', .startsWith = false},
+        {.type = 1, .difference = 0, .startsWith = true},
+        {.type = 2, .difference = 'A' - 'a', .startsWith = false},
+        {.type = -1, .difference = 'A' - 'a', .startsWith = false},
+    };
+    for (const Case& row : kCases) {
+        SCOPED_TRACE(row.type);
+        const auto type = static_cast<ComparisonType>(row.type);
+        EXPECT_EQ(row.difference, core::string_ref("A").compare("a", type));
+        EXPECT_EQ(row.startsWith, core::string_ref("A").starts_with("a", type));
+    }
+}

@@ -64,3 +64,34 @@ TEST(String, BehavesAsItsTwinUnderRandomEdits) {
         }
     }
 }
+
+TEST(String, CopiesAndSumsHaveTheLabelOfTheirSource) {
+    const string source("text", kMemLabelFileSystem);
+    EXPECT_EQ(kMemLabelFileSystem, string(source).get_memory_label().identifier);
+    EXPECT_EQ(kMemLabelFileSystem, (source + "tail").get_memory_label().identifier);
+}
+
+TEST(String, SumAllocatesOnceExactlyWhatItNeeds) {
+    struct Case {
+        size_t left, right, capacity;
+    };
+    constexpr Case kCases[] = {
+        {.left = 1, .right = 30, .capacity = 31}, // inline
+        {.left = 1, .right = 31, .capacity = 32},
+        {.left = 20, .right = 20, .capacity = 40},
+        {.left = 40, .right = 1, .capacity = 41},
+    };
+    for (const Case& row : kCases) {
+        const std::string left(row.left, 'l'), right(row.right, 'r');
+        const string sum = string(left.c_str()) + right.c_str();
+        EXPECT_EQ(left + right, sum.c_str());
+        EXPECT_EQ(row.capacity, sum.capacity()) << row.left << " and " << row.right;
+    }
+}
+
+TEST(String, WrappedEmptyTextIsInline) {
+    const char text[] = "";
+    const string wrapped = string::wrap(text);
+    EXPECT_EQ(31, ModeByte(wrapped));
+    EXPECT_NE(text, wrapped.data());
+}
