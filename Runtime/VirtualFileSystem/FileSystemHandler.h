@@ -3,8 +3,7 @@
 //
 // Every operation receives an entry whose handler (for the content operations, accessorHandler) is the object itself.
 // Failure is a false, empty or zero result; operations that say so leave a code in the entry's lastError. The order of
-// the virtual operations is fixed. No class here has a key function, so that programs that are compiled with run-time
-// type information can derive from them.
+// the virtual operations is fixed.
 #pragma once
 
 #include "Runtime/Core/Containers/DynamicBlockArray.h"
@@ -12,7 +11,6 @@
 #include "Runtime/Core/Containers/StringRef.h"
 #include "Runtime/Core/NonCopyable.h"
 #include "Runtime/Utilities/Hash128.h"
-#include "Runtime/Utilities/LogAssert.h"
 #include "Runtime/VirtualFileSystem/VirtualFileSystemTypes.h"
 
 class FileSystemEntry;
@@ -120,9 +118,3 @@ public:
     virtual core::basic_string<char> ToPhysicalPath(const core::basic_string<char>&) const { return {}; }
     virtual core::basic_string<char> ToLogicalPath(const core::basic_string<char>&) const { return {}; }
 };
-
-inline bool FileSystemHandler::CreateFileWithContentAtomically(const FileEntryData& entry, const void*, UInt64) const {
-    ReportFailedCheck("CreateFileWithContentAtomically is not implemented by this handler");
-    entry.lastError = kFileSystemErrorNotSupported;
-    return false;
-}

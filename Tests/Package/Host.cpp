@@ -1,0 +1,3 @@
+int RunPlugin();
+
+int main() { return RunPlugin(); }
