@@ -9,7 +9,6 @@
 #include <cstdio>
 #include <cstdlib>
 #include <cstring>
-#include <optional>
 #include <sys/file.h>
 #include <unistd.h>
 #include <utime.h>
@@ -126,7 +125,8 @@ public:
         const string_ref parent = path.substr(0, nameStart);
         if (name.empty() || name.find('\\') != string_ref::npos) return false;
         // A listing writes the same parent for all that it lists: the disk is asked once.
-        if (m_Parent != parent) {
+        if (!m_IsKnown || m_Parent != parent) {
+            m_IsKnown = true;
             m_Parent = parent;
             m_IsParentFolder =
                 IsSameFile(parent.empty() ? "." : core::string(parent, kMemLabelGeneral).c_str(), m_Folder);
@@ -136,7 +136,8 @@ public:
 
 private:
     const char* m_Folder;
-    std::optional<string_ref> m_Parent; // the one that was compared last
+    bool m_IsKnown = false;
+    string_ref m_Parent; // the one that was compared last
     bool m_IsParentFolder = false;
 };
 
