@@ -124,8 +124,10 @@ core::string ConsoleText(const char* text) {
     return result;
 }
 
-void EndWithNewline(core::string* text) {
+// False, and the text is as it was, when memory for the newline is refused.
+bool EndWithNewline(core::string* text) {
     if (text->empty() || text->back() != '\n') text->push_back('\n');
+    return text->back() == '\n';
 }
 
 bool HasStackTraceForConsole(LogType type, const DebugStringToFileData& data) {
@@ -208,17 +210,19 @@ void DebugStringToFilePostprocessedStacktrace(const DebugStringToFileData& data)
 
     const ConsoleFunction print = ChooseConsoleFunction(data.mode);
     core::string message = ConsoleText(data.message);
-    EndWithNewline(&message);
+    if (!EndWithNewline(&message)) {
+        // The next report must not land on this line.
+        print("%s\n", message.c_str());
+        message.clear();
+    }
     if (HasStackTraceForConsole(type, data)) {
-        core::string stackTrace = ConsoleText(data.stackTrace);
-        if (stackTrace.c_str()[0] == '\n')
-            stackTrace = core::string(stackTrace.c_str() + 1, MemLabelId(kMemLabelGeneral));
-        EndWithNewline(&stackTrace);
+        core::string stackTrace = ConsoleText(data.stackTrace[0] == '\n' ? data.stackTrace + 1 : data.stackTrace);
+        (void)EndWithNewline(&stackTrace); // without it a blank line is missing
         if (HasSourcePositionForConsole(data))
             print("%s%s\n(Filename: %s Line: %i)\n\n", message.c_str(), stackTrace.c_str(), data.file, data.line);
         else
             print("%s%s\n", message.c_str(), stackTrace.c_str());
-    } else {
+    } else if (!message.empty()) {
         print("%s", message.c_str());
     }
 

@@ -8,7 +8,6 @@
 #include <algorithm>
 #include <cstring>
 #include <optional>
-#include <string>
 
 namespace {
 
@@ -19,18 +18,21 @@ constexpr UInt64 kTransferSize = 65'536;
 // Where entries go. A stored path decides what is made below the output folder, and never where that folder is.
 class OutputFolder {
 public:
-    explicit OutputFolder(const char* archivePath) {
+    explicit OutputFolder(core::string_ref archivePath) {
         // A leading "~" is part of the name here, not the home folder.
-        if (archivePath[0] == '~') m_Path = "./";
+        const core::string_ref start = archivePath.starts_with("~") ? "./" : "", end = "_data";
+        // Without memory there is no folder: half its path would name another one.
+        if (m_Path.grow(start.size() + archivePath.size() + end.size()) == nullptr) return;
+        m_Path += start;
         m_Path += archivePath;
-        m_Path += "_data";
-        m_AbsoluteLength = PathToAbsolutePath(m_Path.c_str()).size();
+        m_Path += end;
+        m_AbsoluteLength = PathToAbsolutePath(m_Path).size(); // 0 without memory
     }
 
-    // False when an entry would cut the folder's path. A folder that can't be made is no failure yet: it may be there
-    // already, and if it is not, every entry says so.
+    // False when an entry would cut the folder's path, or memory for it was refused. A folder that can't be made is no
+    // failure yet: it may be there already, and if it is not, every entry says so.
     bool Create() const {
-        if (m_Path.size() > kMaxPathLength) return false;
+        if (m_AbsoluteLength == 0 || m_Path.size() > kMaxPathLength) return false;
         FileSystemEntry entry(m_Path.c_str());
         (void)entry.CreateAsDir();
         return true;
@@ -39,9 +41,9 @@ public:
     // The path of an entry on disk. False for one that would leave the folder, or whose path, as it is or absolute,
     // would be cut to another one's.
     bool Resolve(core::string_ref path, core::string* joined) const {
-        if (HasParentComponent(path)) return false;
+        if (m_AbsoluteLength == 0 || HasParentComponent(path)) return false;
         joined->clear();
-        AppendPathNameImpl(m_Path.c_str(), path, '/', *joined);
+        AppendPathNameImpl(m_Path, path, '/', *joined);
         if (joined->size() < m_Path.size()) return false; // memory was refused
         const size_t absoluteLength = m_AbsoluteLength + (joined->size() - m_Path.size());
         return std::max(joined->size(), absoluteLength) <= kMaxPathLength;
@@ -70,8 +72,8 @@ private:
         return false;
     }
 
-    std::string m_Path;
-    size_t m_AbsoluteLength;
+    core::string m_Path;
+    size_t m_AbsoluteLength = 0; // 0: memory for the path was refused
     std::optional<core::string_ref> m_LastFolder;
 };
 
@@ -87,7 +89,8 @@ bool CopyNode(ArchiveStorageReader& reader, const Node& node, FileAccessor& file
     while (copied < node.size) {
         UInt64 delivered = 0;
         const UInt64 wanted = std::min(node.size - copied, kTransferSize);
-        if (!reader.Read(node.offset + copied, wanted, buffer.data(), &delivered)) {
+        // An empty buffer: memory for it was refused.
+        if (buffer.empty() || !reader.Read(node.offset + copied, wanted, buffer.data(), &delivered)) {
             printf_console("ERROR: failed to decompress file %s\n", node.path.c_str());
             return false;
         }
@@ -149,8 +152,8 @@ bool ExtractArchive(const char* archivePath) {
     PrintHeader(reader.GetHeader());
 
     dynamic_array<UInt8> buffer(kMemLabelGeneral);
-    if (!buffer.resize_uninitialized(kTransferSize, kResizeExact) ||
-        !reader.FindDirectory(ArchiveStorageReader::kDirectoryPiecesWhole)) {
+    (void)buffer.resize_uninitialized(kTransferSize, kResizeExact); // without it the files that have bytes fail
+    if (!reader.FindDirectory(ArchiveStorageReader::kDirectoryPiecesWhole)) {
         printf_console("ERROR: failed to parse files information\n");
         return false;
     }

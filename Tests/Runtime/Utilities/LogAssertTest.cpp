@@ -1,5 +1,6 @@
 #include "Runtime/Utilities/Format.h"
 #include "Tests/Support/ConsoleCapture.h"
+#include "Tests/Support/RefusedMemory.h"
 
 #include <algorithm>
 #include <csignal>
@@ -236,4 +237,16 @@ TEST_F(LogHooks, FatalErrorEndsTheProcessAfterItsOutput) {
     };
     EXPECT_EXIT(DebugStringToFile({.message = "text", .mode = kLogModeFatal}), testing::KilledBySignal(SIGABRT),
                 "type 0: text");
+}
+
+TEST(LogAssert, TextEndsItsLineWithoutMemory) {
+    const std::string text(100, 'x'), trace(100, 'y'); // short ones need none
+    const ConsoleCapture console;
+    {
+        const RefusedMemory refused(1, true);
+        ReportError(text.c_str());
+        DebugStringToFile({text.c_str(), "", "", trace.c_str(), "", 0, -1, kLogModeError | kLogModeKeepStackTrace});
+    }
+    EXPECT_TRUE(RefusedMemory::HasStruck());
+    EXPECT_EQ(text + "\n" + text + "\n" + trace + "\n", console.Text());
 }
