@@ -1,5 +1,6 @@
 // Hashes every file of an archive from several threads through one reader, prints "hash  path" in the order of the
 // directory, and says on standard error how fast it was: ParallelReader ARCHIVE [THREADS]
+#include "Runtime/Utilities/LogHooks.h"
 #include "Runtime/Utilities/SpookyHash.h"
 #include "Runtime/VirtualFileSystem/ArchiveFileSystem/ArchiveStorageReader.h"
 
@@ -49,6 +50,7 @@ int main(int argumentCount, char** arguments) {
         fprintf(stderr, "Usage: ParallelReader ARCHIVE [THREADS]\n");
         return 2;
     }
+    gConsoleFile = stderr; // where the runtime's messages go; the standard output is for results
     // The file system comes to be before a second thread may need it: Initialize sees to that.
     ArchiveStorageReader reader(kMemLabelFileSystem);
     if (reader.Initialize(core::string(arguments[1]), 0) != 0 || !reader.FindDirectory()) {

@@ -1,4 +1,5 @@
 // Writes one file of an archive to standard output: ReadOneFile ARCHIVE PATH
+#include "Runtime/Utilities/LogHooks.h"
 #include "Runtime/VirtualFileSystem/ArchiveFileSystem/ArchiveStorageReader.h"
 
 #include <algorithm>
@@ -30,6 +31,7 @@ int main(int argumentCount, char** arguments) {
         fprintf(stderr, "Usage: ReadOneFile ARCHIVE PATH\n");
         return 2;
     }
+    gConsoleFile = stderr; // where the runtime's messages go; the standard output is for results
     ArchiveStorageReader reader(kMemLabelFileSystem);
     if (reader.Initialize(core::string(arguments[1]), 0) != 0 || !reader.FindDirectory()) {
         fprintf(stderr, "%s: not a readable archive\n", arguments[1]);

@@ -4,6 +4,8 @@
 #include "Tests/Support/TemporaryFolder.h"
 #include "Tools/ArchiveWriter/ArchiveWriter.h"
 
+#include <fcntl.h>
+
 // A line of ParallelReader: pieces of 1 MiB, each hash the seed of the next.
 static std::string HashLine(const ArchiveEntry& entry) {
     UInt64 half1 = 0, half2 = 0;
@@ -42,4 +44,22 @@ TEST(Examples, ReadEveryFileOfEveryLayoutAndSayWhatCantBeRead) {
     const Transcript noArchive(1, "Unable to read header from archive file: .\n.: not a readable archive\n");
     EXPECT_EQ(noArchive, RunProgram(READ_ONE_FILE, {".", "last"}));
     EXPECT_EQ(noArchive, RunProgram(PARALLEL_READER, {"."}));
+}
+
+TEST(Examples, KeepMessagesOutOfTheirResults) {
+    // A block that is marked as a stream, but can't be one: its check fails, and says so.
+    ArchiveDescription archive{.entries = {{.path = "a", .bytes = "text"}}, .type = kCompressionLz4};
+    archive.fields["block[0].flags"] = 0x42;
+    const TemporaryFolder folder;
+    WriteArchive(archive, folder / "damaged");
+    const std::string unread = "can't be read                     a\n",
+                      noStream = "Decompressor's stream must be initialized!\n";
+    for (const auto& [program, argument, results] :
+         {std::tuple(READ_ONE_FILE, "a", std::string()), std::tuple(PARALLEL_READER, "2", unread)}) {
+        const auto splitOutput = [&] {
+            return dup2(open("messages", O_WRONLY | O_CREAT | O_TRUNC, 0600), STDERR_FILENO) >= 0;
+        };
+        EXPECT_EQ(Transcript(1, results), RunProgram(program, {"damaged", argument}, folder.Path(), splitOutput));
+        EXPECT_TRUE(ReadFile(folder / "messages").starts_with(noStream)) << ReadFile(folder / "messages");
+    }
 }
