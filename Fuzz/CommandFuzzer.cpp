@@ -1,11 +1,18 @@
-// Property: whatever the bytes are, the command makes one folder, beside the archive, and touches nothing else.
+// Property: whatever the bytes are, the command makes one folder, beside the archive, and touches nothing else. After
+// "All ok!", that folder holds every file and folder that the archive lists, with the bytes that another reader
+// delivers, and nothing else.
 #include "Fuzz/FuzzSupport.h"
 #include "Runtime/Utilities/RegisterRuntimeInitializeAndCleanup.h"
+#include "Runtime/VirtualFileSystem/ArchiveFileSystem/ArchiveStorageReader.h"
 #include "Tools/Extractor/Extractor.h"
 
+#include <algorithm>
 #include <csignal>
 #include <cstring>
 #include <filesystem>
+#include <fstream>
+#include <map>
+#include <set>
 #include <string>
 #include <sys/resource.h>
 #include <unistd.h>
@@ -15,6 +22,8 @@ namespace {
 namespace fs = std::filesystem;
 
 constexpr rlim_t kMaxFileSize = 1 << 20;
+constexpr UInt64 kCommandPiece = 65'536;
+constexpr UInt64 kPiece = 4'099; // other pieces than the command's
 constexpr const char* kArchiveName = "a.zarvo";
 constexpr const char* kOutputName = "a.zarvo_data";
 
@@ -43,6 +52,56 @@ fs::path MakeWorkplace() {
     return outer;
 }
 
+// Where a stored path leads, below the output folder; it has no ".." after "All ok!".
+fs::path Place(const ArchiveStorageHeader::Node& node) {
+    std::string path = node.path.c_str();
+    std::replace(path.begin(), path.end(), '\\', '/');
+    fs::path place;
+    for (const fs::path& component : fs::path(path).relative_path())
+        if (!component.empty() && component != ".") place /= component;
+    return place;
+}
+
+void CheckFile(ArchiveStorageReader& reader, const ArchiveStorageHeader::Node& node, const fs::path& path) {
+    FuzzCheck(fs::is_regular_file(path) && fs::file_size(path) == node.size);
+    std::ifstream file(path, std::ios::binary);
+    char expected[kPiece];
+    char found[kPiece];
+    UInt64 delivered = 0;
+    for (UInt64 done = 0; done < node.size; done += delivered) {
+        FuzzCheck(reader.Read(node.offset + done, std::min(node.size - done, kPiece), expected, &delivered));
+        FuzzCheck(file.read(found, static_cast<std::streamsize>(delivered)).good());
+        FuzzCheck(memcmp(expected, found, static_cast<size_t>(delivered)) == 0);
+    }
+}
+
+void CheckOutput() {
+    ArchiveStorageReader reader(kMemLabelFileSystem);
+    FuzzCheck(reader.Initialize(core::string(kArchiveName), 0) == 0);
+    std::vector<char> piece(kCommandPiece);
+    UInt64 delivered = 0;
+    for (UInt64 position = 0; !reader.IsDirectoryReady(); position += delivered)
+        FuzzCheck(reader.Read(position, piece.size(), piece.data(), &delivered));
+
+    std::map<fs::path, const ArchiveStorageHeader::Node*> files; // of one that is listed twice the last
+    std::set<fs::path> listed;
+    for (const ArchiveStorageHeader::Node& node : reader.GetDirectoryInfo().nodes) {
+        const bool isFolder = (node.flags & ArchiveStorageHeader::kNodeDirectory) != 0;
+        if (!isFolder) files[Place(node)] = &node;
+        for (fs::path place = Place(node); !place.empty(); place = place.parent_path())
+            listed.insert(place);
+    }
+    std::set<fs::path> found;
+    for (const fs::directory_entry& made : fs::recursive_directory_iterator(kOutputName)) {
+        const fs::path place = made.path().lexically_relative(kOutputName);
+        FuzzCheck(made.is_directory() != files.contains(place));
+        found.insert(place);
+    }
+    FuzzCheck(found == listed);
+    for (const auto& [place, node] : files)
+        CheckFile(reader, *node, kOutputName / place);
+}
+
 } // namespace
 
 extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, size_t size) {
@@ -51,7 +110,7 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, size_t size) {
     FILE* archive = fopen(kArchiveName, "wb");
     FuzzCheck(archive != nullptr && fwrite(data, 1, size, archive) == size && fclose(archive) == 0);
 
-    (void)ExtractArchive(kArchiveName); // any answer is right
+    if (ExtractArchive(kArchiveName)) CheckOutput();
 
     FuzzCheck(fs::file_size(kArchiveName) == size);
     for (const fs::directory_entry& entry : fs::directory_iterator("."))
