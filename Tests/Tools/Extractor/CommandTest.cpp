@@ -79,14 +79,19 @@ TEST(Command, SaysWhatStandsInItsWay) {
     }
 }
 
-// As another user when this one is not stopped by any permission.
+// As another user when this one is not stopped by any permission, with a copy of the program, as that user may be kept
+// out of the build folder.
 TEST(Command, RespectsPermissions) {
-    const TemporaryFolder folder;
+    const TemporaryFolder folder, programs;
     const std::string path = folder.Path(), output = path + "/a.zarvo_data";
     Case run{kThree, "file:a", "a:kept folder| b/c:text", {}, path};
     run.prepare = [] { return geteuid() != 0 || (setgid(65'534) == 0 && setuid(65'534) == 0); };
-    fs::permissions(path, fs::perms::all);
-    if (RunVarnex({}, path, run.prepare).first != 1) GTEST_SKIP() << "another user can't run the program here";
+    run.program = programs / "Varnex";
+    fs::copy_file(VARNEX_BINARY, run.program);
+    for (const std::string& open : {path, programs.Path(), run.program})
+        fs::permissions(open, fs::perms::all);
+    if (RunProgram(run.program.c_str(), {}, path, run.prepare).first != 1)
+        GTEST_SKIP() << "another user can't run a program in " << programs.Path();
     // A file that can't be written; then no output folder can be made; then the archive can't be read.
     fs::create_directory(output);
     WriteFile(output + "/a", "kept");
@@ -101,5 +106,5 @@ TEST(Command, RespectsPermissions) {
     Expect(run);
     fs::permissions(path + "/a.zarvo", fs::perms::none);
     const std::string unread = "Extracting file 'a.zarvo'...\n" + Say("unopened:a.zarvo unread");
-    EXPECT_EQ(Transcript(1, unread), RunVarnex({"a.zarvo"}, path, run.prepare));
+    EXPECT_EQ(Transcript(1, unread), RunProgram(run.program.c_str(), {"a.zarvo"}, path, run.prepare));
 }

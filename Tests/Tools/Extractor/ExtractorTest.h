@@ -147,6 +147,7 @@ struct Case {
     std::string path = "a.zarvo";
     std::function<bool()> prepare = {}; // as RunProgram takes it
     bool isHeard = true;
+    std::string program = VARNEX_BINARY;
     std::function<void(std::string& bytes)> change = {}; // of the archive
 };
 
@@ -175,7 +176,7 @@ inline void Expect(const Case& run) {
     fs::create_directories(file.parent_path());
     WriteFile(file, bytes);
     const Transcript expected(run.messages.ends_with("ok") ? 0 : 1, run.isHeard ? said.str() : "");
-    EXPECT_EQ(expected, RunVarnex({run.path}, folder, run.prepare));
+    EXPECT_EQ(expected, RunProgram(run.program.c_str(), {run.path}, folder, run.prepare));
     const std::string name = file.lexically_normal().lexically_relative(folder);
     FolderTree tree;
     if (isListed && run.output != "none")
