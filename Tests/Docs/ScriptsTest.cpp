@@ -1,0 +1,85 @@
+// The scripts where they have to say something, with small programs in place of the system's.
+#include "Tests/Support/RunVarnex.h"
+#include "Tests/Support/TemporaryFolder.h"
+
+namespace fs = std::filesystem;
+
+class Scripts : public testing::Test {
+protected:
+    Scripts() { fs::copy(VARNEX_SOURCE_DIR "/scripts", m_Folder / "scripts"); }
+
+    // A program of a name that does what a line of shell says, found before the system's.
+    void Replace(const std::string& name, const std::string& line) {
+        fs::create_directory(m_Folder / "bin");
+        WriteFile(m_Folder / ("bin/" + name), "#!/bin/sh\n" + line + "\n");
+        fs::permissions(m_Folder / ("bin/" + name), fs::perms::owner_all);
+    }
+
+    Transcript Run(const std::string& script, const std::vector<std::string>& arguments) {
+        const auto findReplaced = [&] { return setenv("PATH", (m_Folder / "bin:" + getenv("PATH")).c_str(), 1) == 0; };
+        return RunProgram((m_Folder / ("scripts/" + script)).c_str(), arguments, m_Folder.Path(), findReplaced);
+    }
+
+    const TemporaryFolder m_Folder;
+};
+
+TEST_F(Scripts, SayWhenThereIsNoCheckoutToLookAt) {
+    for (const std::string script : {"format", "lines", "includes"}) {
+        const std::vector<std::string> arguments(script == "format" ? 1 : 0, "--check");
+        const std::string said =
+            m_Folder / ("scripts/" + script) + ": not a git checkout, which says what the sources are\n";
+        EXPECT_EQ(Transcript(1, said), Run(script, arguments));
+    }
+}
+
+TEST_F(Scripts, AskForAllTheirPackagesAtTheirStart) {
+    WriteFile(m_Folder / ".git", "");
+    Replace("dpkg-query", "exit 1");
+    Replace("apt-get", "exit 1");
+    Replace("sudo", "exit 1");
+    Replace("id", "echo 1000");
+    const std::string build = "g++ cmake ninja-build liblz4-dev lzma-dev ",
+                      test = build + "libgtest-dev clang libclang-rt-14-dev llvm",
+                      lint = build + "libgtest-dev libbenchmark-dev clang clang-tidy-14 gcovr git python3";
+    struct Row {
+        std::string script;
+        std::vector<std::string> arguments;
+        std::string packages;
+    };
+    for (const Row& row : {Row{.script = "test", .arguments = {}, .packages = test + " dpkg-dev file"},
+                           Row{.script = "test", .arguments = {"debug"}, .packages = test},
+                           Row{.script = "bench", .arguments = {"--help"}, .packages = "python3"},
+                           Row{.script = "includes", .arguments = {}, .packages = lint}})
+        EXPECT_EQ(Transcript(1, "Installing " + row.packages + "\n"), Run(row.script, row.arguments)) << row.script;
+}
+
+TEST_F(Scripts, ExtractHelps) {
+    const auto [status, said] = Run("extract", {"--help"});
+    EXPECT_EQ(0, status);
+    EXPECT_TRUE(said.starts_with("Usage: " + (m_Folder / "scripts/extract") + " [ARCHIVE]\n")) << said;
+}
+
+TEST_F(Scripts, ExtractSaysHowFarItsBuildIs) {
+    Replace("dpkg-query", "echo installed");
+    Replace(
+        "cmake",
+        "printf '[3/9] Building\\n[4/9] Linking\\n'; mkdir -p build/release; ln -sf /bin/true build/release/Varnex");
+    EXPECT_EQ(Transcript(0, "Building, step 3 of 9\n"), Run("extract", {"a.zarvo"}));
+    Replace("cmake", "printf '[3/9] broken\\n'; exit 1");
+    const auto [status, said] = Run("extract", {"a.zarvo"});
+    EXPECT_EQ(1, status);
+    EXPECT_NE(std::string::npos, said.find("\n[3/9] broken\n")) << said;
+}
+
+TEST_F(Scripts, TestSaysWhyATestWasSkipped) {
+    Replace("dpkg-query", "echo installed");
+    Replace("cmake", "");
+    Replace("ctest", "echo '1/2 Test #1: A.B ...***Skipped'; echo '100% tests passed, 0 tests failed out of 2'");
+    fs::create_directories(m_Folder / "build/debug/Testing/Temporary");
+    WriteFile(m_Folder / "build/debug/Testing/Temporary/LastTest.log",
+              "[ RUN      ] A.B\na.cpp:12: Skipped\nno such device\n\n[  SKIPPED ] A.B (0 ms)\n[  SKIPPED ] 1 test, "
+              "listed below:\n");
+    const auto [status, said] = Run("test", {"debug"});
+    EXPECT_EQ(0, status);
+    EXPECT_TRUE(said.ends_with("\nSkipped (debug): A.B: no such device\n1 passed, 0 failed, 1 skipped\n")) << said;
+}
