@@ -47,6 +47,16 @@ TEST(Failures, HeadersAreRefusedAndDamageSpoilsTheReadsThatNeedIt) {
         Expect({"a:text", kNoHeader, "none", {.signature = Bytes(signature)}});
 }
 
+// Nothing in an archive tells these bytes from the right ones; the documents say so.
+TEST(Failures, DamageThatStillDecodesGoesUnnoticed) {
+    const std::string zs(60, 'z'), damaged = std::string(59, 'z') + "y";
+    for (const char* kind : {"stored a:", "lz4 a:", "lz4hc a:"}) {
+        Case run{kind + zs, "ok", "a:" + damaged};
+        run.change = [](std::string& bytes) { bytes.back() = 'y'; };
+        Expect(run);
+    }
+}
+
 // Every cut of every layout: what is said, and how much of the file comes out.
 TEST(Failures, EveryCutEndsInTheRightMessage) {
     for (const std::string form :
