@@ -18,7 +18,7 @@ show_progress() {
     local line next=0
     while IFS= read -r line; do
         printf '%s\n' "$line"
-        if [[ "$line" =~ ^\[([0-9]+)/([0-9]+)\]\  && $SECONDS -ge $next ]]; then
+        if [[ "$line" =~ ^\[([1-9][0-9]*)/([0-9]+)\]\  && $SECONDS -ge $next ]]; then
             echo "Building, step ${BASH_REMATCH[1]} of ${BASH_REMATCH[2]}" >&2
             next=$((SECONDS + 10))
         fi
