@@ -22,7 +22,6 @@ namespace {
 namespace fs = std::filesystem;
 
 constexpr rlim_t kMaxFileSize = 1 << 20;
-constexpr UInt64 kCommandPiece = 65'536;
 constexpr UInt64 kPiece = 4'099; // other pieces than the command's
 constexpr const char* kArchiveName = "a.zarvo";
 constexpr const char* kOutputName = "a.zarvo_data";
@@ -78,10 +77,7 @@ void CheckFile(ArchiveStorageReader& reader, const ArchiveStorageHeader::Node& n
 void CheckOutput() {
     ArchiveStorageReader reader(kMemLabelFileSystem);
     FuzzCheck(reader.Initialize(core::string(kArchiveName), 0) == 0);
-    std::vector<char> piece(kCommandPiece);
-    UInt64 delivered = 0;
-    for (UInt64 position = 0; !reader.IsDirectoryReady(); position += delivered)
-        FuzzCheck(reader.Read(position, piece.size(), piece.data(), &delivered));
+    FuzzCheck(reader.FindDirectory());
 
     std::map<fs::path, const ArchiveStorageHeader::Node*> files; // of one that is listed twice the last
     std::set<fs::path> listed;
