@@ -92,8 +92,8 @@ public:
     bool CanDirectoryBecomeReady() const;
 
     // For tools that work block by block: one storage block, and where it lies. All numbers are the archive's own and
-    // nobody has compared them with the file: a piece may pass the file's end, and a block may promise any amount of
-    // memory. Before its bytes are used, compare a piece with the file's size, as
+    // nobody has compared them with the file: a piece may pass the file's end, and a size may be more than there is
+    // memory for. Before its bytes are used, compare a piece with the file's size, as
     // offset <= fileSize && size <= fileSize - offset; a sum of its own could wrap.
     struct Block {
         struct Piece {
@@ -107,10 +107,10 @@ public:
         CompressionType type; // 0 to 63: also kinds that have no decompressor
         bool isStreamed;      // decompressed from its start on, as one stream; never true of a block stored as is
 
-        // The stored bytes, in their order. A second piece that is not empty is only in a ZarvoWeb archive, where 8
-        // bytes between the LZMA properties and the stream belong to neither. Of a block stored as is, Read takes size
-        // bytes from here and not storedSize; a block that is not streamed and has two equal sizes is stored as is,
-        // too, whatever its type.
+        // The stored bytes, in their order. Only a ZarvoWeb archive has a second piece that is not empty: 8 bytes
+        // between the LZMA properties and the coded data belong to neither. Of a block stored as is, Read takes size
+        // bytes from here, whatever storedSize says. A block that is not streamed, has two equal sizes and a
+        // decompressor for its type holds plain bytes, too.
         Piece pieces[2];
     };
 
