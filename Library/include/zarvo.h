@@ -1,0 +1,358 @@
+/* SPDX-License-Identifier: MIT */
+/*
+ * libzarvo: reads archives of the Zarvo engine's formats.
+ *
+ *     zarvo_error *error = NULL;
+ *     zarvo_archive *archive = NULL;
+ *     if (zarvo_open_path("game.zarvo", NULL, &archive, &error) != ZARVO_OK) {
+ *         fprintf(stderr, "%s\n", zarvo_error_text(error));
+ *         zarvo_error_free(error);
+ *         return 1;
+ *     }
+ *     uint64_t index;
+ *     if (zarvo_find(archive, "road/of/one.txt", ZARVO_WHOLE, &index, NULL) == ZARVO_OK) {
+ *         char piece[4096];
+ *         size_t count;
+ *         if (zarvo_read(archive, index, 0, piece, sizeof(piece), &count, NULL) == ZARVO_OK) ...
+ *     }
+ *     zarvo_close(archive);
+ *
+ * An archive is one stream of bytes, the data, cut into blocks that are stored as they are or compressed, and a
+ * directory of entries that name ranges of the data. The library opens all four layouts alike.
+ *
+ * Threads. One archive may be used by any number of threads at once, and so may functions that take no handle. A
+ * zarvo_stream, a zarvo_patterns and a zarvo_error belong to one thread at a time. An archive is closed when no call on
+ * it is under way and its streams have been freed. After fork(), parent and child may both go on with an archive that
+ * no call was using at that moment.
+ *
+ * Errors. What can fail returns a zarvo_code. The last parameter of such a function may be NULL; else it points to a
+ * pointer that is NULL, and a failure stores an error there, which the caller frees. Results that a function stores
+ * through pointers are unchanged after a failure unless its description says otherwise. A null pointer where an object
+ * is needed, and an index past the end, are ZARVO_ERROR_ARGUMENT, never a crash.
+ *
+ * Structures begin with struct_size, which the caller sets to sizeof the structure that it was compiled with (the
+ * _INIT macros do): a later version of the library adds fields at the end, and leaves those alone that a caller does
+ * not know.
+ *
+ * The process. The library writes to no output of the program's, and changes neither its signals, its working
+ * directory, its locale nor its environment. Memory that is refused for what an archive or a caller sizes is
+ * ZARVO_ERROR_MEMORY; only where the system refuses a few hundred bytes does the process end. Descriptors are opened
+ * with O_CLOEXEC. Callbacks must return: neither throw nor jump out.
+ */
+#ifndef ZARVO_H
+#define ZARVO_H
+
+#include <stddef.h>
+#include <stdint.h>
+
+#ifdef __cplusplus
+extern "C" {
+#endif
+
+#define ZARVO_API __attribute__((visibility("default")))
+
+/* For the length of a text that ends with a NUL. */
+#define ZARVO_WHOLE ((size_t)-1)
+
+/* The library's version, such as "0.2.0". */
+ZARVO_API const char* zarvo_version(void);
+
+/* ---- Errors ---------------------------------------------------------------------------------------------------- */
+
+typedef int32_t zarvo_code;
+enum {
+    ZARVO_OK = 0,
+    ZARVO_ERROR_ARGUMENT = 1, /* the call makes no sense: a null pointer, an index past the end, an unknown option */
+    ZARVO_ERROR_MEMORY = 2,   /* memory was refused */
+    ZARVO_ERROR_SYSTEM = 3,   /* the system, or a source's callback, reports an error: see zarvo_error_errno */
+    ZARVO_ERROR_NOT_AN_ARCHIVE = 4, /* no archive, a version that is not known, or a damaged header or directory */
+    ZARVO_ERROR_DAMAGED = 5,        /* data can't be decoded, ends too early, or lies outside the archive */
+    ZARVO_ERROR_UNSUPPORTED = 6,    /* the data needs a kind of compression that is not known */
+    ZARVO_ERROR_LIMIT = 7,          /* a limit of zarvo_open_options was reached */
+    ZARVO_ERROR_CHANGED = 8,        /* the archive's file has changed since it was opened */
+    ZARVO_ERROR_NOT_FOUND = 9       /* no entry has that path */
+};
+
+typedef struct zarvo_error zarvo_error;
+
+/* The code that the failed function returned. ZARVO_OK for NULL. */
+ZARVO_API zarvo_code zarvo_error_code(const zarvo_error* error);
+
+/* The errno behind ZARVO_ERROR_SYSTEM, else 0. */
+ZARVO_API int zarvo_error_errno(const zarvo_error* error);
+
+/* What went wrong, without a newline, in English, with the system's reason where there is one: "Permission denied". It
+ * does not name the archive. Control characters that came from an archive are not escaped. Never NULL; valid until the
+ * error is freed. */
+ZARVO_API const char* zarvo_error_text(const zarvo_error* error);
+
+/* Frees an error. NULL is allowed. */
+ZARVO_API void zarvo_error_free(zarvo_error* error);
+
+/* ---- Opening --------------------------------------------------------------------------------------------------- */
+
+typedef struct zarvo_archive zarvo_archive;
+
+/* Where the bytes come from when the library does not read them itself. */
+typedef struct zarvo_source {
+    size_t struct_size;
+    void* context;
+
+    /* Reads up to size bytes at offset into buffer. Returns how many were read (fewer than size only at the end), or a
+     * negative errno. From several threads at once where the archive is used by several. */
+    int64_t (*read_at)(void* context, void* buffer, size_t size, uint64_t offset);
+
+    /* Stores the number of bytes in *size; called once, when the archive is opened. Returns 0 or a negative errno. */
+    int (*get_size)(void* context, uint64_t* size);
+
+    /* Called when the archive is closed, or could not be opened. May be NULL. */
+    void (*close)(void* context);
+} zarvo_source;
+#define ZARVO_SOURCE_INIT                                                                                              \
+    { sizeof(zarvo_source), NULL, NULL, NULL, NULL }
+
+/* A zero, or NULL, asks for the default. */
+typedef struct zarvo_open_options {
+    size_t struct_size;
+
+    /* Where the archive begins: the first byte of the file, memory or source that belongs to it. Default: 0. */
+    uint64_t offset;
+
+    /* Limits, and ZARVO_ERROR_LIMIT where an archive goes beyond. What an error says names the limit. */
+    uint64_t max_entries;         /* entries of the directory. Default: 2^26 */
+    uint64_t max_directory_bytes; /* the directory and the list of blocks, decoded. Default: 2^32 */
+    uint64_t max_block_bytes; /* decoded bytes of one block held in memory. Blocks that can be decoded piece by piece
+                                 (LZMA) or are stored as they are may be larger. Default: 2^31 */
+
+    /* How much memory decoded blocks, and the states of streamed ones, may take while no call uses them. Blocks in use
+     * come on top. Default: 2^23 */
+    uint64_t cache_bytes;
+
+    /* Gets what the library has to say about an archive while it goes on, such as "Decompressing this format (7) is not
+     * supported on this platform.": one line without a newline, each once an archive. Called on the thread whose call
+     * found it, before that call returns, with no lock held; also by the functions that open. Default: nobody is told.
+     */
+    void (*log)(void* log_context, const char* message);
+    void* log_context;
+} zarvo_open_options;
+#define ZARVO_OPEN_OPTIONS_INIT                                                                                        \
+    { sizeof(zarvo_open_options), 0, 0, 0, 0, 0, NULL, NULL }
+
+/* Open an archive and read its header and directory; options may be NULL. *archive is to be closed with zarvo_close.
+ *
+ * path: any length. The file must be one that can be read at any place: a pipe, a socket or a terminal is refused (and
+ * a pipe is not waited for). */
+ZARVO_API zarvo_code zarvo_open_path(const char* path, const zarvo_open_options* options, zarvo_archive** archive,
+                                     zarvo_error** error);
+
+/* descriptor: stays the caller's, who may close it as soon as this returns. Its position is neither used nor moved. */
+ZARVO_API zarvo_code zarvo_open_descriptor(int descriptor, const zarvo_open_options* options, zarvo_archive** archive,
+                                           zarvo_error** error);
+
+/* data: must stay as it is until the archive is closed. */
+ZARVO_API zarvo_code zarvo_open_memory(const void* data, size_t size, const zarvo_open_options* options,
+                                       zarvo_archive** archive, zarvo_error** error);
+
+/* source: copied; its context stays the caller's until close is called. A size that is wrong, or reads that answer
+ * differently each time, end in errors or in wrong bytes, and in nothing worse. */
+ZARVO_API zarvo_code zarvo_open_source(const zarvo_source* source, const zarvo_open_options* options,
+                                       zarvo_archive** archive, zarvo_error** error);
+
+/* Closes an archive and frees all that was handed out of it: texts, too. NULL is allowed. */
+ZARVO_API void zarvo_close(zarvo_archive* archive);
+
+/* ---- What an archive is ---------------------------------------------------------------------------------------- */
+
+enum {
+    ZARVO_LAYOUT_FS = 0,     /* "ZarvoFS", block-based, whatever its signature */
+    ZARVO_LAYOUT_WEB = 1,    /* "ZarvoWeb", one LZMA stream */
+    ZARVO_LAYOUT_RAW = 2,    /* "ZarvoRaw", stored as is */
+    ZARVO_LAYOUT_ARCHIVE = 3 /* "ZarvoArchive" */
+};
+
+typedef struct zarvo_info {
+    size_t struct_size;
+    int32_t layout;              /* ZARVO_LAYOUT_... */
+    uint32_t version;            /* of the layout */
+    const char* engine_version;  /* what wrote the archive. Any bytes but NUL; valid until the archive is closed */
+    const char* engine_revision; /* as above */
+    uint64_t recorded_size;      /* of the archive, as its writer recorded it; 0 where it did not */
+    uint64_t file_size;          /* of the file, memory or source, from offset on */
+    uint64_t data_size;          /* of the data, decoded: the sum of the blocks' sizes */
+    uint64_t stored_size;        /* of the data, as the blocks are stored */
+    uint64_t block_count;
+    uint64_t largest_block;   /* decoded bytes */
+    uint64_t streamed_blocks; /* that can only be decoded from their start on */
+    uint64_t blocks_none;     /* by kind: stored as they are */
+    uint64_t blocks_lzma;
+    uint64_t blocks_lz4;
+    uint64_t blocks_lz4hc;
+    uint64_t blocks_unknown;
+    uint64_t entry_count; /* of the directory: files and folders, also repeated ones */
+    uint64_t file_count;
+    uint64_t folder_count;
+    uint64_t file_bytes; /* sum of the files' sizes, also repeated ones; UINT64_MAX if it would be more */
+} zarvo_info;
+#define ZARVO_INFO_INIT                                                                                                \
+    { sizeof(zarvo_info), 0, 0, NULL, NULL, 0, 0, 0, 0, 0, 0, 0, 0, 0, 0, 0, 0, 0, 0, 0, 0 }
+
+ZARVO_API zarvo_code zarvo_get_info(const zarvo_archive* archive, zarvo_info* info);
+
+/* ---- Entries --------------------------------------------------------------------------------------------------- */
+
+enum { ZARVO_FILE = 0, ZARVO_FOLDER = 1 };
+
+/* Why extraction refuses an entry. */
+enum {
+    ZARVO_PROBLEM_NONE = 0,
+    ZARVO_PROBLEM_PARENT = 1,   /* a component of the path is ".." */
+    ZARVO_PROBLEM_EMPTY = 2,    /* nothing is left of the path in its normal form */
+    ZARVO_PROBLEM_SEPARATOR = 3 /* the path of a file ends with a separator */
+};
+
+typedef struct zarvo_entry {
+    size_t struct_size;
+    const char* path;   /* as stored: any bytes but NUL, NUL-terminated, valid until the archive is closed */
+    size_t path_length; /* bytes */
+    int32_t kind;       /* ZARVO_FILE or ZARVO_FOLDER */
+    int32_t problem;    /* ZARVO_PROBLEM_... */
+    uint64_t size;      /* bytes of the file; of a folder, whatever is stored */
+    uint64_t offset;    /* of the first byte in the data; of a folder, whatever is stored */
+    uint32_t flags;     /* as stored */
+} zarvo_entry;
+#define ZARVO_ENTRY_INIT                                                                                               \
+    { sizeof(zarvo_entry), NULL, 0, 0, 0, 0, 0, 0 }
+
+/* The number of entries, which have the indices from 0 on, in the archive's order. 0 for NULL. */
+ZARVO_API uint64_t zarvo_entry_count(const zarvo_archive* archive);
+
+ZARVO_API zarvo_code zarvo_get_entry(const zarvo_archive* archive, uint64_t index, zarvo_entry* entry);
+
+/* A path has one normal form: "\" is "/", and empty and "." components are dropped. Paths with equal normal forms are
+ * one file on disk; of entries with equal ones the last counts. Writes the normal form, NUL-terminated, to out, which
+ * has room for length + 1 bytes and may be path itself, and returns its length. */
+ZARVO_API size_t zarvo_normalize_path(const char* path, size_t length, char* out);
+
+/* Items are what a folder can hold: the entries, and after them (from zarvo_entry_count on) the folders that are only
+ * implied by paths, such as "road" for "road/of/one.txt". Items are linked into a tree by their normal forms; an entry
+ * that a later one replaces, and one with a problem, is in no folder. A function that takes an item builds the tree at
+ * its first use. A file with entries below its path has children, too. */
+#define ZARVO_ROOT UINT64_MAX
+#define ZARVO_NO_ITEM (UINT64_MAX - 1)
+
+typedef struct zarvo_item {
+    size_t struct_size;
+    const char* name;      /* last component: not NUL-terminated, valid until the archive is closed */
+    size_t name_length;    /* bytes; 0 for ZARVO_ROOT */
+    int32_t kind;          /* ZARVO_FILE or ZARVO_FOLDER */
+    int32_t is_implied;    /* 1: no entry of its own */
+    uint64_t first_child;  /* the first item in it, in the archive's order, or ZARVO_NO_ITEM */
+    uint64_t next_sibling; /* the item after it in the same folder, or ZARVO_NO_ITEM */
+    size_t path_length;    /* of the normal form, in bytes */
+} zarvo_item;
+#define ZARVO_ITEM_INIT                                                                                                \
+    { sizeof(zarvo_item), NULL, 0, 0, 0, 0, 0, 0 }
+
+/* Finds what a path names, in whatever form: the last entry of equal ones, an implied folder, or ZARVO_ROOT for a path
+ * whose normal form is empty. ZARVO_ERROR_NOT_FOUND when there is none. */
+ZARVO_API zarvo_code zarvo_find(const zarvo_archive* archive, const char* path, size_t length, uint64_t* item,
+                                zarvo_error** error);
+
+/* item: an index of an entry, of an implied folder, or ZARVO_ROOT. */
+ZARVO_API zarvo_code zarvo_get_item(const zarvo_archive* archive, uint64_t item, zarvo_item* out, zarvo_error** error);
+
+/* Writes an item's normal form, NUL-terminated, to out, which has room for its path_length + 1 bytes. */
+ZARVO_API zarvo_code zarvo_get_item_path(const zarvo_archive* archive, uint64_t item, char* out, zarvo_error** error);
+
+/* Entries and implied folders together. 0 if the tree can't be built. */
+ZARVO_API uint64_t zarvo_item_count(const zarvo_archive* archive);
+
+/* ---- Reading --------------------------------------------------------------------------------------------------- */
+
+/* Reads up to size bytes of an entry, from byte offset of it on, into buffer, and stores how many in *count: fewer than
+ * size at the entry's end, 0 from there on (and always of a folder). After a failure *count says how many bytes before
+ * the damage are in the buffer. Blocks that were decoded are kept in the archive's cache. */
+ZARVO_API zarvo_code zarvo_read(zarvo_archive* archive, uint64_t index, uint64_t offset, void* buffer, size_t size,
+                                size_t* count, zarvo_error** error);
+
+/* Stores in *readable how many bytes from an entry's start can be read: its size, unless the archive is damaged.
+ * Decodes the blocks of the entry that have not been decoded before. What makes a byte unreadable: no decoder delivers
+ * it, or one before it in the same block. ZARVO_OK also for a damaged entry. */
+ZARVO_API zarvo_code zarvo_get_readable(zarvo_archive* archive, uint64_t index, uint64_t* readable,
+                                        zarvo_error** error);
+
+/* A file that is read from its start on. It goes on where the last read ended, also inside a block that can only be
+ * decoded from its start, however many are open. Frees nothing of the archive's and must be freed before it is closed.
+ */
+typedef struct zarvo_stream zarvo_stream;
+
+ZARVO_API zarvo_code zarvo_stream_open(zarvo_archive* archive, uint64_t index, zarvo_stream** stream,
+                                       zarvo_error** error);
+
+/* As zarvo_read, from the stream's position, which moves by *count. */
+ZARVO_API zarvo_code zarvo_stream_read(zarvo_stream* stream, void* buffer, size_t size, size_t* count,
+                                       zarvo_error** error);
+
+/* Moves the position, to any place. Going back inside a streamed block costs decoding it from its start. */
+ZARVO_API zarvo_code zarvo_stream_seek(zarvo_stream* stream, uint64_t position);
+
+/* NULL is allowed. */
+ZARVO_API void zarvo_stream_free(zarvo_stream* stream);
+
+/* ---- Blocks ---------------------------------------------------------------------------------------------------- */
+
+/* For tools that work block by block. Values other than these are met, too. */
+enum {
+    ZARVO_KIND_NONE = 0, /* stored as is */
+    ZARVO_KIND_LZMA = 1,
+    ZARVO_KIND_LZ4 = 2,
+    ZARVO_KIND_LZ4HC = 3
+};
+
+typedef struct zarvo_block {
+    size_t struct_size;
+    uint64_t position;    /* in the data */
+    uint32_t size;        /* decoded bytes */
+    uint32_t stored_size; /* in the archive, as recorded */
+    int32_t kind;         /* ZARVO_KIND_..., or another value up to 63 */
+    int32_t is_streamed;  /* 1: it can only be decoded from its start on, as one stream */
+} zarvo_block;
+#define ZARVO_BLOCK_INIT                                                                                               \
+    { sizeof(zarvo_block), 0, 0, 0, 0, 0 }
+
+ZARVO_API uint64_t zarvo_block_count(const zarvo_archive* archive);
+ZARVO_API zarvo_code zarvo_get_block(const zarvo_archive* archive, uint64_t index, zarvo_block* block);
+
+/* Decodes a whole block into buffer, which has room for its size, past the cache, and stores in *count how many bytes
+ * were delivered: all of them, or, after a failure, those before the damage. */
+ZARVO_API zarvo_code zarvo_read_block(zarvo_archive* archive, uint64_t index, void* buffer, size_t* count,
+                                      zarvo_error** error);
+
+/* ---- Patterns -------------------------------------------------------------------------------------------------- */
+
+/* Paths and globs that choose entries. A glob is matched with whole paths: "*", "?" (one character) and "[...]" stop at
+ * "/" and take leading dots, "**" takes everything ("**" + "/x" also a top-level "x"), "\" takes the next character as
+ * it is. A leading or trailing "/" and a leading "./" change nothing; an empty pattern and "/" are everything. What
+ * matches a folder takes all below it, also a folder that is only implied. A pattern is also taken literally; matches
+ * add up. */
+typedef struct zarvo_patterns zarvo_patterns;
+
+ZARVO_API zarvo_code zarvo_patterns_new(zarvo_patterns** patterns, zarvo_error** error);
+ZARVO_API zarvo_code zarvo_patterns_add(zarvo_patterns* patterns, const char* pattern, size_t length,
+                                        zarvo_error** error);
+
+/* Whether any pattern matches a path, as it is stored or in its normal form: 1 or 0, or -1 when memory is refused.
+ * Those that do are remembered as used. */
+ZARVO_API int zarvo_patterns_match(zarvo_patterns* patterns, const char* path, size_t length);
+
+/* Whether pattern number index, in the order of adding, has matched a path so far: 1 or 0. */
+ZARVO_API int zarvo_patterns_used(const zarvo_patterns* patterns, size_t index);
+
+/* NULL is allowed. */
+ZARVO_API void zarvo_patterns_free(zarvo_patterns* patterns);
+
+#ifdef __cplusplus
+}
+#endif
+
+#endif

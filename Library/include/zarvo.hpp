@@ -1,0 +1,415 @@
+// SPDX-License-Identifier: MIT
+// libzarvo for C++20, on top of zarvo.h, which is the manual: the same operations with owners and ranges. Header only.
+//
+//     auto archive = zarvo::archive::open("game.zarvo");
+//     if (!archive) return fail(archive.error().text());
+//     for (const zarvo::entry entry : archive->entries())
+//         if (entry.is_file()) use(entry.path(), entry.size());
+//
+// Nothing of it throws, and programs without exceptions may use it. Where there are exceptions, one that leaves a
+// callback (a source, a log function) is caught before it can reach the library, and is thrown again when the call that
+// met it returns; a source that throws has failed to read.
+//
+// Threads: as zarvo.h says of the handles. Views of texts are valid until their archive is destroyed.
+#pragma once
+
+#include "zarvo.h"
+
+#include <cerrno>
+#include <cstddef>
+#include <exception>
+#include <functional>
+#include <iterator>
+#include <memory>
+#include <optional>
+#include <span>
+#include <string>
+#include <string_view>
+#include <utility>
+
+namespace zarvo {
+
+// Why an operation failed; false when it did not.
+class error {
+public:
+    error() = default;
+    explicit error(zarvo_error* owned) : m_Error(owned) {}
+    error(error&& other) noexcept : m_Error(std::exchange(other.m_Error, nullptr)) {}
+    error& operator=(error&& other) noexcept {
+        std::swap(m_Error, other.m_Error);
+        return *this;
+    }
+    ~error() { zarvo_error_free(m_Error); }
+
+    explicit operator bool() const { return m_Error != nullptr; }
+    zarvo_code code() const { return zarvo_error_code(m_Error); }
+    int system_code() const { return zarvo_error_errno(m_Error); } // an errno, or 0
+    std::string_view text() const { return zarvo_error_text(m_Error); }
+
+private:
+    zarvo_error* m_Error = nullptr;
+};
+
+// A value, or why there is none. The value may be asked for when the result is true.
+template <typename T>
+class [[nodiscard]] result {
+public:
+    result(T value) : m_Value(std::move(value)) {}
+    result(zarvo::error why) : m_Error(std::move(why)) {}
+
+    explicit operator bool() const { return m_Value.has_value(); }
+    T& operator*() & { return *m_Value; }
+    const T& operator*() const& { return *m_Value; }
+    T&& operator*() && { return std::move(*m_Value); }
+    T* operator->() { return &*m_Value; }
+    const T* operator->() const { return &*m_Value; }
+    const zarvo::error& error() const& { return m_Error; }
+    zarvo::error error() && { return std::move(m_Error); }
+
+private:
+    std::optional<T> m_Value;
+    zarvo::error m_Error;
+};
+
+namespace detail {
+
+// The exception of a callback, on its way past the library. Programs without exceptions never have one.
+inline thread_local std::exception_ptr pending;
+
+// Calls what a caller handed in; failed is the answer when it throws.
+template <typename Call, typename Answer>
+Answer guard(Call&& call, Answer failed) noexcept {
+#if defined(__cpp_exceptions)
+    try {
+        return call();
+    } catch (...) {
+        pending = std::current_exception();
+        return failed;
+    }
+#else
+    (void)failed;
+    return call();
+#endif
+}
+
+inline void rethrow() {
+#if defined(__cpp_exceptions)
+    if (pending) std::rethrow_exception(std::exchange(pending, nullptr));
+#endif
+}
+
+// Makes a call whose last parameter receives the error, and answers that error. Rethrow once the results are owned.
+template <typename Call>
+error check(Call&& call) {
+    zarvo_error* failure = nullptr;
+    (void)call(&failure); // the error says it all
+    return error(failure);
+}
+
+} // namespace detail
+
+// Where the bytes of an archive come from when the library does not read them itself. Both operations may be called
+// from several threads at once where the archive is used by several.
+class source {
+public:
+    virtual ~source() = default;
+
+    // Reads at most buffer.size() bytes at offset: how many (fewer only at the end), or a negative errno.
+    virtual int64_t read_at(std::span<std::byte> buffer, uint64_t offset) = 0;
+
+    // How many bytes there are, or why that can't be told, as a negative errno.
+    virtual int64_t size() = 0;
+};
+
+// See zarvo_open_options; 0 is the default of each.
+struct open_options {
+    uint64_t offset = 0;
+    uint64_t max_entries = 0;
+    uint64_t max_directory_bytes = 0;
+    uint64_t max_block_bytes = 0;
+    uint64_t cache_bytes = 0;
+    std::function<void(std::string_view message)> log;
+};
+
+// One entry of the directory.
+class entry {
+public:
+    entry(const zarvo_archive* archive, uint64_t index) : m_Index(index) {
+        (void)zarvo_get_entry(archive, index, &m_Entry); // the index is the archive's own
+    }
+
+    uint64_t index() const { return m_Index; }
+    std::string_view path() const { return {m_Entry.path, m_Entry.path_length}; }
+    bool is_file() const { return m_Entry.kind == ZARVO_FILE; }
+    bool is_folder() const { return m_Entry.kind == ZARVO_FOLDER; }
+    uint64_t size() const { return m_Entry.size; }
+    uint64_t offset() const { return m_Entry.offset; }
+    uint32_t flags() const { return m_Entry.flags; }
+    int32_t problem() const { return m_Entry.problem; } // ZARVO_PROBLEM_...
+
+private:
+    uint64_t m_Index;
+    zarvo_entry m_Entry = ZARVO_ENTRY_INIT;
+};
+
+// All entries, in the archive's order.
+class entry_range {
+public:
+    class iterator {
+    public:
+        using value_type = entry;
+        using difference_type = std::ptrdiff_t;
+        using iterator_concept = std::random_access_iterator_tag;
+        using iterator_category = std::input_iterator_tag; // what it points to is made anew each time
+
+        iterator() = default;
+        iterator(const zarvo_archive* archive, uint64_t index) : m_Archive(archive), m_Index(index) {}
+
+        entry operator*() const { return {m_Archive, m_Index}; }
+        entry operator[](difference_type count) const { return *(*this + count); }
+        iterator& operator++() { return *this += 1; }
+        iterator& operator--() { return *this -= 1; }
+        iterator operator++(int) { return std::exchange(*this, *this + 1); }
+        iterator operator--(int) { return std::exchange(*this, *this - 1); }
+        iterator& operator+=(difference_type count) {
+            m_Index += static_cast<uint64_t>(count);
+            return *this;
+        }
+        iterator& operator-=(difference_type count) { return *this += -count; }
+        friend iterator operator+(iterator from, difference_type count) { return from += count; }
+        friend iterator operator+(difference_type count, iterator from) { return from += count; }
+        friend iterator operator-(iterator from, difference_type count) { return from -= count; }
+        friend difference_type operator-(const iterator& a, const iterator& b) {
+            return static_cast<difference_type>(a.m_Index - b.m_Index);
+        }
+        friend bool operator==(const iterator& a, const iterator& b) { return a.m_Index == b.m_Index; }
+        friend auto operator<=>(const iterator& a, const iterator& b) { return a.m_Index <=> b.m_Index; }
+
+    private:
+        const zarvo_archive* m_Archive = nullptr;
+        uint64_t m_Index = 0;
+    };
+
+    explicit entry_range(const zarvo_archive* archive) : m_Archive(archive) {}
+    iterator begin() const { return {m_Archive, 0}; }
+    iterator end() const { return {m_Archive, size()}; }
+    uint64_t size() const { return zarvo_entry_count(m_Archive); }
+    bool empty() const { return size() == 0; }
+    entry operator[](uint64_t index) const { return {m_Archive, index}; }
+
+private:
+    const zarvo_archive* m_Archive;
+};
+
+// What a read delivered. Bytes that lie before damage are delivered although there is an error.
+struct [[nodiscard]] read_result {
+    size_t count = 0;
+    zarvo::error error;
+};
+
+// A file that is read from its start on. Its archive must outlive it. See zarvo_stream.
+class stream {
+public:
+    explicit stream(zarvo_stream* owned) : m_Stream(owned) {}
+
+    // Into the front of buffer; 0 bytes at the end.
+    read_result read(std::span<std::byte> buffer) {
+        read_result read;
+        read.error = detail::check([&](zarvo_error** failure) {
+            return zarvo_stream_read(m_Stream.get(), buffer.data(), buffer.size(), &read.count, failure);
+        });
+        detail::rethrow();
+        return read;
+    }
+    void seek(uint64_t position) { (void)zarvo_stream_seek(m_Stream.get(), position); }
+
+private:
+    struct free_stream {
+        void operator()(zarvo_stream* stream) const { zarvo_stream_free(stream); }
+    };
+    std::unique_ptr<zarvo_stream, free_stream> m_Stream;
+};
+
+// An open archive.
+class archive {
+public:
+    static result<archive> open(const char* path, open_options options = {}) {
+        return open_with(std::move(options), nullptr, [&](auto... rest) { return zarvo_open_path(path, rest...); });
+    }
+    static result<archive> open(const std::string& path, open_options options = {}) {
+        return open(path.c_str(), std::move(options));
+    }
+    static result<archive> open(int descriptor, open_options options = {}) {
+        return open_with(std::move(options), nullptr,
+                         [&](auto... rest) { return zarvo_open_descriptor(descriptor, rest...); });
+    }
+    // data must stay as it is until the archive is destroyed.
+    static result<archive> open(std::span<const std::byte> data, open_options options = {}) {
+        return open_with(std::move(options), nullptr,
+                         [&](auto... rest) { return zarvo_open_memory(data.data(), data.size(), rest...); });
+    }
+    static result<archive> open(std::unique_ptr<source> from, open_options options = {}) {
+        zarvo_source callbacks = ZARVO_SOURCE_INIT;
+        callbacks.context = from.get();
+        callbacks.read_at = [](void* context, void* buffer, size_t size, uint64_t offset) {
+            return detail::guard(
+                [&] {
+                    return static_cast<source*>(context)->read_at({static_cast<std::byte*>(buffer), size}, offset);
+                },
+                int64_t{-EIO});
+        };
+        callbacks.get_size = [](void* context, uint64_t* size) {
+            const int64_t answer = detail::guard([&] { return static_cast<source*>(context)->size(); }, int64_t{-EIO});
+            if (answer < 0) return static_cast<int>(answer);
+            *size = static_cast<uint64_t>(answer);
+            return 0;
+        };
+        return open_with(std::move(options), std::move(from),
+                         [&](auto... rest) { return zarvo_open_source(&callbacks, rest...); });
+    }
+
+    // For the operations of zarvo.h. Stays this object's.
+    zarvo_archive* get() const { return m_Archive.get(); }
+
+    zarvo_info info() const {
+        zarvo_info info = ZARVO_INFO_INIT;
+        (void)zarvo_get_info(get(), &info);
+        return info;
+    }
+    entry_range entries() const { return entry_range(get()); }
+
+    // What a path names: see zarvo_find.
+    result<uint64_t> find(std::string_view path) const {
+        uint64_t item = ZARVO_NO_ITEM;
+        error failure =
+            detail::check([&](zarvo_error** why) { return zarvo_find(get(), path.data(), path.size(), &item, why); });
+        detail::rethrow();
+        if (failure) return failure;
+        return item;
+    }
+    result<zarvo_item> item(uint64_t index) const {
+        zarvo_item item = ZARVO_ITEM_INIT;
+        error failure = detail::check([&](zarvo_error** why) { return zarvo_get_item(get(), index, &item, why); });
+        detail::rethrow();
+        if (failure) return failure;
+        return item;
+    }
+
+    // A range of an entry, into the front of buffer.
+    read_result read(uint64_t index, uint64_t offset, std::span<std::byte> buffer) {
+        read_result read;
+        read.error = detail::check([&](zarvo_error** why) {
+            return zarvo_read(get(), index, offset, buffer.data(), buffer.size(), &read.count, why);
+        });
+        detail::rethrow();
+        return read;
+    }
+    result<stream> open_stream(uint64_t index) {
+        zarvo_stream* opened = nullptr;
+        error failure = detail::check([&](zarvo_error** why) { return zarvo_stream_open(get(), index, &opened, why); });
+        stream made(opened);
+        detail::rethrow();
+        if (failure) return failure;
+        return made;
+    }
+    result<uint64_t> readable(uint64_t index) {
+        uint64_t readable = 0;
+        error failure =
+            detail::check([&](zarvo_error** why) { return zarvo_get_readable(get(), index, &readable, why); });
+        detail::rethrow();
+        if (failure) return failure;
+        return readable;
+    }
+
+    uint64_t block_count() const { return zarvo_block_count(get()); }
+    zarvo_block block(uint64_t index) const {
+        zarvo_block block = ZARVO_BLOCK_INIT;
+        (void)zarvo_get_block(get(), index, &block);
+        return block;
+    }
+    // buffer has room for the whole block.
+    read_result read_block(uint64_t index, std::span<std::byte> buffer) {
+        read_result read;
+        read.error = detail::check(
+            [&](zarvo_error** why) { return zarvo_read_block(get(), index, buffer.data(), &read.count, why); });
+        detail::rethrow();
+        return read;
+    }
+
+private:
+    // What the library calls back, at an address that stays.
+    struct callbacks {
+        std::function<void(std::string_view message)> log;
+        std::unique_ptr<source> from;
+    };
+    struct close_archive {
+        void operator()(zarvo_archive* archive) const { zarvo_close(archive); }
+    };
+
+    archive(std::unique_ptr<callbacks> called, zarvo_archive* owned)
+        : m_Callbacks(std::move(called)), m_Archive(owned) {}
+
+    template <typename Open>
+    static result<archive> open_with(open_options options, std::unique_ptr<source> from, Open&& open) {
+        std::unique_ptr<callbacks> called(new callbacks{std::move(options.log), std::move(from)});
+        zarvo_open_options plain = ZARVO_OPEN_OPTIONS_INIT;
+        plain.offset = options.offset;
+        plain.max_entries = options.max_entries;
+        plain.max_directory_bytes = options.max_directory_bytes;
+        plain.max_block_bytes = options.max_block_bytes;
+        plain.cache_bytes = options.cache_bytes;
+        if (called->log) {
+            plain.log = [](void* context, const char* message) {
+                (void)detail::guard(
+                    [&] {
+                        static_cast<callbacks*>(context)->log(message);
+                        return true;
+                    },
+                    false);
+            };
+            plain.log_context = called.get();
+        }
+        zarvo_archive* opened = nullptr;
+        error failure = detail::check([&](zarvo_error** why) { return open(&plain, &opened, why); });
+        archive made(std::move(called), opened);
+        detail::rethrow();
+        if (failure) return failure;
+        return made;
+    }
+
+    std::unique_ptr<callbacks> m_Callbacks; // outlives the archive that calls them
+    std::unique_ptr<zarvo_archive, close_archive> m_Archive;
+};
+
+// See zarvo_normalize_path.
+inline std::string normalize_path(std::string_view path) {
+    std::string normal(path.size() + 1, '\0');
+    normal.resize(zarvo_normalize_path(path.data(), path.size(), normal.data()));
+    return normal;
+}
+
+// See zarvo_patterns. When memory is refused, a pattern is not added and nothing matches.
+class patterns {
+public:
+    patterns() {
+        zarvo_patterns* made = nullptr;
+        (void)zarvo_patterns_new(&made, nullptr);
+        m_Patterns.reset(made);
+    }
+
+    error add(std::string_view pattern) {
+        return detail::check([&](zarvo_error** why) {
+            return zarvo_patterns_add(m_Patterns.get(), pattern.data(), pattern.size(), why);
+        });
+    }
+    bool match(std::string_view path) { return zarvo_patterns_match(m_Patterns.get(), path.data(), path.size()) == 1; }
+    bool is_used(size_t index) const { return zarvo_patterns_used(m_Patterns.get(), index) == 1; }
+
+private:
+    struct free_patterns {
+        void operator()(zarvo_patterns* patterns) const { zarvo_patterns_free(patterns); }
+    };
+    std::unique_ptr<zarvo_patterns, free_patterns> m_Patterns;
+};
+
+} // namespace zarvo
