@@ -120,7 +120,7 @@ typedef struct zarvo_open_options {
 
     /* Limits, and ZARVO_ERROR_LIMIT where an archive goes beyond. What an error says names the limit. */
     uint64_t max_entries;         /* entries of the directory. Default: 2^26 */
-    uint64_t max_directory_bytes; /* the directory and the list of blocks, decoded. Default: 2^32 */
+    uint64_t max_directory_bytes; /* the directory and the list of blocks, decoded. Default: 2^30 */
     uint64_t max_block_bytes; /* decoded bytes of one block held in memory. Blocks that can be decoded piece by piece
                                  (LZMA) or are stored as they are may be larger. Default: 2^31 */
 

@@ -1,0 +1,93 @@
+// Decodes the blocks of an archive, past the reader's cache and locks. What can be read of a damaged block is settled
+// here for everybody: the bytes before the first that its decoder does not deliver, however they are asked for.
+//
+//   kind                              decoded
+//   none, or two equal sizes          as they are stored (of a streamed block: kind none alone)
+//   LZ4, LZ4HC                        whole
+//   LZ4, LZ4HC, streamed              never: LZ4 has no streams
+//   LZMA                              whole, or piece by piece by a StreamCursor
+//   any other                         never
+//
+// Any thread; a cursor belongs to one thread at a time.
+#pragma once
+
+#include "Library/LzmaCoder.h"
+#include "Library/Source.h"
+#include "Runtime/Core/Containers/DynamicArray.h"
+#include "Runtime/VirtualFileSystem/ArchiveFileSystem/ArchiveStorageReader.h"
+
+class BlockDecoder : private NonCopyable {
+public:
+    using Block = ArchiveStorageReader::Block;
+
+    // Both outlive the decoder.
+    BlockDecoder(const ArchiveStorageReader* reader, const Source* source) : m_Reader(reader), m_Source(source) {}
+
+    UInt32 BlockCount() const { return m_Reader->GetBlockCount(); }
+    Block GetBlock(UInt32 index) const { return m_Reader->GetBlock(index); }
+    UInt64 DataSize() const;
+
+    // The block that holds a position below DataSize. Blocks without bytes hold none.
+    UInt32 FindBlock(UInt64 position) const;
+
+    static bool IsStoredAsIs(const Block& block);
+    static bool IsLzma(const Block& block) { return block.type == kCompressionLzma && !IsStoredAsIs(block); }
+
+    // Reads bytes [offset, offset + size) of a block that is stored as is. *count is how many are there.
+    zarvo_code ReadStoredAsIs(UInt32 index, UInt64 offset, void* out, size_t size, size_t* count,
+                              Failure* failure) const;
+
+    // Decodes a whole block into out, which has room for its size. *count is how many bytes can be read, also after a
+    // failure.
+    zarvo_code DecodeWhole(UInt32 index, UInt8* out, size_t* count, Failure* failure) const;
+
+private:
+    friend class StreamCursor;
+
+    // Reads stored bytes [from, from + size) of a block; *count is how many the archive has.
+    zarvo_code ReadStored(const Block& block, UInt64 from, void* out, size_t size, size_t* count,
+                          Failure* failure) const;
+    zarvo_code DecodeLoaded(UInt32 index, const Block& block, const dynamic_array<UInt8>& stored, UInt8* out,
+                            size_t* count, Failure* failure) const;
+
+    const ArchiveStorageReader* m_Reader;
+    const Source* m_Source;
+};
+
+// A place inside an LZMA block from which decoding can go on.
+class StreamCursor : private NonCopyable {
+public:
+    StreamCursor(const BlockDecoder* decoder, UInt32 blockIndex)
+        : m_Decoder(decoder),
+          m_BlockIndex(blockIndex),
+          m_Block(decoder->GetBlock(blockIndex)),
+          m_Input(kMemLabelFileSystem),
+          m_Skipped(kMemLabelFileSystem) {}
+
+    UInt32 BlockIndex() const { return m_BlockIndex; }
+    UInt64 Position() const { return m_Position; } // of the next byte that decoding makes
+    UInt64 MemoryUsed() const { return sizeof(*this) + 2 * kPieceSize + m_Lzma.MemoryUsed(); }
+
+    // Reads bytes [offset, offset + size) of the block, starting it anew where offset lies before Position. *count is
+    // how many can be read, also after a failure.
+    zarvo_code Read(UInt64 offset, UInt8* out, size_t size, size_t* count, Failure* failure);
+
+private:
+    static constexpr size_t kPieceSize = 65'536; // of input, and of output that nobody asked for
+
+    zarvo_code Start(Failure* failure);
+    zarvo_code LoadInput(Failure* failure);
+    zarvo_code Decode(UInt8* out, size_t size, size_t* count, Failure* failure);
+
+    const BlockDecoder* m_Decoder;
+    const UInt32 m_BlockIndex;
+    const BlockDecoder::Block m_Block;
+    LzmaStream m_Lzma;
+    bool m_IsStarted = false;
+    bool m_IsBroken = false; // at m_Position
+    UInt64 m_Position = 0;
+    UInt64 m_Loaded = 0; // stored bytes that are or have been in m_Input
+    size_t m_InputUsed = 0;
+    dynamic_array<UInt8> m_Input;
+    dynamic_array<UInt8> m_Skipped;
+};

@@ -1,0 +1,68 @@
+// Finds entries by path, and links entries and implied folders into a tree. Built in one go, then only read: any
+// thread.
+//
+// An item is an entry (its number in the directory) or, after the entries, a folder that only paths imply. Of entries
+// with one normal form the last is the item; earlier ones, and entries with a problem, are in no folder.
+//
+// Takes 18 bytes an entry: a slot of the hash table of 8 bytes, filled to four fifths at most, and two links of 4.
+#pragma once
+
+#include "Library/Failure.h"
+#include "Library/PathRules.h"
+#include "Runtime/Core/Containers/DynamicArray.h"
+#include "Runtime/VirtualFileSystem/ArchiveFileSystem/ArchiveStorageHeader.h"
+
+class EntryIndex {
+public:
+    using Nodes = dynamic_array<ArchiveStorageHeader::Node>;
+
+    static constexpr UInt32 kNoItem = ~UInt32{0};
+    static constexpr UInt32 kRoot = kNoItem - 1;
+
+    // nodes outlives the index.
+    explicit EntryIndex(const Nodes& nodes);
+
+    // Once, before anything else.
+    [[nodiscard]] zarvo_code Build(Failure* failure);
+
+    UInt32 ItemCount() const { return static_cast<UInt32>(m_NextSibling.size()); }
+
+    // kNoItem when nothing has that path; kRoot when its normal form is empty.
+    UInt32 Find(core::string_ref path) const;
+
+    // In the archive's order; an implied folder stands where the last entry below it does. kNoItem at the end.
+    UInt32 FirstChild(UInt32 item) const { return item == kRoot ? m_FirstInRoot : m_FirstChild[item]; }
+    UInt32 NextSibling(UInt32 item) const { return m_NextSibling[item]; }
+
+    bool IsImplied(UInt32 item) const { return item >= m_Nodes.size(); }
+
+    // A text with the item's normal form, which lies in the directory.
+    core::string_ref Path(UInt32 item) const;
+
+private:
+    // A folder of no entry: the start of an entry's path.
+    struct ImpliedFolder {
+        UInt32 entry;
+        UInt32 length; // of its path; longer paths make no implied folders
+    };
+    // Empty where item is kNoItem.
+    struct Slot {
+        UInt32 hash;
+        UInt32 item;
+    };
+
+    UInt64 HashOf(core::string_ref path) const;
+    Slot& FindSlot(UInt64 hash, core::string_ref path);
+    [[nodiscard]] bool ReserveSlots(size_t count);
+    [[nodiscard]] bool LinkIntoFolders(UInt32 item, dynamic_array<UInt64>* hashes);
+    [[nodiscard]] bool AddImpliedFolder(UInt32 entry, size_t length, Slot* slot, UInt64 hash);
+    void PutInFront(UInt32 item, UInt32* first);
+
+    const Nodes& m_Nodes;
+    dynamic_array<ImpliedFolder> m_Implied;
+    dynamic_array<Slot> m_Slots;
+    dynamic_array<UInt32> m_FirstChild;
+    dynamic_array<UInt32> m_NextSibling;
+    UInt32 m_FirstInRoot = kNoItem;
+    UInt64 m_Seed = 0;
+};

@@ -1,0 +1,58 @@
+#include "Library/Messages.h"
+
+#include "Runtime/Utilities/LogAssert.h"
+#include "Runtime/Utilities/SpookyHash.h"
+
+#include <cstdio>
+#include <pthread.h>
+
+static constinit thread_local MessageScope* t_Innermost = nullptr;
+
+constexpr size_t kMaxMessages = 1000; // that are told apart: an archive full of damage has no more to say than that
+
+struct MessageHook {
+    // Handed every text that the runtime is about to print; the answer is that it is not to be printed.
+    static bool Collect(LogType, const char* format, va_list arguments) {
+        MessageScope* const scope = t_Innermost;
+        if (scope == nullptr || scope->m_Log == nullptr || scope->m_Collected.size() >= kMaxMessages) return false;
+        char text[512];
+        const int length = vsnprintf(text, sizeof(text), format, arguments);
+        if (length <= 0) return false;
+        size_t end = std::min(static_cast<size_t>(length), sizeof(text) - 1);
+        while (end != 0 && text[end - 1] == '\n')
+            --end;
+        const size_t index = scope->m_Collected.size();
+        if (scope->m_Collected.resize_initialized(index + 1)) scope->m_Collected[index].assign(text, end);
+        return false;
+    }
+};
+
+void InstallMessageHook() {
+    static pthread_once_t once = PTHREAD_ONCE_INIT;
+    pthread_once(&once, [] { gCurrentLogEntryHandler = MessageHook::Collect; });
+}
+
+void MessageLog::Tell(const core::string& message) {
+    if (m_Function != nullptr && !message.empty() && IsNew(message)) m_Function(m_Context, message.c_str());
+}
+
+bool MessageLog::IsNew(const core::string& message) {
+    UInt64 hash = 0;
+    UInt64 otherHalf = 0;
+    SpookyHash::Hash128(message.data(), message.size(), &hash, &otherHalf);
+    Mutex::AutoLock lock(m_Lock);
+    for (UInt64 told : m_Told)
+        if (told == hash) return false;
+    const size_t index = m_Told.size();
+    if (index == kMaxMessages || !m_Told.resize_uninitialized(index + 1)) return false;
+    m_Told[index] = hash;
+    return true;
+}
+
+MessageScope::MessageScope(MessageLog* log) : m_Log(log), m_Outer(t_Innermost) { t_Innermost = this; }
+
+MessageScope::~MessageScope() {
+    t_Innermost = m_Outer;
+    for (const core::string& message : m_Collected)
+        m_Log->Tell(message);
+}

@@ -1,0 +1,48 @@
+// What the runtime reports while the library works (failed checks, kinds of compression that are not supported) on its
+// way to the caller's log function. Reports happen deep inside, also under locks, so they are collected by thread and
+// told when the public call ends, on its thread, with no lock held.
+//
+//   MessageScope scope(&archive->m_Messages);   // first thing in a public call
+#pragma once
+
+#include "Runtime/Core/Containers/DynamicArray.h"
+#include "Runtime/Core/Containers/String.h"
+#include "Runtime/Core/NonCopyable.h"
+#include "Runtime/Threads/Mutex.h"
+
+// Where an archive's messages go. Any thread.
+class MessageLog : private NonCopyable {
+public:
+    using Function = void (*)(void* context, const char* message);
+
+    // function may be null: messages are dropped.
+    MessageLog(Function function, void* context) : m_Function(function), m_Context(context) {}
+
+    // Tells the message unless it has been told before. Calls the caller's function: hold no lock.
+    void Tell(const core::string& message);
+
+private:
+    bool IsNew(const core::string& message);
+
+    Function m_Function;
+    void* m_Context;
+    Mutex m_Lock;
+    dynamic_array<UInt64> m_Told VARNEX_GUARDED_BY(m_Lock); // hashes
+};
+
+// Collects this thread's reports for a log for the time of a call. Scopes nest: the innermost collects.
+class MessageScope : private NonCopyable {
+public:
+    explicit MessageScope(MessageLog* log);
+    ~MessageScope(); // tells them
+
+private:
+    friend struct MessageHook;
+
+    MessageLog* m_Log;
+    MessageScope* m_Outer;
+    dynamic_array<core::string> m_Collected;
+};
+
+// Takes over the runtime's reports: none reaches the program's output from here on. Called before the runtime is used.
+void InstallMessageHook();

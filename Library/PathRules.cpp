@@ -1,0 +1,76 @@
+#include "Library/PathRules.h"
+
+#include "Library/include/zarvo.h"
+#include "Runtime/Utilities/SpookyHash.h"
+
+bool PathComponents::Next() {
+    do {
+        m_Begin = m_End;
+        while (m_Begin < m_Path.size() && IsSeparator(m_Path[m_Begin]))
+            ++m_Begin;
+        m_End = m_Begin;
+        while (m_End < m_Path.size() && !IsSeparator(m_Path[m_End]))
+            ++m_End;
+    } while (m_End - m_Begin == 1 && m_Path[m_Begin] == '.');
+    return m_Begin != m_End;
+}
+
+core::string_ref LastComponent(core::string_ref path) {
+    size_t end = path.size();
+    while (true) {
+        while (end != 0 && IsSeparator(path[end - 1]))
+            --end;
+        size_t begin = end;
+        while (begin != 0 && !IsSeparator(path[begin - 1]))
+            --begin;
+        const bool isDot = end - begin == 1 && path[begin] == '.';
+        if (!isDot) return path.substr(begin, end - begin);
+        end = begin;
+    }
+}
+
+core::string_ref WithoutLastComponent(core::string_ref path) {
+    const core::string_ref last = LastComponent(path);
+    return path.substr(0, static_cast<size_t>(last.data() - path.data()));
+}
+
+bool IsSamePath(core::string_ref a, core::string_ref b) {
+    PathComponents atA(a);
+    PathComponents atB(b);
+    while (true) {
+        const bool hasA = atA.Next();
+        const bool hasB = atB.Next();
+        if (hasA != hasB) return false;
+        if (!hasA) return true;
+        if (!(atA.Name() == atB.Name())) return false;
+    }
+}
+
+SInt32 GetPathProblem(core::string_ref path, bool isFile) {
+    bool isEmpty = true;
+    for (PathComponents at(path); at.Next(); isEmpty = false)
+        if (at.Name() == "..") return ZARVO_PROBLEM_PARENT;
+    if (isEmpty) return ZARVO_PROBLEM_EMPTY;
+    if (isFile && IsSeparator(path.back())) return ZARVO_PROBLEM_SEPARATOR;
+    return ZARVO_PROBLEM_NONE;
+}
+
+UInt64 HashComponent(UInt64 folderHash, core::string_ref name) {
+    UInt64 otherHalf = folderHash;
+    SpookyHash::Hash128(name.data(), name.size(), &folderHash, &otherHalf);
+    return folderHash;
+}
+
+size_t zarvo_normalize_path(const char* path, size_t length, char* out) {
+    if (path == nullptr || out == nullptr) return 0;
+    if (length == ZARVO_WHOLE) length = strlen(path);
+    size_t written = 0;
+    for (PathComponents at(core::string_ref(path, length)); at.Next();) {
+        const core::string_ref name = at.Name();
+        if (written != 0) out[written++] = '/';
+        memmove(out + written, name.data(), name.size()); // out may be path: what is written lies at or before the name
+        written += name.size();
+    }
+    out[written] = '\0';
+    return written;
+}

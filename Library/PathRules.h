@@ -1,0 +1,43 @@
+// What a stored path means on disk, in a mount and for equality: its normal form. "\" is "/", and empty and "."
+// components are dropped. Any thread.
+#pragma once
+
+#include "Runtime/Core/Containers/StringRef.h"
+#include "Runtime/Core/Types.h"
+
+inline bool IsSeparator(char character) { return character == '/' || character == '\\'; }
+
+// The components of a path's normal form, from first to last.
+//
+//   for (PathComponents at(path); at.Next();) use(at.Name());
+class PathComponents {
+public:
+    explicit PathComponents(core::string_ref path) : m_Path(path) {}
+
+    // Moves to the next component; false after the last.
+    bool Next();
+
+    core::string_ref Name() const { return m_Path.substr(m_Begin, m_End - m_Begin); }
+    size_t End() const { return m_End; } // of Name, in the path
+
+private:
+    core::string_ref m_Path;
+    size_t m_Begin = 0;
+    size_t m_End = 0;
+};
+
+// The last component of the normal form: empty when there is none.
+core::string_ref LastComponent(core::string_ref path);
+
+// The path without its last component, for another look at it. Not in normal form.
+core::string_ref WithoutLastComponent(core::string_ref path);
+
+// Whether two paths have one normal form.
+bool IsSamePath(core::string_ref a, core::string_ref b);
+
+// Why extraction refuses an entry: ZARVO_PROBLEM_...
+SInt32 GetPathProblem(core::string_ref path, bool isFile);
+
+// The hash of a normal form, component by component: a folder's hash is on the way to those of what it holds. The hash
+// of the root is a seed, which nobody who makes an archive should know.
+UInt64 HashComponent(UInt64 folderHash, core::string_ref name);

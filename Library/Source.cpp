@@ -1,0 +1,200 @@
+#include "Library/Source.h"
+
+#include "Runtime/Allocator/Allocator.h"
+
+#include <algorithm>
+#include <cerrno>
+#include <cstring>
+#include <fcntl.h>
+#include <linux/fs.h>
+#include <sys/ioctl.h>
+#include <sys/stat.h>
+#include <unistd.h>
+
+zarvo_code Source::ReadAt(UInt64 position, void* buffer, size_t size, size_t* count, Failure* failure) const {
+    *count = 0;
+    if (position >= m_Size) return ZARVO_OK;
+    size = static_cast<size_t>(std::min<UInt64>(size, m_Size - position));
+    while (*count < size) {
+        size_t got = 0;
+        const zarvo_code code =
+            ReadSome(m_Offset + position + *count, static_cast<UInt8*>(buffer) + *count, size - *count, &got, failure);
+        if (code != ZARVO_OK) return code;
+        if (got == 0) break;
+        *count += got;
+    }
+    return CheckUnchanged(failure);
+}
+
+zarvo_code Source::SetRange(UInt64 wholeSize, UInt64 offset, Failure* failure) {
+    if (offset > wholeSize) return failure->Set(ZARVO_ERROR_NOT_AN_ARCHIVE, "the offset is past the end");
+    m_Offset = offset;
+    m_Size = wholeSize - offset;
+    return ZARVO_OK;
+}
+
+namespace {
+
+// An archive never takes the place of a standard stream that the program has closed.
+constexpr int kFirstOrdinaryDescriptor = 3;
+
+template <typename Call>
+auto RepeatOnInterrupt(Call&& call) {
+    auto answer = call();
+    while (answer == -1 && errno == EINTR)
+        answer = call();
+    return answer;
+}
+
+// What changes with a file's contents.
+struct Stamp {
+    explicit Stamp(const struct stat& status)
+        : size(status.st_size), modified(status.st_mtim), changed(status.st_ctim) {}
+
+    bool operator==(const Stamp& other) const {
+        return size == other.size && IsSame(modified, other.modified) && IsSame(changed, other.changed);
+    }
+    static bool IsSame(const timespec& a, const timespec& b) { return a.tv_sec == b.tv_sec && a.tv_nsec == b.tv_nsec; }
+
+    off_t size;
+    timespec modified;
+    timespec changed;
+};
+
+class FileSource final : public Source {
+public:
+    // Owns the descriptor.
+    FileSource(int descriptor, const struct stat& status) : m_Descriptor(descriptor), m_Stamp(status) {}
+    ~FileSource() override { close(m_Descriptor); }
+
+    zarvo_code Begin(UInt64 wholeSize, UInt64 offset, Failure* failure) { return SetRange(wholeSize, offset, failure); }
+
+private:
+    zarvo_code ReadSome(UInt64 position, void* buffer, size_t size, size_t* count, Failure* failure) const override {
+        const ssize_t got =
+            RepeatOnInterrupt([&] { return pread(m_Descriptor, buffer, size, static_cast<off_t>(position)); });
+        if (got < 0) return failure->SetSystem(errno);
+        *count = static_cast<size_t>(got);
+        return ZARVO_OK;
+    }
+
+    zarvo_code CheckUnchanged(Failure* failure) const override {
+        struct stat status;
+        if (fstat(m_Descriptor, &status) != 0) return failure->SetSystem(errno);
+        if (Stamp(status) == m_Stamp) return ZARVO_OK;
+        return failure->Set(ZARVO_ERROR_CHANGED, "the archive's file has changed since it was opened");
+    }
+
+    int m_Descriptor;
+    Stamp m_Stamp;
+};
+
+// Takes the descriptor over, also when it fails.
+zarvo_code OpenFile(int descriptor, UInt64 offset, Source** source, Failure* failure) {
+    struct stat status;
+    UInt64 size = 0;
+    zarvo_code code = ZARVO_OK;
+    if (fstat(descriptor, &status) != 0)
+        code = failure->SetSystem(errno);
+    else if (S_ISREG(status.st_mode))
+        size = static_cast<UInt64>(status.st_size);
+    else if (S_ISBLK(status.st_mode))
+        code = ioctl(descriptor, BLKGETSIZE64, &size) == 0 ? ZARVO_OK : failure->SetSystem(errno);
+    else if (S_ISDIR(status.st_mode))
+        code = failure->SetSystem(EISDIR);
+    else
+        code = failure->SetSystem(ESPIPE, "an archive must be a file that can be read at any place");
+    if (code != ZARVO_OK) {
+        close(descriptor);
+        return code;
+    }
+    FileSource* file = New<FileSource>(kMemLabelFileSystem, descriptor, status);
+    if (file == nullptr) {
+        close(descriptor);
+        return failure->SetMemory();
+    }
+    *source = file;
+    return file->Begin(size, offset, failure);
+}
+
+class MemorySource final : public Source {
+public:
+    explicit MemorySource(const void* data) : m_Data(static_cast<const UInt8*>(data)) {}
+
+    zarvo_code Begin(size_t size, UInt64 offset, Failure* failure) { return SetRange(size, offset, failure); }
+
+private:
+    zarvo_code ReadSome(UInt64 position, void* buffer, size_t size, size_t* count, Failure*) const override {
+        memcpy(buffer, m_Data + position, size);
+        *count = size;
+        return ZARVO_OK;
+    }
+
+    const UInt8* m_Data;
+};
+
+class CallbackSource final : public Source {
+public:
+    explicit CallbackSource(const zarvo_source& callbacks) : m_Callbacks(callbacks) {}
+    ~CallbackSource() override {
+        if (m_Callbacks.close != nullptr) m_Callbacks.close(m_Callbacks.context);
+    }
+
+    zarvo_code Begin(UInt64 offset, Failure* failure) {
+        uint64_t size = 0;
+        const int answer = m_Callbacks.get_size(m_Callbacks.context, &size);
+        if (answer != 0) return failure->SetSystem(answer < 0 ? -answer : EIO);
+        return SetRange(size, offset, failure);
+    }
+
+private:
+    zarvo_code ReadSome(UInt64 position, void* buffer, size_t size, size_t* count, Failure* failure) const override {
+        const int64_t answer = m_Callbacks.read_at(m_Callbacks.context, buffer, size, position);
+        if (answer < 0) return failure->SetSystem(answer < -INT32_MAX ? EIO : static_cast<int>(-answer));
+        if (static_cast<UInt64>(answer) > size) return failure->SetSystem(EIO, "a read delivered more than was asked");
+        *count = static_cast<size_t>(answer);
+        return ZARVO_OK;
+    }
+
+    zarvo_source m_Callbacks;
+};
+
+} // namespace
+
+zarvo_code OpenPath(const char* path, UInt64 offset, Source** source, Failure* failure) {
+    // O_NONBLOCK: a pipe is refused, and not waited for. It means nothing to files.
+    const int flags = O_RDONLY | O_CLOEXEC | O_NONBLOCK | O_NOCTTY;
+    int descriptor = RepeatOnInterrupt([&] { return open(path, flags); });
+    if (descriptor >= 0 && descriptor < kFirstOrdinaryDescriptor) {
+        const int moved = fcntl(descriptor, F_DUPFD_CLOEXEC, kFirstOrdinaryDescriptor);
+        const int error = errno;
+        close(descriptor);
+        errno = error;
+        descriptor = moved;
+    }
+    if (descriptor < 0) return failure->SetSystem(errno);
+    return OpenFile(descriptor, offset, source, failure);
+}
+
+zarvo_code OpenDescriptor(int descriptor, UInt64 offset, Source** source, Failure* failure) {
+    const int copy = fcntl(descriptor, F_DUPFD_CLOEXEC, kFirstOrdinaryDescriptor);
+    if (copy < 0) return failure->SetSystem(errno);
+    return OpenFile(copy, offset, source, failure);
+}
+
+zarvo_code OpenMemory(const void* data, size_t size, UInt64 offset, Source** source, Failure* failure) {
+    MemorySource* memory = New<MemorySource>(kMemLabelFileSystem, data);
+    if (memory == nullptr) return failure->SetMemory();
+    *source = memory;
+    return memory->Begin(size, offset, failure);
+}
+
+zarvo_code OpenCallbacks(const zarvo_source& callbacks, UInt64 offset, Source** source, Failure* failure) {
+    CallbackSource* called = New<CallbackSource>(kMemLabelFileSystem, callbacks);
+    if (called == nullptr) {
+        if (callbacks.close != nullptr) callbacks.close(callbacks.context);
+        return failure->SetMemory();
+    }
+    *source = called;
+    return called->Begin(offset, failure);
+}
