@@ -1,6 +1,6 @@
 #include "Library/BlockDecoder.h"
 
-#include "Library/Lz4Prefix.h"
+#include "Library/Lz4Coder.h"
 #include "Runtime/Allocator/Allocator.h"
 #include "Runtime/Utilities/Compression/Lz4Decompressor.h"
 
