@@ -23,11 +23,10 @@ zarvo_archive::~zarvo_archive() {
 }
 
 zarvo_code zarvo_archive::Open(Failure* failure) {
-    if (const zarvo_code code = SetUp(failure); code != ZARVO_OK) {
-        // The reader does not say why the file failed, nor whether it did.
-        if (m_File.FirstFailure().code != ZARVO_OK) *failure = m_File.FirstFailure();
-        return failure->code;
-    }
+    const zarvo_code code = SetUp(failure);
+    // The reader does not say why the file failed, and may take a failed read for the file's end.
+    if (m_File.FirstFailure().code != ZARVO_OK) *failure = m_File.FirstFailure();
+    if (code != ZARVO_OK || failure->code != ZARVO_OK) return failure->code;
     if (Nodes().size() > m_Options.max_entries)
         return failure->Set(ZARVO_ERROR_LIMIT, "%llu entries; the limit (max_entries) is %llu",
                             static_cast<unsigned long long>(Nodes().size()),

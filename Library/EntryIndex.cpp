@@ -34,8 +34,7 @@ UInt64 EntryIndex::HashOf(core::string_ref path) const {
 // The slot of the item with that path, or the empty one where it belongs.
 EntryIndex::Slot& EntryIndex::FindSlot(UInt64 hash, core::string_ref path) {
     const UInt32 shortHash = static_cast<UInt32>(hash);
-    // The upper half of the hash, as a fraction of the table.
-    size_t index = static_cast<size_t>(((hash >> 32) * m_Slots.size()) >> 32);
+    size_t index = StartOf(shortHash);
     while (m_Slots[index].item != kNoItem) {
         if (m_Slots[index].hash == shortHash && IsSamePath(Path(m_Slots[index].item), path)) break;
         if (++index == m_Slots.size()) index = 0;
@@ -61,8 +60,10 @@ bool EntryIndex::ReserveSlots(size_t count) {
         slot.item = kNoItem;
     for (const Slot& slot : old) {
         if (slot.item == kNoItem) continue;
-        const core::string_ref path = Path(slot.item);
-        FindSlot(HashOf(path), path) = slot;
+        size_t index = StartOf(slot.hash);
+        while (m_Slots[index].item != kNoItem)
+            if (++index == m_Slots.size()) index = 0;
+        m_Slots[index] = slot;
     }
     return true;
 }

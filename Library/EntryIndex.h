@@ -52,6 +52,8 @@ private:
     };
 
     UInt64 HashOf(core::string_ref path) const;
+    // Where the search for a hash begins: as far into the table as the hash is into its range.
+    size_t StartOf(UInt32 hash) const { return static_cast<size_t>((UInt64{hash} * m_Slots.size()) >> 32); }
     Slot& FindSlot(UInt64 hash, core::string_ref path);
     [[nodiscard]] bool ReserveSlots(size_t count);
     [[nodiscard]] bool LinkIntoFolders(UInt32 item, dynamic_array<UInt64>* hashes);

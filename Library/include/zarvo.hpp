@@ -128,7 +128,7 @@ struct open_options {
     uint64_t max_directory_bytes = 0;
     uint64_t max_block_bytes = 0;
     uint64_t cache_bytes = 0;
-    std::function<void(std::string_view message)> log;
+    std::function<void(std::string_view message)> log = {};
 };
 
 // One entry of the directory.

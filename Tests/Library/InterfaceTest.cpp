@@ -1,0 +1,194 @@
+// What programs that are already compiled rely on: names, sizes and places.
+#include "Tests/Library/LibraryTest.h"
+#include "Tests/Support/TemporaryFolder.h"
+
+#include <malloc.h>
+#include <regex>
+#include <set>
+#include <sys/wait.h>
+
+namespace {
+
+// What the library asks for; the request that requestsLeft counts down to is refused.
+int s_RequestsLeft = -1; // none
+
+std::set<std::string> NamesIn(const std::string& text, const char* pattern) {
+    const std::regex names(pattern);
+    std::set<std::string> found;
+    for (std::sregex_iterator match(text.begin(), text.end(), names), end; match != end; ++match)
+        found.insert((*match)[1]);
+    return found;
+}
+
+std::string OutputOf(const std::string& command) {
+    FILE* const pipe = popen(command.c_str(), "r");
+    std::string output;
+    for (int byte; pipe != nullptr && (byte = getc(pipe)) != EOF;)
+        output += static_cast<char>(byte);
+    EXPECT_EQ(0, pclose(pipe)) << command;
+    return output;
+}
+
+} // namespace
+
+extern "C" int posix_memalign(void** pointer, size_t align, size_t size) {
+    if (s_RequestsLeft > 0 && --s_RequestsLeft == 0) return ENOMEM;
+    *pointer = memalign(align, size);
+    return *pointer != nullptr ? 0 : ENOMEM;
+}
+
+TEST(Interface, LibraryExportsWhatTheHeaderDeclares) {
+    const std::string header = ReadFile(VARNEX_SOURCE_DIR "/Library/include/zarvo.h");
+    const std::string symbols = OutputOf("nm -D --defined-only --format=posix " ZARVO_LIBRARY);
+    EXPECT_EQ(NamesIn(header, "ZARVO_API[^;(]*[ *](zarvo_\\w+)\\("), NamesIn(symbols, "(zarvo_\\w+)@?\\S* T"));
+    EXPECT_EQ(std::set<std::string>{"ZARVO_0"}, NamesIn(symbols, "(?:^|\n)((?!zarvo_)\\w+)"));
+}
+
+TEST(Interface, StructuresAreWhereProgramsExpectThem) {
+    EXPECT_EQ(40u, sizeof(zarvo_source));
+    EXPECT_EQ(32u, offsetof(zarvo_source, close));
+    EXPECT_EQ(64u, sizeof(zarvo_open_options));
+    EXPECT_EQ(40u, offsetof(zarvo_open_options, cache_bytes));
+    EXPECT_EQ(56u, offsetof(zarvo_open_options, log_context));
+    EXPECT_EQ(160u, sizeof(zarvo_info));
+    EXPECT_EQ(152u, offsetof(zarvo_info, file_bytes));
+    EXPECT_EQ(56u, sizeof(zarvo_entry));
+    EXPECT_EQ(48u, offsetof(zarvo_entry, flags));
+    EXPECT_EQ(56u, sizeof(zarvo_item));
+    EXPECT_EQ(48u, offsetof(zarvo_item, path_length));
+    EXPECT_EQ(32u, sizeof(zarvo_block));
+    EXPECT_EQ(28u, offsetof(zarvo_block, is_streamed));
+    EXPECT_EQ(9, ZARVO_ERROR_NOT_FOUND);
+}
+
+// A program that was compiled with an older header gets what it knows, and no byte more.
+TEST(Interface, OlderStructuresAreFilledAsFarAsTheyGo) {
+    const std::string bytes = BuildArchive({.entries = {{.path = "a", .bytes = "text"}}}).bytes;
+    const zarvo::archive archive = OpenBytes(bytes);
+    zarvo_entry entry;
+    memset(&entry, 0x5A, sizeof(entry));
+    entry.struct_size = offsetof(zarvo_entry, kind);
+    EXPECT_EQ(ZARVO_OK, zarvo_get_entry(archive.get(), 0, &entry));
+    EXPECT_EQ(std::string("a"), entry.path);
+    EXPECT_EQ(1u, entry.path_length);
+    EXPECT_EQ(0x5A5A5A5A, entry.kind);
+    EXPECT_EQ(0x5A5A5A5Au, entry.flags);
+}
+
+TEST(Interface, NullAndPastTheEndAreArgumentErrors) {
+    const std::string bytes = BuildArchive({.entries = {{.path = "a", .bytes = "text"}}}).bytes;
+    zarvo::archive opened = OpenBytes(bytes);
+    zarvo_archive* const archive = opened.get();
+    zarvo_archive* none = nullptr;
+    zarvo_info info = ZARVO_INFO_INIT;
+    zarvo_entry entry = ZARVO_ENTRY_INIT;
+    zarvo_item item = ZARVO_ITEM_INIT;
+    zarvo_block block = ZARVO_BLOCK_INIT;
+    zarvo_stream* stream = nullptr;
+    uint64_t number = 0;
+    size_t count = 0;
+    char buffer[16];
+    const zarvo_code codes[] = {
+        zarvo_open_path(nullptr, nullptr, &none, nullptr),
+        zarvo_open_path("a", nullptr, nullptr, nullptr),
+        zarvo_open_descriptor(0, nullptr, nullptr, nullptr),
+        zarvo_open_memory(nullptr, 1, nullptr, &none, nullptr),
+        zarvo_open_source(nullptr, nullptr, &none, nullptr),
+        zarvo_get_info(nullptr, &info),
+        zarvo_get_info(archive, nullptr),
+        zarvo_get_entry(archive, 1, &entry),
+        zarvo_get_entry(archive, 0, nullptr),
+        zarvo_find(archive, nullptr, 0, &number, nullptr),
+        zarvo_find(nullptr, "a", 1, &number, nullptr),
+        zarvo_get_item(archive, 1, &item, nullptr),
+        zarvo_get_item(archive, ZARVO_NO_ITEM, &item, nullptr),
+        zarvo_get_item_path(archive, 0, nullptr, nullptr),
+        zarvo_read(archive, 1, 0, buffer, 1, &count, nullptr),
+        zarvo_read(archive, 0, 0, nullptr, 1, &count, nullptr),
+        zarvo_read(archive, 0, 0, buffer, 1, nullptr, nullptr),
+        zarvo_get_readable(archive, 0, nullptr, nullptr),
+        zarvo_stream_open(archive, 1, &stream, nullptr),
+        zarvo_stream_read(nullptr, buffer, 1, &count, nullptr),
+        zarvo_stream_seek(nullptr, 0),
+        zarvo_get_block(archive, 1, &block),
+        zarvo_read_block(archive, 0, nullptr, &count, nullptr),
+        zarvo_patterns_new(nullptr, nullptr),
+        zarvo_patterns_add(nullptr, "a", 1, nullptr),
+    };
+    for (size_t call = 0; call < std::size(codes); ++call)
+        EXPECT_EQ(ZARVO_ERROR_ARGUMENT, codes[call]) << "call " << call;
+    EXPECT_EQ(0u, zarvo_entry_count(nullptr));
+    zarvo_close(nullptr);
+    zarvo_stream_free(nullptr);
+    zarvo_patterns_free(nullptr);
+    zarvo_error_free(nullptr);
+    EXPECT_EQ(std::string(""), zarvo_error_text(nullptr));
+}
+
+// Each request of the library is refused once: an error that says so, or right bytes, and no crash.
+TEST(Interface, EachRefusedRequestForMemoryIsAnError) {
+    const std::string text = SampleText(30'000);
+    for (const bool isStreamed : {false, true}) {
+        const std::string bytes = BuildArchive({.entries = {{.path = "folder/text", .bytes = text}},
+                                                .type = isStreamed ? kCompressionLzma : kCompressionLz4HC,
+                                                .streamed = isStreamed,
+                                                .sectionType = kCompressionLzma})
+                                      .bytes;
+        bool isClean = false;
+        for (int refused = 1; !isClean; ++refused) {
+            SCOPED_TRACE(refused);
+            ASSERT_LT(refused, 1'000);
+            zarvo_archive* archive = nullptr;
+            uint64_t item = 0;
+            size_t count = 0;
+            std::string got(text.size(), '?');
+            zarvo_error* error = nullptr;
+            s_RequestsLeft = refused;
+            zarvo_code code = zarvo_open_memory(bytes.data(), bytes.size(), nullptr, &archive, &error);
+            if (code == ZARVO_OK) code = zarvo_find(archive, "folder/text", ZARVO_WHOLE, &item, &error);
+            if (code == ZARVO_OK) code = zarvo_read(archive, item, 0, got.data(), got.size() - 1, &count, &error);
+            isClean = s_RequestsLeft > 0;
+            s_RequestsLeft = -1;
+            EXPECT_EQ(code, zarvo_error_code(error));
+            const bool isRight = got.substr(0, count) == text.substr(0, text.size() - 1);
+            EXPECT_EQ(code == ZARVO_OK, isRight);
+            EXPECT_EQ(true, code == ZARVO_OK || !isClean) << code;
+            zarvo_error_free(error);
+            zarvo_close(archive);
+        }
+    }
+}
+
+#ifndef NDEBUG
+TEST(Interface, ClosedHandlesAreArgumentErrorsInDebugBuilds) {
+    const std::string bytes = BuildArchive({.entries = {{.path = "a", .bytes = "text"}}}).bytes;
+    zarvo_archive* archive = nullptr;
+    ASSERT_EQ(ZARVO_OK, zarvo_open_memory(bytes.data(), bytes.size(), nullptr, &archive, nullptr));
+    zarvo_stream* stream = nullptr;
+    ASSERT_EQ(ZARVO_OK, zarvo_stream_open(archive, 0, &stream, nullptr));
+    zarvo_close(archive);
+    char byte;
+    size_t count = 0;
+    EXPECT_EQ(ZARVO_ERROR_ARGUMENT, zarvo_read(archive, 0, 0, &byte, 1, &count, nullptr));
+    EXPECT_EQ(ZARVO_ERROR_ARGUMENT, zarvo_stream_read(stream, &byte, 1, &count, nullptr));
+    zarvo_stream_free(stream);
+    EXPECT_EQ(ZARVO_ERROR_ARGUMENT, zarvo_stream_read(stream, &byte, 1, &count, nullptr));
+    zarvo_close(archive);
+}
+#endif
+
+// A handle that no call uses works on in both processes after a fork.
+TEST(Interface, ArchiveIsReadInParentAndChild) {
+    const std::string text = SampleText(300'000);
+    const TemporaryFolder folder;
+    WriteFile(folder / "archive",
+              BuildArchive({.entries = {{.path = "a", .bytes = text}}, .type = kCompressionLz4}).bytes);
+    zarvo::archive archive = *zarvo::archive::open(folder / "archive");
+    EXPECT_EQ(Delivered{text.substr(0, 10)}, Read(archive, 0, 0, 10));
+    const pid_t child = fork();
+    if (child == 0) _exit(Read(archive, 0, 100'000, 100'000) == Delivered{text.substr(100'000, 100'000)} ? 0 : 1);
+    EXPECT_EQ(Delivered{text}, Read(archive, 0, 0, text.size()));
+    int status = -1;
+    waitpid(child, &status, 0);
+    EXPECT_EQ(0, status);
+}

@@ -1,0 +1,84 @@
+// What the tests of the library share: archives in memory, and sources that count and fail.
+#pragma once
+
+#include "Library/include/zarvo.hpp"
+#include "Tools/ArchiveWriter/ArchiveWriter.h"
+
+#include <algorithm>
+#include <atomic>
+#include <cstring>
+#include <gtest/gtest.h>
+#include <stdexcept>
+#include <string>
+#include <vector>
+
+inline std::span<const std::byte> BytesOf(const std::string& text) { return std::as_bytes(std::span(text)); }
+
+// A text that compresses, and holds no piece of itself twice at places that matter.
+inline std::string SampleText(size_t size) {
+    std::string text;
+    for (size_t line = 0; text.size() < size; ++line)
+        text += std::to_string(line * line) + ",line " + std::to_string(line) + "\n";
+    text.resize(size);
+    return text;
+}
+
+// What a read gave: the bytes, and the code of the failure that ended it.
+struct Delivered {
+    std::string bytes;
+    zarvo_code code = ZARVO_OK;
+
+    friend bool operator==(const Delivered&, const Delivered&) = default;
+    friend std::ostream& operator<<(std::ostream& out, const Delivered& delivered) {
+        return out << delivered.bytes.size() << " bytes and code " << delivered.code << ": "
+                   << testing::PrintToString(delivered.bytes.substr(0, 200));
+    }
+};
+
+inline Delivered Read(zarvo::archive& archive, uint64_t index, uint64_t offset, size_t size) {
+    Delivered delivered{std::string(size, '?')};
+    const zarvo::read_result read = archive.read(index, offset, std::as_writable_bytes(std::span(delivered.bytes)));
+    delivered.bytes.resize(read.count);
+    delivered.code = read.error.code();
+    return delivered;
+}
+
+inline Delivered ReadNext(zarvo::stream& stream, size_t size) {
+    Delivered delivered{std::string(size, '?')};
+    const zarvo::read_result read = stream.read(std::as_writable_bytes(std::span(delivered.bytes)));
+    delivered.bytes.resize(read.count);
+    delivered.code = read.error.code();
+    return delivered;
+}
+
+// An archive that opens, or the test fails and stops. bytes must outlive it.
+inline zarvo::archive OpenBytes(const std::string& bytes, zarvo::open_options options = {}) {
+    zarvo::result<zarvo::archive> opened = zarvo::archive::open(BytesOf(bytes), std::move(options));
+    if (!opened) {
+        ADD_FAILURE() << opened.error().text();
+        throw std::runtime_error("the archive does not open");
+    }
+    return std::move(*opened);
+}
+
+// Bytes that are served by callbacks. The counts are the test's to read while no call is under way.
+struct CountingSource final : zarvo::source {
+    explicit CountingSource(std::string served) : bytes(std::move(served)) {}
+
+    int64_t read_at(std::span<std::byte> buffer, uint64_t offset) override {
+        if (++reads == failingRead) return -EIO;
+        const size_t start = std::min<uint64_t>(offset, bytes.size());
+        const size_t count = std::min({buffer.size(), bytes.size() - start, longestRead});
+        memcpy(buffer.data(), bytes.data() + start, count);
+        bytesRead += count;
+        return static_cast<int64_t>(count);
+    }
+    int64_t size() override { return claimedSize >= 0 ? claimedSize : static_cast<int64_t>(bytes.size()); }
+
+    std::string bytes;
+    int64_t claimedSize = -1; // where not negative, instead of the true one
+    int failingRead = 0;      // the read with this number, from 1 on, fails
+    size_t longestRead = SIZE_MAX;
+    std::atomic<int> reads = 0;
+    std::atomic<uint64_t> bytesRead = 0;
+};

@@ -1,0 +1,293 @@
+#include "Tests/Library/LibraryTest.h"
+
+#include <map>
+#include <random>
+#include <thread>
+
+namespace {
+
+// How a block is stored, and what its damage costs.
+struct Form {
+    const char* what;
+    ArchiveDescription description;
+};
+
+// Every layout and kind, each holding text as one file, in blocks small enough for several and streams large enough to
+// be read in pieces.
+std::vector<Form> EveryForm(const std::string& text) {
+    std::vector<Form> forms = {
+        {"stored", {.chunkSize = 10'000}},
+        {"LZ4", {.chunkSize = 10'000, .type = kCompressionLz4}},
+        {"LZ4HC", {.chunkSize = 131'072, .type = kCompressionLz4HC}},
+        {"LZMA", {.chunkSize = 10'000, .type = kCompressionLzma}},
+        {"LZMA with its end mark", {.chunkSize = 10'000, .type = kCompressionLzma, .lzma = {.endMark = true}}},
+        {"LZMA, small streams", {.chunkSize = 10'000, .type = kCompressionLzma, .streamed = true}},
+        {"LZMA, one stream", {.chunkSize = 0, .type = kCompressionLzma, .streamed = true}},
+        {"web", {.layout = ArchiveLayout::kWeb}},
+        {"raw", {.layout = ArchiveLayout::kRaw}},
+        {"old", {.layout = ArchiveLayout::kArchive, .chunkSize = 10'000, .type = kCompressionLz4}},
+    };
+    for (Form& form : forms)
+        form.description.entries = {{.path = "a"}, {.path = "text", .bytes = text}, {.path = "z", .bytes = "end"}};
+    return forms;
+}
+
+constexpr uint64_t kTextEntry = 1;
+
+// An archive with one block of text, stored as the test says.
+std::string ArchiveOfOneBlock(const std::string& text, CompressionType type, bool isStreamed,
+                              std::optional<std::string> stored = {}) {
+    return BuildArchive({.entries = {{.path = "text", .bytes = text}},
+                         .blocks = {{.size = text.size(), .type = type, .streamed = isStreamed, .stored = stored}}})
+        .bytes;
+}
+
+uint64_t Readable(zarvo::archive& archive, uint64_t index) { return *archive.readable(index); }
+
+} // namespace
+
+TEST(Reading, AnyRangeIsTheSameRangeOfTheText) {
+    const std::string text = SampleText(1'500'000);
+    for (const Form& form : EveryForm(text)) {
+        SCOPED_TRACE(form.what);
+        const std::string bytes = BuildArchive(form.description).bytes;
+        zarvo::archive archive = OpenBytes(bytes);
+        EXPECT_EQ(Delivered{text}, Read(archive, kTextEntry, 0, text.size()));
+        std::mt19937 random(11);
+        for (int round = 0; round < 20; ++round) {
+            const size_t from = random() % text.size();
+            const size_t size = random() % 40'000;
+            SCOPED_TRACE(from);
+            ASSERT_EQ(Delivered{text.substr(from, size)}, Read(archive, kTextEntry, from, size));
+        }
+        EXPECT_EQ(Delivered{""}, Read(archive, kTextEntry, text.size(), 10));
+        EXPECT_EQ(Delivered{""}, Read(archive, kTextEntry, UINT64_MAX, 10));
+        EXPECT_EQ(Delivered{text.substr(text.size() - 5)}, Read(archive, kTextEntry, text.size() - 5, 10));
+        EXPECT_EQ(text.size(), Readable(archive, kTextEntry));
+    }
+}
+
+TEST(Reading, StreamGoesOnAndSeeks) {
+    const std::string text = SampleText(1'500'000);
+    for (const Form& form : EveryForm(text)) {
+        SCOPED_TRACE(form.what);
+        const std::string bytes = BuildArchive(form.description).bytes;
+        zarvo::archive archive = OpenBytes(bytes);
+        zarvo::stream stream = *archive.open_stream(kTextEntry);
+        std::string got;
+        for (Delivered piece; !(piece = ReadNext(stream, 70'000)).bytes.empty();)
+            got += piece.bytes;
+        EXPECT_EQ(text.size(), got.size());
+        EXPECT_EQ(true, text == got);
+        stream.seek(1'000'003);
+        EXPECT_EQ(Delivered{text.substr(1'000'003, 50)}, ReadNext(stream, 50));
+        EXPECT_EQ(Delivered{text.substr(1'000'053, 50)}, ReadNext(stream, 50));
+        stream.seek(7);
+        EXPECT_EQ(Delivered{text.substr(7, 50)}, ReadNext(stream, 50));
+    }
+}
+
+// Two files of two blocks that are read in turns, in small pieces, cost one reading of each block.
+TEST(Reading, FilesReadInTurnsShareTheCache) {
+    const std::string text = SampleText(131'072);
+    for (const bool isStreamed : {false, true}) {
+        SCOPED_TRACE(isStreamed ? "streamed" : "whole");
+        auto source = std::make_unique<CountingSource>(
+            BuildArchive({.entries = {{.path = "a", .bytes = text}, {.path = "b", .bytes = text}},
+                          .chunkSize = 131'072,
+                          .type = isStreamed ? kCompressionLzma : kCompressionLz4HC,
+                          .streamed = isStreamed})
+                .bytes);
+        CountingSource& counts = *source;
+        zarvo::archive archive = *zarvo::archive::open(std::move(source));
+        counts.bytesRead = 0;
+        for (size_t from = 0; from < text.size(); from += 4'096)
+            for (const uint64_t file : {0, 1})
+                ASSERT_EQ(Delivered{text.substr(from, 4'096)}, Read(archive, file, from, 4'096));
+        EXPECT_LE(counts.bytesRead.load(), archive.info().stored_size);
+    }
+}
+
+// However many streams are open in one large block, each goes on where it was.
+TEST(Reading, OpenStreamsKeepTheirPlaces) {
+    const std::string text = SampleText(3'000'000);
+    auto source = std::make_unique<CountingSource>(ArchiveOfOneBlock(text, kCompressionLzma, true));
+    CountingSource& counts = *source;
+    zarvo::archive archive = *zarvo::archive::open(std::move(source), {.cache_bytes = 1});
+    std::vector<zarvo::stream> streams;
+    for (int number = 0; number < 20; ++number)
+        streams.push_back(*archive.open_stream(0));
+    counts.bytesRead = 0;
+    for (size_t from = 0; from < text.size(); from += 100'000)
+        for (zarvo::stream& stream : streams)
+            ASSERT_EQ(Delivered{text.substr(from, 100'000)}, ReadNext(stream, 100'000));
+    EXPECT_LE(counts.bytesRead.load(), streams.size() * archive.info().stored_size);
+}
+
+TEST(Reading, ThreadsReadOneArchiveAtOnce) {
+    const std::string text = SampleText(1'500'000);
+    for (const Form& form : EveryForm(text)) {
+        SCOPED_TRACE(form.what);
+        const std::string bytes = BuildArchive(form.description).bytes;
+        zarvo::archive archive = OpenBytes(bytes, {.cache_bytes = 50'000});
+        std::atomic<int> wrong = 0;
+        std::vector<std::thread> threads;
+        for (unsigned number = 0; number < 4; ++number)
+            threads.emplace_back([&, number] {
+                std::mt19937 random(number);
+                for (int round = 0; round < 15; ++round) {
+                    const size_t from = random() % text.size();
+                    const size_t size = random() % 20'000;
+                    if (Read(archive, kTextEntry, from, size) != Delivered{text.substr(from, size)}) ++wrong;
+                    if (!archive.find("text")) ++wrong;
+                }
+            });
+        for (std::thread& thread : threads)
+            thread.join();
+        EXPECT_EQ(0, wrong.load());
+    }
+}
+
+// What can be read of a damaged block does not depend on how it is asked for, and everything before the damage can.
+TEST(Reading, DamageIsWhereNoDecoderDelivers) {
+    const std::string text = SampleText(2'000'000);
+    const std::string lzma = CompressLzma(text);
+    const std::string lz4 = CompressLz4(text);
+    const struct {
+        const char* what;
+        CompressionType type;
+        bool isStreamed;
+        std::string stored;
+        size_t atLeast; // of the text can be read
+        size_t atMost;
+    } cases[] = {
+        {"cut LZMA", kCompressionLzma, false, lzma.substr(0, lzma.size() / 2), 900'000, 1'100'000},
+        {"cut LZMA stream", kCompressionLzma, true, lzma.substr(0, lzma.size() / 2), 900'000, 1'100'000},
+        {"cut LZ4", kCompressionLz4, false, lz4.substr(0, lz4.size() / 2), 900'000, 1'100'000},
+        {"cut LZMA properties", kCompressionLzma, false, lzma.substr(0, 3), 0, 0},
+        {"impossible LZMA properties", kCompressionLzma, true, "\xFF" + lzma.substr(1), 0, 0},
+        {"streamed LZ4", kCompressionLz4, true, lz4, 0, 0},
+        {"LZMA that ends early", kCompressionLzma, false, CompressLzma(text.substr(0, 1'234'567), {.endMark = true}),
+         1'234'567, 1'234'567},
+        {"LZ4 that ends early", kCompressionLz4, false, CompressLz4(text.substr(0, 1'234'567)), 1'234'567, 1'234'567},
+    };
+    for (const auto& row : cases) {
+        SCOPED_TRACE(row.what);
+        const std::string bytes = ArchiveOfOneBlock(text, row.type, row.isStreamed, row.stored);
+        zarvo::archive archive = OpenBytes(bytes);
+        const uint64_t readable = Readable(archive, 0);
+        EXPECT_GE(readable, row.atLeast);
+        EXPECT_LE(readable, row.atMost);
+        const Delivered expected{text.substr(0, readable), ZARVO_ERROR_DAMAGED};
+        EXPECT_EQ(expected, Read(archive, 0, 0, text.size()));
+
+        std::string pieces;
+        zarvo::stream stream = *archive.open_stream(0);
+        Delivered piece;
+        while ((piece = ReadNext(stream, 10'007)).code == ZARVO_OK)
+            pieces += piece.bytes;
+        pieces += piece.bytes;
+        EXPECT_EQ(expected.bytes.size(), pieces.size());
+        EXPECT_EQ(ZARVO_ERROR_DAMAGED, piece.code);
+
+        std::string block(text.size(), '?');
+        const zarvo::read_result whole = archive.read_block(0, std::as_writable_bytes(std::span(block)));
+        EXPECT_EQ(readable, whole.count);
+        EXPECT_EQ(ZARVO_ERROR_DAMAGED, whole.error.code());
+    }
+}
+
+// A file that was cut gives what its blocks still hold; entries before the cut are whole.
+TEST(Reading, CutFileGivesWhatIsThere) {
+    const std::string text = SampleText(100'000);
+    for (const CompressionType type : {kCompressionNone, kCompressionLz4, kCompressionLzma}) {
+        SCOPED_TRACE(type);
+        const BuiltArchive built =
+            BuildArchive({.entries = {{.path = "first", .bytes = text}, {.path = "second", .bytes = text}},
+                          .chunkSize = 10'000,
+                          .type = type});
+        const size_t dataSize = built.bytes.size() - built.dataOffset;
+        const std::string cut = built.bytes.substr(0, built.dataOffset + dataSize * 3 / 4);
+        zarvo::archive archive = OpenBytes(cut);
+        EXPECT_EQ(Delivered{text}, Read(archive, 0, 0, text.size()));
+        const uint64_t readable = Readable(archive, 1);
+        EXPECT_GE(readable, 40'000u);
+        EXPECT_LE(readable, 60'000u);
+        EXPECT_EQ((Delivered{text.substr(0, readable), ZARVO_ERROR_DAMAGED}), Read(archive, 1, 0, text.size()));
+    }
+}
+
+TEST(Reading, EntryOutsideTheDataIsDamagedWhereItLeavesIt) {
+    const std::string text = "0123456789";
+    const struct {
+        const char* what;
+        uint64_t offset;
+        uint64_t size;
+        Delivered delivered;
+    } cases[] = {
+        {"past the end", 10, 1, {"", ZARVO_ERROR_DAMAGED}},
+        {"across the end", 4, 20, {"456789", ZARVO_ERROR_DAMAGED}},
+        {"far away", UINT64_MAX - 2, 20, {"", ZARVO_ERROR_DAMAGED}},
+        {"of no bytes", 99, 0, {"", ZARVO_OK}},
+        {"of all there are", 0, UINT64_MAX, {"0123456789", ZARVO_ERROR_DAMAGED}},
+    };
+    for (const auto& row : cases) {
+        const std::string bytes = BuildArchive({.entries = {{.path = "a", .bytes = text}},
+                                                .fields = {{"node[0].offset", row.offset}, {"node[0].size", row.size}}})
+                                      .bytes;
+        zarvo::archive archive = OpenBytes(bytes);
+        EXPECT_EQ(row.delivered, Read(archive, 0, 0, 100)) << row.what;
+        EXPECT_EQ(row.delivered.bytes.size(), Readable(archive, 0)) << row.what;
+    }
+}
+
+TEST(Reading, UnknownKindIsSaidOnceAndRefused) {
+    const std::string bytes =
+        BuildArchive({.entries = {{.path = "a", .bytes = "0123456789"}, {.path = "b", .bytes = "0123456789"}},
+                      .blocks = {{.size = 10, .type = static_cast<CompressionType>(7), .stored = "01234567"},
+                                 {.size = 10, .type = static_cast<CompressionType>(7), .stored = "01234567"}}})
+            .bytes;
+    std::vector<std::string> messages;
+    zarvo::archive archive =
+        OpenBytes(bytes, {.log = [&](std::string_view message) { messages.emplace_back(message); }});
+    EXPECT_EQ((Delivered{"", ZARVO_ERROR_UNSUPPORTED}), Read(archive, 0, 0, 10));
+    EXPECT_EQ((Delivered{"", ZARVO_ERROR_UNSUPPORTED}), Read(archive, 1, 2, 3));
+    EXPECT_EQ((std::vector<std::string>{"Decompressing this format (7) is not supported on this platform."}), messages);
+    EXPECT_EQ(2u, archive.info().blocks_unknown);
+}
+
+// What can be decoded piece by piece needs no memory for the whole.
+TEST(Reading, BlockAboveTheLimitIsStreamedOrRefused) {
+    const std::string text = SampleText(300'000);
+    const struct {
+        CompressionType type;
+        bool isStreamed;
+        Delivered delivered;
+    } cases[] = {
+        {.type = kCompressionNone, .isStreamed = false, .delivered = {text}},
+        {.type = kCompressionLzma, .isStreamed = false, .delivered = {text}},
+        {.type = kCompressionLzma, .isStreamed = true, .delivered = {text}},
+        {.type = kCompressionLz4, .isStreamed = false, .delivered = {"", ZARVO_ERROR_LIMIT}},
+    };
+    for (const auto& row : cases) {
+        SCOPED_TRACE(row.type);
+        const std::string bytes = ArchiveOfOneBlock(text, row.type, row.isStreamed);
+        zarvo::archive archive = OpenBytes(bytes, {.max_block_bytes = 299'999});
+        EXPECT_EQ(row.delivered, Read(archive, 0, 0, text.size()));
+    }
+    const std::string bytes = ArchiveOfOneBlock(text, kCompressionLz4, false);
+    zarvo::archive archive = OpenBytes(bytes, {.max_block_bytes = 299'999});
+    char byte;
+    EXPECT_EQ("block 0 takes 300000 bytes of memory; the limit (max_block_bytes) is 299999",
+              archive.read(0, 0, std::as_writable_bytes(std::span(&byte, 1))).error.text());
+}
+
+// Blocks without bytes are stepped over in one go.
+TEST(Reading, EmptyBlocksCostNothing) {
+    std::vector<ArchiveBlock> blocks(50'000, ArchiveBlock{.size = 0});
+    blocks.front().size = 5;
+    blocks.back().size = 5;
+    const std::string bytes = BuildArchive({.entries = {{.path = "a", .bytes = "0123456789"}}, .blocks = blocks}).bytes;
+    zarvo::archive archive = OpenBytes(bytes);
+    EXPECT_EQ(Delivered{"23456"}, Read(archive, 0, 2, 5));
+}
