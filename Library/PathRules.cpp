@@ -3,6 +3,8 @@
 #include "Library/include/zarvo.h"
 #include "Runtime/Utilities/SpookyHash.h"
 
+#include <sys/random.h>
+
 bool PathComponents::Next() {
     do {
         m_Begin = m_End;
@@ -59,6 +61,14 @@ UInt64 HashComponent(UInt64 folderHash, core::string_ref name) {
     UInt64 otherHalf = folderHash;
     SpookyHash::Hash128(name.data(), name.size(), &folderHash, &otherHalf);
     return folderHash;
+}
+
+UInt64 RandomHashSeed() {
+    UInt64 seed;
+    // Without a random number an address of this process is the seed.
+    if (getrandom(&seed, sizeof(seed), GRND_NONBLOCK) != static_cast<ssize_t>(sizeof(seed)))
+        seed = reinterpret_cast<UInt64>(&seed);
+    return seed;
 }
 
 size_t zarvo_normalize_path(const char* path, size_t length, char* out) {

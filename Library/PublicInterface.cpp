@@ -1,6 +1,7 @@
 // The functions of zarvo.h that work on archives: arguments are looked at here, and nowhere below.
 #include "Library/Archive.h"
 #include "Library/Handles.h"
+#include "Library/PublicStructures.h"
 #include "Runtime/Allocator/Allocator.h"
 
 #include <algorithm>
@@ -20,22 +21,6 @@ struct zarvo_stream {
 
 namespace {
 
-// Structures of an older caller are shorter than ours, those of a newer one longer: what both know is copied.
-template <typename T>
-T CopyIn(const T* given) {
-    T copy = {};
-    if (given != nullptr) memcpy(&copy, given, std::min(given->struct_size, sizeof(copy)));
-    return copy;
-}
-
-template <typename T>
-void CopyOut(const T& filled, T* out) {
-    const size_t size = std::min(out->struct_size, sizeof(filled));
-    if (size > sizeof(out->struct_size))
-        memcpy(reinterpret_cast<char*>(out) + sizeof(out->struct_size),
-               reinterpret_cast<const char*>(&filled) + sizeof(out->struct_size), size - sizeof(out->struct_size));
-}
-
 zarvo_open_options FillInDefaults(const zarvo_open_options* given) {
     zarvo_open_options options = CopyIn(given);
     if (options.max_entries == 0) options.max_entries = kDefaultMaxEntries;
@@ -43,11 +28,6 @@ zarvo_open_options FillInDefaults(const zarvo_open_options* given) {
     if (options.max_block_bytes == 0) options.max_block_bytes = kDefaultMaxBlockBytes;
     if (options.cache_bytes == 0) options.cache_bytes = kDefaultCacheBytes;
     return options;
-}
-
-zarvo_code RefuseArgument(const char* what, zarvo_error** error) {
-    Failure failure;
-    return Deliver(failure.SetArgument(what), failure, error);
 }
 
 // openSource: opens a source at an offset, and answers as the functions of Source.h do.

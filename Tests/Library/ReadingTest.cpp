@@ -278,7 +278,7 @@ TEST(Reading, BlockAboveTheLimitIsStreamedOrRefused) {
     const std::string bytes = ArchiveOfOneBlock(text, kCompressionLz4, false);
     zarvo::archive archive = OpenBytes(bytes, {.max_block_bytes = 299'999});
     char byte;
-    EXPECT_EQ("block 0 takes 300000 bytes of memory; the limit (max_block_bytes) is 299999",
+    EXPECT_EQ("block 0 takes 300000 bytes of memory, and the limit is 299999",
               archive.read(0, 0, std::as_writable_bytes(std::span(&byte, 1))).error.text());
 }
 
