@@ -101,6 +101,7 @@ void ArchiveRun::SetFailed(size_t entry, const Failure& failure) {
 zarvo_code ArchiveRun::Run(Failure* failure) {
     m_Data.Prepare();
     RunOnThreads(m_ThreadCount, this);
+    m_Data.DropUnended();
     TellReports();
     (void)TellProgress(); // too late to stop anything
     m_Messages.TellAll(m_Archive->Messages());

@@ -14,12 +14,16 @@ DataRun::DataRun(const BlockDecoder* decoder, const Nodes& nodes, UInt64 maxBloc
       m_Sink(sink) {}
 
 DataRun::~DataRun() {
-    for (SharedFile* shared : m_Shared)
-        m_Sink->DropFile(shared);
     for (Piece* piece : m_Passed)
         Delete(piece, kMemLabelFileSystem);
     for (Piece* piece : m_Spare)
         Delete(piece, kMemLabelFileSystem);
+}
+
+void DataRun::DropUnended() {
+    for (SharedFile* shared : m_Shared)
+        m_Sink->DropFile(shared);
+    m_Shared.clear();
 }
 
 template <typename T>

@@ -82,7 +82,10 @@ public:
     void StopFor(const Failure& failure); // which is the FatalFailure unless there is one already
     bool IsStopped() const { return m_IsStopped.load(std::memory_order_relaxed); } // a hint: data is under the lock
 
-    // Once all workers are done: why the run was stopped, unless by the caller.
+    // Once all workers are done: drops the files that a stopped run has not ended.
+    void DropUnended();
+
+    // As above: why the run was stopped, unless by the caller.
     const Failure& FatalFailure() const { return m_Fatal; }
 
     UInt64 BytesTotal() const { return m_BytesTotal; }
