@@ -30,7 +30,7 @@ public:
     // kNoItem when nothing has that path; kRoot when its normal form is empty.
     UInt32 Find(core::string_ref path) const;
 
-    // In the archive's order; an implied folder stands where the last entry below it does. kNoItem at the end.
+    // In the archive's order; an implied folder stands where the last item in it does. kNoItem at the end.
     UInt32 FirstChild(UInt32 item) const { return item == kRoot ? m_FirstInRoot : m_FirstChild[item]; }
     UInt32 NextSibling(UInt32 item) const { return m_NextSibling[item]; }
 

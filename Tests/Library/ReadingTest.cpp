@@ -102,7 +102,7 @@ TEST(Reading, FilesReadInTurnsShareTheCache) {
         zarvo::archive archive = *zarvo::archive::open(std::move(source));
         counts.bytesRead = 0;
         for (size_t from = 0; from < text.size(); from += 4'096)
-            for (const uint64_t file : {0, 1})
+            for (const uint64_t file : {uint64_t{0}, uint64_t{1}})
                 ASSERT_EQ(Delivered{text.substr(from, 4'096)}, Read(archive, file, from, 4'096));
         EXPECT_LE(counts.bytesRead.load(), archive.info().stored_size);
     }
