@@ -32,6 +32,9 @@ public:
         return value % bound;
     }
 
+    // A number below bound, which is at most 256, drawn from one byte.
+    UInt64 TakeByteBelow(UInt64 bound) { return m_Size != 0 ? m_Data[--m_Size] % bound : 0; }
+
     const std::uint8_t* data() const { return m_Data; }
     size_t size() const { return m_Size; }
 

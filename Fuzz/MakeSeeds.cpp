@@ -46,7 +46,7 @@ int main(int argumentCount, char** arguments) {
     const auto write = [&](const ArchiveDescription& archive) {
         const std::string bytes = BuildArchive(archive).bytes;
         const std::string name = "seed" + std::to_string(count++);
-        for (const char* fuzzer : {"HeaderFuzzer", "LegacyFuzzer", "ReaderFuzzer", "CommandFuzzer"})
+        for (const char* fuzzer : {"HeaderFuzzer", "LegacyFuzzer", "ReaderFuzzer", "CommandFuzzer", "LibraryFuzzer"})
             WriteSeed(root / fuzzer, name, bytes);
     };
     for (CompressionType type : {kCompressionNone, kCompressionLzma, kCompressionLz4, kCompressionLz4HC}) {
@@ -82,5 +82,9 @@ int main(int argumentCount, char** arguments) {
     ArchiveDescription directory = Describe(ArchiveLayout::kRaw, kCompressionNone, true, 0);
     const BuiltArchive built = BuildArchive(directory);
     WriteSeed(root / "LegacyFuzzer", "directory", built.stream);
+
+    // Both draw all they need from single bytes.
+    WriteSeed(root / "PatternFuzzer", "text", Text(60));
+    WriteSeed(root / "PathFuzzer", "text", Text(300));
     return 0;
 }
