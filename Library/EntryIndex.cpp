@@ -70,6 +70,10 @@ bool EntryIndex::ReserveSlots(size_t count) {
 
 zarvo_code EntryIndex::Build(Failure* failure) {
     const UInt32 count = static_cast<UInt32>(m_Nodes.size());
+    // What an attempt that found no memory has left.
+    m_Implied.clear();
+    m_Slots = dynamic_array<Slot>(kMemLabelFileSystem);
+    m_FirstInRoot = kNoItem;
     if (m_Nodes.size() >= kRoot || !ReserveSlots(size_t{count} + count / 16) ||
         !m_NextSibling.resize_uninitialized(count, kResizeExact) ||
         !m_FirstChild.resize_uninitialized(count, kResizeExact))

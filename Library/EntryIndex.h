@@ -22,7 +22,7 @@ public:
     // nodes outlives the index.
     explicit EntryIndex(const Nodes& nodes);
 
-    // Once, before anything else.
+    // Before anything else; once more where memory was refused.
     [[nodiscard]] zarvo_code Build(Failure* failure);
 
     UInt32 ItemCount() const { return static_cast<UInt32>(m_NextSibling.size()); }
