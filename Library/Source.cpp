@@ -151,17 +151,22 @@ public:
     zarvo_code Begin(UInt64 offset, Failure* failure) {
         uint64_t size = 0;
         const int answer = m_Callbacks.get_size(m_Callbacks.context, &size);
-        if (answer != 0) return failure->SetSystem(answer < 0 ? -answer : EIO);
+        if (answer != 0) return SetAnswer(answer, failure);
         return SetRange(size, offset, failure);
     }
 
 private:
     zarvo_code ReadSome(UInt64 position, void* buffer, size_t size, size_t* count, Failure* failure) const override {
         const int64_t answer = m_Callbacks.read_at(m_Callbacks.context, buffer, size, position);
-        if (answer < 0) return failure->SetSystem(answer < -INT32_MAX ? EIO : static_cast<int>(-answer));
+        if (answer < 0) return SetAnswer(answer, failure);
         if (static_cast<UInt64>(answer) > size) return failure->SetSystem(EIO, "a read delivered more than was asked");
         *count = static_cast<size_t>(answer);
         return ZARVO_OK;
+    }
+
+    // The errno that a callback answers, where it can be one.
+    static zarvo_code SetAnswer(int64_t answer, Failure* failure) {
+        return failure->SetSystem(answer > 0 || answer < -INT32_MAX ? EIO : static_cast<int>(-answer));
     }
 
     zarvo_source m_Callbacks;
