@@ -1,0 +1,91 @@
+#include "Tools/Zarvo/Output.h"
+
+#include "Tools/Zarvo/Text.h"
+
+#include <cerrno>
+#include <poll.h>
+#include <unistd.h>
+
+namespace {
+
+constexpr size_t kBufferSize = 1 << 18;
+constexpr char kWipe[] = "\r\x1b[K"; // back to the start of the line, and erase it
+
+// A descriptor that others have made non-blocking is waited for. Returns how many bytes were written, or -1.
+ssize_t WriteOrWait(int descriptor, std::string_view bytes) {
+    ssize_t count = write(descriptor, bytes.data(), bytes.size());
+    if (count < 0 && errno == EAGAIN) {
+        pollfd ready = {.fd = descriptor, .events = POLLOUT, .revents = 0};
+        count = poll(&ready, 1, -1) < 0 ? -1 : 0;
+    }
+    return count;
+}
+
+} // namespace
+
+Output::Output(int descriptor, bool isTerminal, const std::atomic<int>* signal)
+    : m_Descriptor(descriptor), m_IsTerminal(isTerminal), m_Signal(signal) {
+    m_Buffer.reserve(kBufferSize);
+}
+
+void Output::Write(std::string_view bytes) {
+    if (bytes.size() > kBufferSize - m_Buffer.size()) Flush();
+    if (bytes.size() >= kBufferSize)
+        WriteNow(bytes);
+    else
+        m_Buffer += bytes;
+}
+
+void Output::WriteText(std::string_view text) {
+    if (m_IsTerminal)
+        Write(EscapeControls(text));
+    else
+        Write(text);
+}
+
+void Output::Flush() {
+    WriteNow(m_Buffer);
+    m_Buffer.clear();
+}
+
+void Output::WriteNow(std::string_view bytes) {
+    while (!bytes.empty() && !IsClosed()) {
+        const ssize_t count = WriteOrWait(m_Descriptor, bytes);
+        if (count < 0 && errno == EINTR) continue;
+        if (count < 0) {
+            m_Error = errno;
+            return;
+        }
+        m_Written += static_cast<uint64_t>(count);
+        bytes.remove_prefix(static_cast<size_t>(count));
+    }
+}
+
+void Console::Say(std::string_view name, std::string_view text) {
+    m_Output.Flush();
+    WipeProgress();
+    const std::string shownName = name.empty() ? "''" : EscapeControls(name);
+    Write("zarvo: " + shownName + ": " + EscapeControls(text) + "\n");
+}
+
+void Console::ShowProgress(std::string_view text) {
+    if (m_IsTerminal)
+        Write(kWipe + std::string(text));
+    else
+        Write(std::string(text) + "\n");
+    m_HasProgress = m_IsTerminal;
+}
+
+void Console::WipeProgress() {
+    if (m_HasProgress) Write(kWipe);
+    m_HasProgress = false;
+}
+
+void Console::Write(std::string_view text) const {
+    while (!text.empty()) {
+        const ssize_t count = WriteOrWait(m_Descriptor, text);
+        if (count < 0 && errno == EINTR) continue;
+        if (count < 0) return; // there is nowhere to say so
+        text.remove_prefix(static_cast<size_t>(count));
+    }
+}
