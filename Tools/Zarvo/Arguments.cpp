@@ -2,7 +2,7 @@
 
 #include "Tools/Zarvo/Text.h"
 
-#include <CLI/App.hpp>
+#include <CLI/CLI.hpp>
 #include <algorithm>
 #include <charconv>
 #include <limits>

@@ -2,9 +2,9 @@
 // output failed, or a signal came, is seen to after it.
 #pragma once
 
-#include "Library/include/zarvo.hpp"
 #include "Tools/Zarvo/Arguments.h"
 #include "Tools/Zarvo/Output.h"
+#include <zarvo.hpp>
 
 #include <optional>
 #include <string>
