@@ -99,8 +99,8 @@ std::string GetRefusal(const zarvo::entry& entry) {
 }
 
 // Writes one file. Returns what stopped that before its end; what lies before has been written.
-zarvo::error WriteFile(zarvo::archive& archive, const zarvo::entry& entry, std::span<std::byte> buffer, Output& output,
-                       Amount& done, Progress& progress) {
+zarvo::error WriteFile(zarvo::archive& archive, const zarvo::entry& entry, std::span<std::byte> buffer,
+                       OutputBuffer& output, Amount& done, Progress& progress) {
     zarvo::result<zarvo::stream> stream = archive.open_stream(entry.index());
     if (!stream) return std::move(stream).error();
     while (!output.IsClosed()) {

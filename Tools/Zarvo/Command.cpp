@@ -11,14 +11,14 @@ namespace {
 
 constexpr int kWrongUsage = 2;
 
-int RunSubcommand(const World& world, Output& output, Console& console) {
+int RunSubcommand(const World& world, OutputBuffer& output, Console& console) {
     const Subcommand* subcommand = nullptr;
     std::string complaint;
     const std::optional<Arguments> arguments = Arguments::Parse(world.arguments, &subcommand, &complaint);
     const std::string name(subcommand->name);
     if (!arguments) {
         const std::string help = "zarvo " + name + (name.empty() ? "" : " ") + "--help";
-        console.Say(name.empty() ? "zarvo" : name, MakeMessage("%; see '%'", {complaint, help}));
+        console.Say(MakeMessage("%; see '%'", {complaint, help}));
         return kWrongUsage;
     }
     if (arguments->Has(kHelp)) {
@@ -39,19 +39,19 @@ int RunSubcommand(const World& world, Output& output, Console& console) {
 } // namespace
 
 Ending RunZarvo(const World& world) {
-    Output output(world.output, world.isOutputTerminal, world.signal);
+    OutputBuffer output(world.output, world.isOutputTerminal, world.signal);
     Console console(world.error, world.isErrorTerminal, output);
     int status = kSomethingWrong;
     try {
         status = RunSubcommand(world, output, console);
     } catch (const std::bad_alloc&) {
-        console.Say("zarvo", MakeMessage("Cannot allocate memory"));
+        console.Say(MakeMessage("Cannot allocate memory"));
     }
     output.Flush();
     if (output.HasSignal()) {
         const int signal = *world.signal;
-        console.Say("zarvo", MakeMessage("ended by SIG% after % bytes of results",
-                                         {sigabbrev_np(signal), std::to_string(output.GetWritten())}));
+        console.Say(MakeMessage("ended by SIG% after % bytes of results",
+                                {sigabbrev_np(signal), std::to_string(output.GetWritten())}));
         return {.status = kSomethingWrong, .signal = signal};
     }
     if (output.GetError() == EPIPE) return {.status = kSomethingWrong, .signal = SIGPIPE};

@@ -45,7 +45,7 @@ Json Describe(const std::string& path, const zarvo_info& info) {
 }
 
 // The same, a line each.
-void WriteLines(Output& output, const std::string& path, const zarvo_info& info) {
+void WriteLines(OutputBuffer& output, const std::string& path, const zarvo_info& info) {
     const auto line = [&](std::string_view name, std::string_view value) {
         constexpr size_t kWidth = 18;
         output.Write(name);

@@ -9,7 +9,7 @@ void SetJsonPath(Json& object, std::string_view path) {
     if (!IsUtf8(path)) object["pathBytes"] = EncodeBase64(path);
 }
 
-void WriteJson(Output& output, const Json& object) {
+void WriteJson(OutputBuffer& output, const Json& object) {
     const std::string line = object.dump();
     output.Write(output.IsTerminal() ? EscapeControlsInJson(line) : line);
     output.Write("\n");

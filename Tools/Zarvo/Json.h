@@ -14,4 +14,4 @@ Json MakeJsonText(std::string_view text);
 // Sets "path", and "pathBytes", in base64, for a path that is not UTF-8.
 void SetJsonPath(Json& object, std::string_view path);
 
-void WriteJson(Output& output, const Json& object);
+void WriteJson(OutputBuffer& output, const Json& object);

@@ -26,7 +26,7 @@ std::string AlignRight(uint64_t number, size_t width) {
     return std::string(width - digits.size(), ' ') + digits;
 }
 
-void WriteJsonEntry(Output& output, const zarvo::entry& entry) {
+void WriteJsonEntry(OutputBuffer& output, const zarvo::entry& entry) {
     Json object;
     SetJsonPath(object, entry.path());
     object["kind"] = entry.is_folder() ? "folder" : "file";

@@ -23,12 +23,12 @@ ssize_t WriteOrWait(int descriptor, std::string_view bytes) {
 
 } // namespace
 
-Output::Output(int descriptor, bool isTerminal, const std::atomic<int>* signal)
+OutputBuffer::OutputBuffer(int descriptor, bool isTerminal, const std::atomic<int>* signal)
     : m_Descriptor(descriptor), m_IsTerminal(isTerminal), m_Signal(signal) {
     m_Buffer.reserve(kBufferSize);
 }
 
-void Output::Write(std::string_view bytes) {
+void OutputBuffer::Write(std::string_view bytes) {
     if (bytes.size() > kBufferSize - m_Buffer.size()) Flush();
     if (bytes.size() >= kBufferSize)
         WriteNow(bytes);
@@ -36,19 +36,19 @@ void Output::Write(std::string_view bytes) {
         m_Buffer += bytes;
 }
 
-void Output::WriteText(std::string_view text) {
+void OutputBuffer::WriteText(std::string_view text) {
     if (m_IsTerminal)
         Write(EscapeControls(text));
     else
         Write(text);
 }
 
-void Output::Flush() {
+void OutputBuffer::Flush() {
     WriteNow(m_Buffer);
     m_Buffer.clear();
 }
 
-void Output::WriteNow(std::string_view bytes) {
+void OutputBuffer::WriteNow(std::string_view bytes) {
     while (!bytes.empty() && !IsClosed()) {
         const ssize_t count = WriteOrWait(m_Descriptor, bytes);
         if (count < 0 && errno == EINTR) continue;
@@ -62,10 +62,13 @@ void Output::WriteNow(std::string_view bytes) {
 }
 
 void Console::Say(std::string_view name, std::string_view text) {
+    Say((name.empty() ? "''" : std::string(name)) + ": " + std::string(text));
+}
+
+void Console::Say(std::string_view text) {
     m_Output.Flush();
     WipeProgress();
-    const std::string shownName = name.empty() ? "''" : EscapeControls(name);
-    Write("zarvo: " + shownName + ": " + EscapeControls(text) + "\n");
+    Write("zarvo: " + EscapeControls(text) + "\n");
 }
 
 void Console::ShowProgress(std::string_view text) {

@@ -8,10 +8,10 @@
 #include <string_view>
 
 // Results. After a failure, and once a signal asks the run to end, what is written is dropped.
-class Output {
+class OutputBuffer {
 public:
     // signal: holds the number of a signal that has come, or 0. May be nullptr.
-    Output(int descriptor, bool isTerminal, const std::atomic<int>* signal);
+    OutputBuffer(int descriptor, bool isTerminal, const std::atomic<int>* signal);
 
     void Write(std::string_view bytes);
 
@@ -48,11 +48,14 @@ private:
 // they go to the same place. A standard error that fails is nobody's business.
 class Console {
 public:
-    Console(int descriptor, bool isTerminal, Output& output)
+    Console(int descriptor, bool isTerminal, OutputBuffer& output)
         : m_Descriptor(descriptor), m_IsTerminal(isTerminal), m_Output(output) {}
 
     // One line, "zarvo: NAME: text", with control characters escaped.
     void Say(std::string_view name, std::string_view text);
+
+    // "zarvo: text", of the run itself.
+    void Say(std::string_view text);
 
     // On a terminal a line that the next one, or a message, replaces; elsewhere a line of its own.
     void ShowProgress(std::string_view text);
@@ -68,5 +71,5 @@ private:
     int m_Descriptor;
     bool m_IsTerminal;
     bool m_HasProgress = false;
-    Output& m_Output;
+    OutputBuffer& m_Output;
 };

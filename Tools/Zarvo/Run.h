@@ -14,7 +14,7 @@
 struct Run {
     const Arguments& arguments;
     int input; // descriptor of standard input
-    Output& output;
+    OutputBuffer& output;
     Console& console;
 
     const std::vector<std::string>& GetOperands() const { return arguments.GetOperands(); }

@@ -11,7 +11,7 @@
 namespace {
 
 // The whole contents. nullopt and errno when they can't be read, or when a signal has come.
-std::optional<std::string> ReadAll(int descriptor, const Output& output) {
+std::optional<std::string> ReadAll(int descriptor, const OutputBuffer& output) {
     std::string text;
     char piece[65'536];
     while (true) {
@@ -24,7 +24,7 @@ std::optional<std::string> ReadAll(int descriptor, const Output& output) {
     }
 }
 
-std::optional<std::string> ReadAll(const std::string& path, const Output& output) {
+std::optional<std::string> ReadAll(const std::string& path, const OutputBuffer& output) {
     const int descriptor = open(path.c_str(), O_RDONLY | O_CLOEXEC);
     if (descriptor < 0) return std::nullopt;
     std::optional<std::string> text = ReadAll(descriptor, output);
