@@ -42,7 +42,9 @@ public:
             for (const zarvo::entry entry : m_Archive.entries())
                 if (zarvo::error error = Match(matcher, entry, files, isMatched)) return error;
         }
-        std::sort(files.begin() + static_cast<std::ptrdiff_t>(before), files.end());
+        const auto found = files.begin() + static_cast<std::ptrdiff_t>(before);
+        std::sort(found, files.end());
+        files.erase(std::unique(found, files.end()), files.end()); // of equal names, the last has come for each
         return {};
     }
 
@@ -77,12 +79,12 @@ private:
         *isMatched = true;
         if (!entry.is_file()) return {};
         if (entry.problem() != ZARVO_PROBLEM_NONE) {
-            if (m_LastProblem.at(zarvo::normalize_path(entry.path())) == entry.index()) files.push_back(entry.index());
+            files.push_back(m_LastProblem.at(zarvo::normalize_path(entry.path())));
             return {};
         }
         zarvo::result<uint64_t> last = m_Archive.find(entry.path());
         if (!last) return std::move(last).error();
-        if (*last == entry.index()) files.push_back(entry.index());
+        files.push_back(*last);
         return {};
     }
 

@@ -97,22 +97,21 @@ std::string MakeBash() {
 std::string MakeZshOption(const Option& option) {
     const std::vector<std::string> forms = GetForms(option);
     const bool takesValue = !option.value.empty();
-    std::string text = Replace(Replace(std::string(option.help), "[", "\\["), "]", "\\]");
-    text = "[" + Replace(Replace(text, ":", "\\:"), "'", "'\\''") + "]";
+    std::string text = std::string(option.help);
+    for (const char* const special : {"[", "]", ":"})
+        text = Replace(text, special, std::string("\\") + special);
+    text = '[' + Replace(text, "'", "'\\''") + ']';
     if (takesValue) {
         std::string values = " ";
-        if (option.kind == ValueKind::kChoice) values = "(" + GetChoices(option) + ")";
+        if (option.kind == ValueKind::kChoice) values = '(' + GetChoices(option) + ')';
         if (option.kind == ValueKind::kFile) values = "_files";
-        text += ":" + std::string(option.value) + ":" + values;
+        text += ':' + std::string(option.value) + ':' + values;
     }
-    const char* const mark = takesValue ? "=" : ""; // the value may stand in the same word
     std::string specifications;
-    for (const std::string& form : forms)
-        specifications += " \\\n            '" + form +
-                          (form.starts_with("--") ? mark
-                           : takesValue           ? "+"
-                                                  : "") +
-                          text + "'";
+    for (const std::string& form : forms) {
+        const char* const mark = form.starts_with("--") ? "=" : "+"; // the value may stand in the same word
+        specifications += " \\\n            '" + form + (takesValue ? mark : "") + text + '\'';
+    }
     return specifications;
 }
 

@@ -48,8 +48,7 @@ Json Describe(const std::string& path, const zarvo_info& info) {
 void WriteLines(OutputBuffer& output, const std::string& path, const zarvo_info& info) {
     const auto line = [&](std::string_view name, std::string_view value) {
         constexpr size_t kWidth = 18;
-        output.Write(name);
-        output.Write(":" + std::string(kWidth - name.size(), ' '));
+        output.Write((std::string(name) + ':').append(kWidth - name.size(), ' '));
         output.WriteText(value);
         output.Write("\n");
     };

@@ -9,17 +9,18 @@ namespace {
 // The widths of the columns of numbers: those of the largest among all entries, so that they are known before the first
 // line.
 struct Widths {
-    explicit Widths(const zarvo::archive& archive) {
-        uint64_t largestSize = 0, largestOffset = 0;
-        for (const zarvo::entry entry : archive.entries()) {
-            largestSize = std::max(largestSize, entry.size());
-            largestOffset = std::max(largestOffset, entry.offset());
-        }
-        size = std::to_string(largestSize).size();
-        offset = std::to_string(largestOffset).size();
-    }
-    size_t size, offset;
+    size_t size = 0;
+    size_t offset = 0;
 };
+
+Widths MeasureColumns(const zarvo::archive& archive) {
+    uint64_t size = 0, offset = 0;
+    for (const zarvo::entry entry : archive.entries()) {
+        size = std::max(size, entry.size());
+        offset = std::max(offset, entry.offset());
+    }
+    return {.size = std::to_string(size).size(), .offset = std::to_string(offset).size()};
+}
 
 std::string AlignRight(uint64_t number, size_t width) {
     const std::string digits = std::to_string(number);
@@ -52,8 +53,8 @@ int RunList(const Run& run) {
 
     const bool isJson = run.arguments.Has(kJson);
     const std::string_view end = run.arguments.Has(kNul) ? std::string_view("\0", 1) : "\n";
-    const std::optional<Widths> widths =
-        run.arguments.Has(kLong) && !isJson ? std::optional<Widths>(*archive) : std::nullopt;
+    const bool isLong = run.arguments.Has(kLong) && !isJson;
+    const Widths widths = isLong ? MeasureColumns(*archive) : Widths();
     for (const zarvo::entry entry : archive->entries()) {
         if (run.output.IsClosed()) break;
         if (!list.isEverything && !patterns.match(entry.path())) continue;
@@ -61,9 +62,9 @@ int RunList(const Run& run) {
             WriteJsonEntry(run.output, entry);
             continue;
         }
-        if (widths)
-            run.output.Write((entry.is_folder() ? "d " : "f ") + AlignRight(entry.size(), widths->size) + " " +
-                             AlignRight(entry.offset(), widths->offset) + " ");
+        if (isLong)
+            run.output.Write((entry.is_folder() ? "d " : "f ") + AlignRight(entry.size(), widths.size) + " " +
+                             AlignRight(entry.offset(), widths.offset) + " ");
         run.output.WriteText(entry.path());
         if (entry.is_folder() && !entry.path().ends_with('/')) run.output.Write("/");
         run.output.Write(end);

@@ -24,28 +24,21 @@ ssize_t WriteOrWait(int descriptor, std::string_view bytes) {
 } // namespace
 
 OutputBuffer::OutputBuffer(int descriptor, bool isTerminal, const std::atomic<int>* signal)
-    : m_Descriptor(descriptor), m_IsTerminal(isTerminal), m_Signal(signal) {
-    m_Buffer.reserve(kBufferSize);
-}
+    : m_Descriptor(descriptor), m_IsTerminal(isTerminal), m_Signal(signal), m_Buffer(kBufferSize, '\0') {}
 
-void OutputBuffer::Write(std::string_view bytes) {
-    if (bytes.size() > kBufferSize - m_Buffer.size()) Flush();
+void OutputBuffer::WriteMore(std::string_view bytes) {
+    Flush();
     if (bytes.size() >= kBufferSize)
         WriteNow(bytes);
     else
-        m_Buffer += bytes;
+        Write(bytes);
 }
 
-void OutputBuffer::WriteText(std::string_view text) {
-    if (m_IsTerminal)
-        Write(EscapeControls(text));
-    else
-        Write(text);
-}
+void OutputBuffer::WriteEscaped(std::string_view text) { Write(EscapeControls(text)); }
 
 void OutputBuffer::Flush() {
-    WriteNow(m_Buffer);
-    m_Buffer.clear();
+    WriteNow(std::string_view(m_Buffer).substr(0, m_Used));
+    m_Used = 0;
 }
 
 void OutputBuffer::WriteNow(std::string_view bytes) {

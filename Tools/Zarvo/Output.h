@@ -13,10 +13,22 @@ public:
     // signal: holds the number of a signal that has come, or 0. May be nullptr.
     OutputBuffer(int descriptor, bool isTerminal, const std::atomic<int>* signal);
 
-    void Write(std::string_view bytes);
+    void Write(std::string_view bytes) {
+        if (bytes.size() <= m_Buffer.size() - m_Used) { // nearly always: a list's lines are short
+            bytes.copy(m_Buffer.data() + m_Used, bytes.size());
+            m_Used += bytes.size();
+        } else {
+            WriteMore(bytes);
+        }
+    }
 
     // A text out of an archive: with its control characters escaped on a terminal.
-    void WriteText(std::string_view text);
+    void WriteText(std::string_view text) {
+        if (m_IsTerminal)
+            WriteEscaped(text);
+        else
+            Write(text);
+    }
 
     void Flush();
 
@@ -34,6 +46,8 @@ public:
     uint64_t GetWritten() const { return m_Written; }
 
 private:
+    void WriteMore(std::string_view bytes);
+    void WriteEscaped(std::string_view text);
     void WriteNow(std::string_view bytes);
 
     int m_Descriptor;
@@ -42,6 +56,7 @@ private:
     int m_Error = 0;
     uint64_t m_Written = 0;
     std::string m_Buffer;
+    size_t m_Used = 0; // bytes of m_Buffer that wait
 };
 
 // Messages and progress. Results that wait in the output are written before a message, so that both are in order where

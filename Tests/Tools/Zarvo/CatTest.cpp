@@ -28,6 +28,8 @@ TEST_F(ZarvoCat, TakesTheLastOfEqualNames) {
     MakeArchive("a.zarvo", Archive("a/x:1 b:2 .\\a//x:3 c:4"));
     EXPECT_EQ((Heard{0, "234", ""}), Zarvo({"cat", "a.zarvo", "**"}));
     EXPECT_EQ((Heard{0, "3", ""}), Zarvo({"cat", "a.zarvo", "a/x"}));
+    EXPECT_EQ((Heard{0, "3", ""}), Zarvo({"cat", "a.zarvo", "a/[x]"})) << "matched twice";
+    EXPECT_EQ((Heard{0, "3", ""}), Zarvo({"cat", "a.zarvo", "?\\\\a//*"})) << "matched as it is stored";
 }
 
 TEST_F(ZarvoCat, TakesPatternsFromStandardInput) {
