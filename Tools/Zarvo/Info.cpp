@@ -1,10 +1,5 @@
 #include "Tools/Zarvo/Json.h"
 #include "Tools/Zarvo/Run.h"
-#include "Tools/Zarvo/Text.h"
-
-#include <array>
-#include <iterator>
-#include <utility>
 
 namespace {
 
