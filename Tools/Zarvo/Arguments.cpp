@@ -6,7 +6,6 @@
 #include <algorithm>
 #include <charconv>
 #include <limits>
-#include <ranges>
 
 namespace {
 
@@ -99,9 +98,9 @@ std::string CheckValue(const Option& option, const std::string& value) {
         if (error != std::errc() || end != value.data() + value.size() || count == 0)
             return MakeMessage("%: '%' is no number from 1 on", {name, value});
     }
+    const std::string choices = '|' + std::string(option.choices) + '|';
     if (option.kind == ValueKind::kChoice &&
-        !std::ranges::any_of(std::views::split(option.choices, '|'),
-                             [&](auto choice) { return std::ranges::equal(choice, value); }))
+        (value.find('|') != std::string::npos || choices.find('|' + value + '|') == std::string::npos))
         return MakeMessage("%: '%' is none of %", {name, value, option.choices});
     return "";
 }
@@ -181,9 +180,9 @@ std::optional<Arguments> Arguments::Parse(const std::vector<std::string>& argume
 }
 
 const std::string* Arguments::Find(const Option& option) const {
-    for (const auto& [given, value] : std::views::reverse(m_Options))
-        if (given == &option) return &value;
-    return nullptr;
+    const auto last =
+        std::find_if(m_Options.rbegin(), m_Options.rend(), [&](const auto& given) { return given.first == &option; });
+    return last != m_Options.rend() ? &last->second : nullptr;
 }
 
 std::vector<std::string> Arguments::FindAll(const Option& option) const {

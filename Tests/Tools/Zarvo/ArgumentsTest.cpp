@@ -67,6 +67,8 @@ TEST_F(ZarvoArguments, ThatMakeNoSenseAreRefusedInALine) {
         {{"list", "--memory=0", "a"}, "zarvo: --memory=SIZE: '0' is no size, such as 64M; see 'zarvo list --help'"},
         {{"list", "--memory=17179869184G", "a"},
          "zarvo: --memory=SIZE: '17179869184G' is no size, such as 64M; see 'zarvo list --help'"},
+        {{"list", "--progress=", "a"},
+         "zarvo: --progress=WHEN: '' is none of auto|always|never; see 'zarvo list --help'"},
         {{"list", "--progress=no", "a"},
          "zarvo: --progress=WHEN: 'no' is none of auto|always|never; see 'zarvo list --help'"},
     };
