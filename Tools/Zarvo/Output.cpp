@@ -4,6 +4,7 @@
 
 #include <cerrno>
 #include <poll.h>
+#include <sys/ioctl.h>
 #include <unistd.h>
 
 namespace {
@@ -65,6 +66,10 @@ void Console::Say(std::string_view text) {
 }
 
 void Console::ShowProgress(std::string_view text) {
+    winsize window = {};
+    // A line that goes on in the next one could not be wiped.
+    if (m_IsTerminal && ioctl(m_Descriptor, TIOCGWINSZ, &window) == 0 && window.ws_col > 1)
+        text = text.substr(0, window.ws_col - 1u);
     if (m_IsTerminal)
         Write(kWipe + std::string(text));
     else
