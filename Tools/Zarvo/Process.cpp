@@ -4,21 +4,12 @@
 
 #include <atomic>
 #include <csignal>
-#include <fcntl.h>
 #include <unistd.h>
 
 namespace {
 
 std::atomic<int> g_Signal = 0;
 static_assert(std::atomic<int>::is_always_lock_free); // a signal handler stores it
-
-// A file that is opened must not get the number of a standard descriptor that was closed. What takes the place can't be
-// read or written, and answers as a closed one does: EBADF.
-void FillClosedDescriptors() {
-    for (int descriptor : {STDIN_FILENO, STDOUT_FILENO, STDERR_FILENO})
-        if (fcntl(descriptor, F_GETFD) == -1)
-            (void)open("/dev/null", descriptor == STDIN_FILENO ? O_WRONLY : O_RDONLY); // gets the lowest number
-}
 
 // The first signal asks the run to end, and a second one ends the process at once. One that was ignored stays so.
 void CatchSignals() {
@@ -35,7 +26,6 @@ void CatchSignals() {
 } // namespace
 
 int RunProcess(int argumentCount, char** arguments) {
-    FillClosedDescriptors();
     CatchSignals();
     // So that a write to a pipe that nobody reads returns.
     const bool isPipeSignalIgnored = signal(SIGPIPE, SIG_IGN) == SIG_IGN;

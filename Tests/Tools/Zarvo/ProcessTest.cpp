@@ -20,7 +20,7 @@ protected:
     }
 };
 
-TEST_F(ZarvoProcess, FailsWhereResultsCannotBeWritten) {
+TEST_F(ZarvoProcess, FailsWhereItsDescriptorsDo) {
     MakeArchive("a.zarvo", Archive("a:x d|"));
     MakeArchive("empty.zarvo", {});
     const struct {
@@ -32,6 +32,7 @@ TEST_F(ZarvoProcess, FailsWhereResultsCannotBeWritten) {
         {"$Z cat a.zarvo a >&-", {1, "zarvo: standard output: Bad file descriptor\n"}},
         {"$Z info a.zarvo <&- >/dev/full", {1, "zarvo: standard output: No space left on device\n"}},
         {"$Z --help >/dev/full", {1, "zarvo: standard output: No space left on device\n"}},
+        {"$Z list --files-from=- a.zarvo <&-", {1, "zarvo: standard input: Bad file descriptor\n"}},
         {"$Z cat a.zarvo d >&-", {0, ""}},
         {"$Z list empty.zarvo >/dev/full", {0, ""}},
         {"$Z list none >/dev/full", {2, "zarvo: none: No such file or directory\n"}},
