@@ -73,9 +73,8 @@ TEST_F(ZarvoCat, PrintsFilesThatExtractionWouldPutElsewhere) {
 
 TEST_F(ZarvoCat, NamesTheSizeOfABlockOverTheBudget) {
     MakeArchive("a.zarvo", Archive("lz4 chunk=4096 a:c4096 b:x"));
-    EXPECT_EQ(
-        (Heard{1, "x", "zarvo: a.zarvo: a: block 0 takes 4096 bytes of memory; the limit (max_block_bytes) is 1024\n"}),
-        Zarvo({"cat", "--memory=2K", "a.zarvo", "a", "b"}));
+    EXPECT_EQ((Heard{1, "x", "zarvo: a.zarvo: a: block 0 takes 4096 bytes of memory, and the limit is 1024\n"}),
+              Zarvo({"cat", "--memory=2K", "a.zarvo", "a", "b"}));
 }
 
 TEST_F(ZarvoCat, SaysWhatTheRuntimeReportsOnce) {
