@@ -27,21 +27,6 @@ void Report(const char* message, SourceLocation where = SourceLocation::current(
     AssertImplementation(0, kSourceName, where.line, -1, message);
 }
 
-class Descriptor {
-public:
-    explicit Descriptor(int value) : m_Value(value) {}
-    ~Descriptor() {
-        if (m_Value >= 0) (void)PlatformClose(m_Value); // only read from: nothing is lost
-    }
-    Descriptor(const Descriptor&) = delete;
-    Descriptor& operator=(const Descriptor&) = delete;
-
-    int Get() const { return m_Value; }
-
-private:
-    int m_Value;
-};
-
 // The buffer that records are written to.
 class RecordBuffer {
 public:
@@ -200,7 +185,7 @@ public:
         working = path;
         if (working.empty() || working.back() != '/') working.push_back('/');
 
-        const Descriptor descriptor(PlatformOpen(path.c_str(), O_RDONLY, 0));
+        const FileDescriptor descriptor(PlatformOpen(path.c_str(), O_RDONLY, 0));
         if (descriptor.Get() < 1) return true; // 0, the number of standard input, is not listed from either
         struct stat status;
         if (fstat(descriptor.Get(), &status) != 0) return true;
