@@ -42,14 +42,14 @@ public:
     FileEntryInfoQueryFlags GetFileEntryInfo(const FileEntryData& entry, FileEntryInfo& info,
                                              FileEntryInfoQueryFlags query) const override;
 
-    core::basic_string<char> GetApplicationPath() const override;   // the bundle; takes a lock of its own
-    core::basic_string<char> GetApplicationFolder() const override; // the folder that holds it
-    core::basic_string<char> GetApplicationManagedPath() const override;
-    core::basic_string<char> GetApplicationContentsPath() const override;
-    core::basic_string<char> GetExecutablePath() const override;
-    core::basic_string<char> GetUserAppCacheFolder() const override; // not created
-    core::basic_string<char> GetUserAppDataFolder() const override;
-    core::basic_string<char> GetSharedApplicationDataFolder() const override;
+    core::string GetApplicationPath() const override;   // the bundle; takes a lock of its own
+    core::string GetApplicationFolder() const override; // the folder that holds it
+    core::string GetApplicationManagedPath() const override;
+    core::string GetApplicationContentsPath() const override;
+    core::string GetExecutablePath() const override;
+    core::string GetUserAppCacheFolder() const override; // not created
+    core::string GetUserAppDataFolder() const override;
+    core::string GetSharedApplicationDataFolder() const override;
 
-    core::basic_string<char> LastErrorMessage() override; // of errno as it stands
+    core::string LastErrorMessage() override; // of errno as it stands
 };

@@ -73,7 +73,7 @@ struct OpenFolder {
 // What a record says; what it lacks is as it is here.
 struct Record {
     attribute_set_t returned = {};
-    core::basic_string_ref<char> name; // points into the record
+    core::string_ref name; // points into the record
     UInt32 type = VNON;
     timespec modified = {};
     UInt32 flags = 0;
@@ -94,7 +94,7 @@ public:
     }
 
     // A text that a reference, the field read next, points to: up to its NUL or the end of the record.
-    core::basic_string_ref<char> ReadText() {
+    core::string_ref ReadText() {
         const auto start = static_cast<SInt64>(m_Position);
         attrreference_t reference = {};
         Read(reference);
@@ -154,7 +154,7 @@ void AddSize(const Record& record, void** handlerData) {
         *static_cast<UInt64*>(*handlerData) += static_cast<UInt64>(record.totalSize); // 0 without the attribute
 }
 
-void AddEntry(const Record& record, const core::basic_string<char>& path, bool isFolder,
+void AddEntry(const Record& record, const core::string& path, bool isFolder,
               dynamic_block_array<FileEntryInfo, 32>* out) {
     const bool isHidden = record.name[0] == '.' || (record.flags & UF_HIDDEN) != 0;
     FileEntryInfo& info = out->emplace_back();
@@ -166,7 +166,7 @@ void AddEntry(const Record& record, const core::basic_string<char>& path, bool i
     UnixTimeToZarvoTime(record.modified.tv_sec, info.lastModified);
 }
 
-void PrintListingError(int error, const core::basic_string<char>& path) {
+void PrintListingError(int error, const core::string& path) {
     printf_console("Error (%s) occured whilst enumerating %s\n", strerror(error), path.c_str());
 }
 
@@ -178,8 +178,8 @@ public:
         : m_Out(out), m_HandlerData(handlerData), m_Flags(flags), m_Recursive(recursive) {}
 
     // A folder that can't be opened, or is listed already further up, adds nothing and is no failure.
-    bool Enumerate_Internal(const core::basic_string<char>& path, const OpenFolder* parent) {
-        core::basic_string<char> working(kMemLabelGeneral);
+    bool Enumerate_Internal(const core::string& path, const OpenFolder* parent) {
+        core::string working(kMemLabelGeneral);
         // Where memory is refused later, half a path would be listed.
         if (working.grow(std::max(path.length() + 1, kReservedPathLength)) == nullptr) return false;
         working = path;
@@ -212,8 +212,8 @@ public:
     }
 
 private:
-    void HandleRecords(RecordBuffer& buffer, int count, const core::basic_string<char>& path,
-                       core::basic_string<char>& working, const OpenFolder& folder) {
+    void HandleRecords(RecordBuffer& buffer, int count, const core::string& path, core::string& working,
+                       const OpenFolder& folder) {
         const UInt8* bytes = buffer.Data();
         size_t left = buffer.Size();
         for (UInt32 length = 0; count > 0 && left >= sizeof(length); --count) {
@@ -227,8 +227,7 @@ private:
         }
     }
 
-    void HandleRecord(const Record& record, const core::basic_string<char>& path, core::basic_string<char>& working,
-                      const OpenFolder& folder) {
+    void HandleRecord(const Record& record, const core::string& path, core::string& working, const OpenFolder& folder) {
         if (record.returned.commonattr & ATTR_CMN_ERROR) {
             PrintListingError(errno, path);
             return;
@@ -257,18 +256,17 @@ private:
 };
 
 // The path made absolute; as it stands when the platform has no text for it.
-core::basic_string<char> FileSystemRepresentation(const char* path) {
+core::string FileSystemRepresentation(const char* path) {
     const char* text = NSURL_fileSystemRepresentation(NSURL_fileURLWithPath(MakeNSString(path)));
-    return core::basic_string<char>(*text != '\0' ? text : path, kMemLabelPathString);
+    return core::string(*text != '\0' ? text : path, kMemLabelPathString);
 }
 
 // What of path, which is absolute, is left below the current directory; path itself when it lies elsewhere.
-core::basic_string_ref<char> BelowCurrentDirectory(core::basic_string_ref<char> path,
-                                                   core::basic_string_ref<char> currentDirectory) {
+core::string_ref BelowCurrentDirectory(core::string_ref path, core::string_ref currentDirectory) {
     if (path.empty() || currentDirectory.empty()) return path.substr(std::min<size_t>(1, path.length()));
     if (!path.starts_with(currentDirectory)) return path;
     if (path.length() == currentDirectory.length()) return ".";
-    const core::basic_string_ref<char> rest = path.substr(currentDirectory.length());
+    const core::string_ref rest = path.substr(currentDirectory.length());
     if (currentDirectory[currentDirectory.length() - 1] == '/') return rest; // only the root ends so
     return rest[0] == '/' ? rest.substr(1) : path; // otherwise the name of another folder begins alike
 }
@@ -281,9 +279,9 @@ bool LocalFileSystemOSX::Enumerate(const char* path, dynamic_block_array<FileEnt
         Report("Filesystem does not support storing size during enumeration outside of Zarvo Editor.");
     if (path == nullptr) return false;
 
-    core::basic_string<char> representation = FileSystemRepresentation(path);
+    core::string representation = FileSystemRepresentation(path);
     if (path[0] != '/' && representation.starts_with("/")) {
-        const core::basic_string<char> current = FileSystemRepresentation(GetFileSystem()->CurrentDirectory().c_str());
+        const core::string current = FileSystemRepresentation(GetFileSystem()->CurrentDirectory().c_str());
         representation = BelowCurrentDirectory(representation, current);
     }
     return FolderLister(out, recursive, handlerData, flags).Enumerate_Internal(representation, nullptr);

@@ -7,8 +7,8 @@
 class NSString;
 
 // kMemLabelPathString; empty for nil and for a string that has no UTF-8 form.
-core::basic_string<char> MakeString(NSString* string);
+core::string MakeString(NSString* string);
 
-NSString* MakeNSString(const core::basic_string<char>& text); // up to its first NUL
-NSString* MakeNSString(const char* text);                     // null: the empty one
-NSString* MakeNSString(core::basic_string_ref<char> text);    // need not be terminated
+NSString* MakeNSString(const core::string& text); // up to its first NUL
+NSString* MakeNSString(const char* text);         // null: the empty one
+NSString* MakeNSString(core::string_ref text);    // need not be terminated

@@ -48,9 +48,9 @@ struct AssetGUID {
 class FileSystemHandler : public FileAccessorHandler {
 public:
     // Whether this handler serves path; asked from the last registered handler to the first.
-    virtual bool CanHandle(core::basic_string_ref<char> path) const = 0;
-    virtual core::basic_string<char> ToAbsolute(core::basic_string_ref<char> path) const = 0;
-    virtual bool IsAbsoluteFilePath(core::basic_string_ref<char> path) const = 0;
+    virtual bool CanHandle(core::string_ref path) const = 0;
+    virtual core::string ToAbsolute(core::string_ref path) const = 0;
+    virtual bool IsAbsoluteFilePath(core::string_ref path) const = 0;
 
     // Binds an entry to this handler, and lets go of one.
     virtual void InitializeFileEntry(FileEntryData& entry) = 0;
@@ -59,7 +59,7 @@ public:
     virtual const char* Name() = 0;
 
     // The folder part of the entry's path; false (parent unchanged) when it has none.
-    virtual bool Parent(const FileEntryData& entry, core::basic_string<char>& parent) const = 0;
+    virtual bool Parent(const FileEntryData& entry, core::string& parent) const = 0;
     // The last component: a pointer into the entry's path.
     virtual const char* Filename(const FileEntryData& entry) const = 0;
 
@@ -95,7 +95,7 @@ public:
     virtual bool MakeLocal(FileEntryData& entry, bool flag) = 0;
 
     // Where on the local disk the entry's contents lie: a file and a range of it.
-    virtual bool ToLocal(const FileEntryData& entry, core::basic_string<char>& path, VFS::FileSize& offset,
+    virtual bool ToLocal(const FileEntryData& entry, core::string& path, VFS::FileSize& offset,
                          VFS::FileSize& size) const = 0;
 
     // Appends what the folder holds to *out, or, with kFileEnumerationSumSizes, adds the files' sizes to the counter
@@ -114,7 +114,7 @@ public:
     // Not to be had here: reported, lastError kFileSystemErrorNotSupported, false.
     virtual bool CreateFileWithContentAtomically(const FileEntryData& entry, const void* data, UInt64 size) const;
 
-    virtual bool CanConvertToAbsolutePath(core::basic_string_ref<char> path) const = 0;
-    virtual core::basic_string<char> ToPhysicalPath(const core::basic_string<char>&) const { return {}; }
-    virtual core::basic_string<char> ToLogicalPath(const core::basic_string<char>&) const { return {}; }
+    virtual bool CanConvertToAbsolutePath(core::string_ref path) const = 0;
+    virtual core::string ToPhysicalPath(const core::string&) const { return {}; }
+    virtual core::string ToLogicalPath(const core::string&) const { return {}; }
 };

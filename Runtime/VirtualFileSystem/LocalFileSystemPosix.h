@@ -72,24 +72,24 @@ public:
                    FileEnumerationFlag flags) const override;
 
     // Paths.
-    core::basic_string<char> ToAbsolute(core::basic_string_ref<char> path) const override; // expands a leading "~"
-    bool Parent(const FileEntryData& entry, core::basic_string<char>& parent) const override;
+    core::string ToAbsolute(core::string_ref path) const override; // expands a leading "~"
+    bool Parent(const FileEntryData& entry, core::string& parent) const override;
     const char* Filename(const FileEntryData& entry) const override;
-    core::basic_string<char> GetApplicationPath() const override;
-    core::basic_string<char> GetApplicationFolder() const override;
-    core::basic_string<char> GetApplicationManagedPath() const override;
-    core::basic_string<char> GetApplicationContentsPath() const override;
-    core::basic_string<char> GetUserAppCacheFolder() const override; // created
-    core::basic_string<char> GetUserAppDataFolder() const override;
-    core::basic_string<char> GetUserConfigFolder() const override; // created
+    core::string GetApplicationPath() const override;
+    core::string GetApplicationFolder() const override;
+    core::string GetApplicationManagedPath() const override;
+    core::string GetApplicationContentsPath() const override;
+    core::string GetUserAppCacheFolder() const override; // created
+    core::string GetUserAppDataFolder() const override;
+    core::string GetUserConfigFolder() const override; // created
     bool GetAvailableDiskSpace(const char* path, UInt64& bytes) const override;
 
 private:
-    core::basic_string<char> m_HomeFolder;
+    core::string m_HomeFolder;
 };
 
 // What an errno value means to those who read lastError.
 FileSystemError FileSystemErrorFromErrno(int error);
 
 // Whether an enumeration with these flags leaves out a name. Any thread.
-bool FlaggedAsSkipped(bool isDirectory, bool isHidden, core::basic_string_ref<char> name, FileEnumerationFlag flags);
+bool FlaggedAsSkipped(bool isDirectory, bool isHidden, core::string_ref name, FileEnumerationFlag flags);

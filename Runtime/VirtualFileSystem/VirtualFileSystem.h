@@ -25,23 +25,23 @@ public:
     ~FileSystem() = delete; // lives until the process ends
 
     // Never null.
-    FileSystemHandler* GetHandlerForPath(core::basic_string_ref<char> path) const;
+    FileSystemHandler* GetHandlerForPath(core::string_ref path) const;
 
     // The path from the root; "." and ".." are not resolved. Empty when a handler makes nothing of the path, and when
     // memory is refused.
-    core::basic_string<char> ToAbsolute(core::basic_string_ref<char> path) const;
+    core::string ToAbsolute(core::string_ref path) const;
     // The same, and whether the local back end has answered, because no registered handler did.
-    core::basic_string<char> ToAbsolute(core::basic_string_ref<char> path, bool* isLocal) const;
+    core::string ToAbsolute(core::string_ref path, bool* isLocal) const;
 
     // The directory that ToAbsolute puts before relative paths (cut at kMaxPathLength); returns the one before it.
     // The process's working directory is not changed.
-    core::basic_string<char> SetCurrentDirectory(core::basic_string_ref<char> path);
-    core::basic_string<char> CurrentDirectory() const;
+    core::string SetCurrentDirectory(core::string_ref path);
+    core::string CurrentDirectory() const;
 
-    bool Delete(core::basic_string_ref<char> path, bool recursive) const;
+    bool Delete(core::string_ref path, bool recursive) const;
     bool Enumerate(const char* path, dynamic_block_array<FileEntryInfo, 32>* out, bool recursive,
                    FileEnumerationFlag flags) const;
-    core::basic_string<char> LastErrorMessage() const;
+    core::string LastErrorMessage() const;
 
     // Puts a handler before those there are, and takes one out. The handler stays the caller's, and must outlive its
     // registration and every entry bound to it. What it answers about paths (CanHandle, IsAbsoluteFilePath,
@@ -64,13 +64,13 @@ extern FileSystem* gFileSystem; // null until then
 class FileSystemEntry : public FileEntryData {
 public:
     FileSystemEntry() = default;
-    explicit FileSystemEntry(core::basic_string_ref<char> path);
+    explicit FileSystemEntry(core::string_ref path);
     FileSystemEntry(const FileEntryData& other);
     FileSystemEntry(const FileSystemEntry& other);
     FileSystemEntry& operator=(const FileSystemEntry& other);
 
     // Binds the entry to another path: cut at kMaxPathLength, every backslash turned into "/".
-    void Set(core::basic_string_ref<char> path);
+    void Set(core::string_ref path);
     const char* Path() const { return path; }
 
     // Without a handler, all of these answer false (or 0, or a default DateTime).
