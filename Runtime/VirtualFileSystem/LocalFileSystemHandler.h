@@ -1,5 +1,5 @@
-// What every local back end has in common: it serves every path, and it is the one that is asked for the folders of the
-// application and the user, for error texts and for free disk space. The order of the virtual operations is fixed.
+// What every local back end has in common. It serves every path, and also answers for the folders of the application
+// and the user, error texts and free disk space. The order of the virtual operations is fixed.
 #pragma once
 
 #include "Runtime/VirtualFileSystem/FileSystemHandler.h"
@@ -27,15 +27,15 @@ public:
     virtual core::string GetSharedApplicationDataFolder() const;
     virtual core::string LastErrorMessage();
     virtual int LastError();
-    // Bytes free for unprivileged users; unchanged on failure.
+    // Stores the bytes free for unprivileged users; on failure bytes is unchanged.
     virtual bool GetAvailableDiskSpace(const char* path, UInt64& bytes) const = 0;
 
     // See FileSystem::SetCurrentDirectory.
     static core::string SetCurrentDirectory(core::string_ref path);
 
-    static char currentDirectory[kPathBufferSize]; // set at start-up, before other threads use paths
-    static char applicationPath[kPathBufferSize];  // nothing here sets it
+    static char currentDirectory[kPathBufferSize]; // set before a second thread uses paths
+    static char applicationPath[kPathBufferSize];  // empty unless the embedding program sets it
 };
 
-// A new back end for the registry, which owns it: the one place that chooses which.
+// Makes the back end that the registry will own. Linking decides which class it is.
 LocalFileSystemHandler* CreateLocalFileSystem(MemLabelId label);

@@ -1,4 +1,4 @@
-// The POSIX back end's content operations, and what they need to know of a path.
+// The POSIX back end's contents: opening, reading, writing and seeking.
 #include "Runtime/VirtualFileSystem/LocalFileSystemPosix.h"
 
 #include "PlatformDependent/Linux/FileDescriptor.h"
@@ -7,9 +7,6 @@
 
 #include <sys/stat.h>
 #include <unistd.h>
-
-constexpr mode_t kNewFileMode = 0666; // before the umask
-constexpr mode_t kNewFolderMode = 0755;
 
 FileSystemError FileSystemErrorFromErrno(int error) {
     switch (error) {
@@ -134,29 +131,4 @@ bool LocalFileSystemPosix::SetLength(FileEntryData& entry, VFS::FileSize length)
 VFS::FileSize LocalFileSystemPosix::Size(const FileEntryData& entry) const {
     struct stat status;
     return GetStatus(entry.path, &status) ? static_cast<UInt64>(status.st_size) : 0;
-}
-
-bool LocalFileSystemPosix::Exists(const FileEntryData& entry) const {
-    return RepeatOnInterrupt([&] { return access(entry.path, F_OK); }) == 0;
-}
-
-bool LocalFileSystemPosix::IsDir(const FileEntryData& entry) const {
-    struct stat status;
-    return GetStatus(entry.path, &status) && S_ISDIR(status.st_mode);
-}
-
-bool LocalFileSystemPosix::IsFile(const FileEntryData& entry) const {
-    struct stat status;
-    return GetStatus(entry.path, &status) && !S_ISDIR(status.st_mode);
-}
-
-bool LocalFileSystemPosix::CreateAsDir(FileEntryData& entry) {
-    const int result = RepeatOnInterrupt([&] { return mkdir(entry.path, kNewFolderMode); });
-    entry.lastError = FileSystemErrorFromErrno(result == 0 ? 0 : errno);
-    return result == 0;
-}
-
-bool LocalFileSystemPosix::CreateAsFile(FileEntryData& entry) {
-    if (Exists(entry)) return false;
-    return FileDescriptor(PlatformOpen(entry.path, GetOpenFlags(kFilePermissionWrite), kNewFileMode)).IsOpen();
 }
