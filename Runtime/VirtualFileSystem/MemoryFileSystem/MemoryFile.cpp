@@ -11,7 +11,8 @@ MemoryFile::MemoryFile(MemLabelId memLabel, MemoryFileData* contents, FilePermis
     if (data != nullptr)
         data->AddRef();
     else
-        data = New<MultiBlocksMemoryFileData>(label, label, MultiBlocksMemoryFileData::kDefaultBlockSize);
+        data =
+            RequireMemory(New<MultiBlocksMemoryFileData>(label, label, MultiBlocksMemoryFileData::kDefaultBlockSize));
 }
 
 MemoryFile::~MemoryFile() {
@@ -20,16 +21,12 @@ MemoryFile::~MemoryFile() {
 
 FileSystemEntry MemoryFile::CreateFileSystemEntry(MemLabelId memLabel, FilePermission filePermission, void* data,
                                                   size_t size, bool takeOwnership) {
+    MemoryFileData* const contents =
+        RequireMemory(New<SingleBlockMemoryFileData>(memLabel, memLabel, data, size, takeOwnership));
+    auto* const file = RequireMemory(New<MemoryFile>(memLabel, memLabel, contents, filePermission));
+    contents->Release(); // the file holds the other reference
     FileEntryData entry;
-    MemoryFileData* const contents = New<SingleBlockMemoryFileData>(memLabel, memLabel, data, size, takeOwnership);
-    if (contents != nullptr) {
-        auto* const file = New<MemoryFile>(memLabel, memLabel, contents, filePermission);
-        contents->Release();
-        if (file != nullptr) entry.accessorHandler = New<IFileAdapter>(memLabel, file, memLabel, true);
-        if (entry.accessorHandler == nullptr) Delete(file, memLabel);
-    } else if (takeOwnership && size != 0) {
-        free_alloc_internal(data, memLabel, __FILE__, __LINE__);
-    }
+    entry.accessorHandler = RequireMemory(New<IFileAdapter>(memLabel, file, memLabel, true));
     return FileSystemEntry(entry);
 }
 
@@ -72,7 +69,7 @@ bool MemoryFile::Seek(VFS::FileOffset offset, FileOrigin origin) {
     if (data == nullptr) return false;
     const UInt64 end = data->Size().Cast<UInt64>();
     UInt64 target = 0;
-    bool isPosition = false; // a sum that wraps is none
+    bool isPosition = false; // stays false when the sum wraps
     if (origin == kFileOriginBegin) {
         target = offset.Cast<UInt64>();
         isPosition = true;
