@@ -19,12 +19,12 @@ constexpr char kUserDataFolder[] = "Library/Zarvo";
 constexpr char kUserCacheFolder[] = "Library/Caches/com.zarvo3d.ZarvoEditor"; // named after the editor's bundle
 constexpr size_t kErrorTextSize = 2048;
 
-// The fields that the status answers, the hidden flag aside.
+// The fields that a status fills, apart from the hidden flag.
 constexpr UInt32 kStatusQuery = kFileEntryQuerySize | kFileEntryQueryLastModified | kFileEntryQueryDirectory |
                                 kFileEntryQuerySymLink | kFileEntryQueryReadOnly;
 static_assert(kStatusQuery == 0x334);
 
-// strerror_r has two forms: one answers a status and fills the buffer, the other answers the text.
+// strerror_r has two forms: one returns a status and fills the buffer, the other returns the text.
 [[maybe_unused]] const char* ErrorText(int, const char* buffer) { return buffer; }
 [[maybe_unused]] const char* ErrorText(const char* text, const char*) { return text; }
 
@@ -34,7 +34,7 @@ bool GetPlatformStatus(const FileEntryData& entry, PlatformStatus* status) {
     return RepeatOnInterrupt([&] { return PlatformStat(entry.path, status); }) == 0;
 }
 
-// Whether the platform has a text for it; where it has none, it is handed the empty one.
+// Other paths reach the platform as the empty text.
 bool IsUtf8(const char* path) { return NSString_stringWithUTF8String(path) != nullptr; }
 
 } // namespace
@@ -70,20 +70,19 @@ bool LocalFileSystemOSX::MoveToTrash(FileEntryData& entry) {
     NSURL* url = NSURL_URLByResolvingSymlinksInPath(NSURL_fileURLWithPath(MakeNSString(entry.path)));
     const core::string_ref resolved = NSURL_fileSystemRepresentation(url);
     strcpy_truncate(entry.path, resolved.data(), sizeof(entry.path), resolved.length());
-    // What is cut, is no text, or has a backslash would name something else further on; nothing takes the whole disk.
+    // These would name something else below, because they are cut or converted; and "/" is the whole disk.
     if (resolved.length() > kMaxPathLength || !IsUtf8(entry.path)) return false;
     if (strchr(entry.path, '\\') != nullptr || resolved == "/") return false;
     if (!IsPathCreated(entry.path)) return false;
 
     const core::string path = PathToAbsolutePath(entry.path);
-    if (path.empty()) return false; // memory was refused
     int tag = 0;
-    // What counts is whether the path is gone, not what the workspace says.
+    // Its answer doesn't count, only whether the path is gone.
     (void)NSWorkspace_performFileOperation(Platform_RecycleOperation(), MakeNSString(DeleteLastPathNameComponent(path)),
                                            MakeNSString(""),
                                            NSArray_arrayWithObject(MakeNSString(GetLastPathNameComponent(path))), &tag);
     const FileSystemEntry thing(path);
-    if (thing.Exists()) (void)DeleteFileOrDirectory(path); // the test below tells
+    if (thing.Exists()) (void)DeleteFileOrDirectory(path); // tested below
     return !thing.Exists();
 }
 
