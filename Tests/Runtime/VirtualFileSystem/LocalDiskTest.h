@@ -9,6 +9,7 @@
 #include <gtest/gtest.h>
 
 #include <cstdlib>
+#include <sstream>
 #include <sys/stat.h>
 #include <sys/wait.h>
 #include <unistd.h>
@@ -57,12 +58,15 @@ protected:
         EXPECT_EQ(system(("set -e; cd '" + folder.Path() + "'; " + script).c_str()), 0) << script;
     }
 
-    // Without following links; -1 when nothing is there.
-    int Mode(const std::string& name) const {
+    // The mode in octal, without following links; empty when nothing is there.
+    std::string Mode(const std::string& name) const {
         struct stat status;
-        return lstat(Entry(name).path, &status) == 0 ? static_cast<int>(status.st_mode & 07777) : -1;
+        if (lstat(Entry(name).path, &status) != 0) return "";
+        std::ostringstream text;
+        text << std::oct << (status.st_mode & 07777);
+        return text.str();
     }
-    bool IsThere(const std::string& name) const { return Mode(name) != -1; }
+    bool IsThere(const std::string& name) const { return !Mode(name).empty(); }
 
     // Whether function answers true in another process, which has no more rights than any user.
     template <typename Function>

@@ -312,11 +312,11 @@ TEST_F(LocalFileSystemPosixTest, SetReadOnlyGivesBackTheOwnersRightAlone) {
     Run("touch file; chmod 4766 file; ln -s file link");
     FileSystemEntry file = Entry("file"), link = Entry("link"), none = Entry("none");
     EXPECT_TRUE(local.SetReadOnly(file, true));
-    EXPECT_EQ(04544, Mode("file"));
+    EXPECT_EQ("4544", Mode("file"));
     EXPECT_TRUE(local.SetReadOnly(file, false));
-    EXPECT_EQ(04744, Mode("file"));
+    EXPECT_EQ("4744", Mode("file"));
     EXPECT_TRUE(local.SetReadOnly(link, true));
-    EXPECT_EQ(0555, Mode("file")) << "the link's own mode without the right to write";
+    EXPECT_EQ("555", Mode("file")) << "the link's own mode without the right to write";
     EXPECT_FALSE(local.SetReadOnly(none, true));
 }
 
@@ -591,7 +591,7 @@ TEST_F(LocalFileSystemPosixTest, UserFoldersAreCreatedAndPrinted) {
     setenv("HOME", folder.Path().c_str(), 1);
     Run("mkdir .config");
     EXPECT_EQ(config + "/Caches", local.GetUserAppCacheFolder().c_str());
-    EXPECT_EQ(0700, Mode(config));
+    EXPECT_EQ("700", Mode(config));
     EXPECT_TRUE(IsThere(config + "/Caches"));
     EXPECT_EQ("Creating user config folder: " + config + "\n", console.Text());
     unsetenv("HOME");
@@ -633,18 +633,25 @@ TEST_F(LocalFileSystemPosixTest, AListingTellsTimes) {
             << list[index].path; // 0 for the dangling link
 }
 
-TEST_F(LocalFileSystemPosixTest, AListingEndsInLoopsOfLinks) {
-    Run("mkdir a; touch a/file; ln -s . a/loop; ln -s .. a/up; ln -s a b");
+// One loop a listing: with two, a listing that does not end takes too long to fail.
+TEST_F(LocalFileSystemPosixTest, AListingEndsInALoopOfLinks) {
     const int kLink = kFileEntryIsDirectory | kFileEntryIsSymLink;
+    for (const char* target : {".", ".."}) {
+        SCOPED_TRACE(target);
+        Run(std::string("rm -rf a; mkdir a; touch a/file; ln -s ") + target + " a/loop");
+        const std::vector<Listed> kExpected = {
+            {.path = "a", .flags = kFileEntryIsDirectory}, {.path = "a/file"}, {.path = "a/loop", .flags = kLink}};
+        EXPECT_EQ(kExpected, List());
+    }
+}
+
+TEST_F(LocalFileSystemPosixTest, ALinkToAFolderIsListedInto) {
+    Run("mkdir a; touch a/file; ln -s a b");
     const std::vector<Listed> kExpected = {
         {.path = "a", .flags = kFileEntryIsDirectory},
         {.path = "a/file"},
-        {.path = "a/loop", .flags = kLink},
-        {.path = "a/up", .flags = kLink},
-        {.path = "b", .flags = kLink},
+        {.path = "b", .flags = kFileEntryIsDirectory | kFileEntryIsSymLink},
         {.path = "b/file"},
-        {.path = "b/loop", .flags = kLink},
-        {.path = "b/up", .flags = kLink},
     };
     EXPECT_EQ(kExpected, List());
 }
