@@ -4,4 +4,4 @@
 #include "Runtime/Core/Containers/String.h"
 
 // The result carries kMemLabelGeneral; one longer than 10,239 characters is cut there.
-[[gnu::format(printf, 1, 2)]] core::basic_string<char> Format(const char* format, ...);
+[[gnu::format(printf, 1, 2)]] core::string Format(const char* format, ...);

@@ -177,9 +177,9 @@ void ReportError(const char* message, SourceLocation where) {
 void DebugStringToFile(const DebugStringToFileData& data) {
     const LogType type = Classify(data.mode);
     DebugStringToFileData copy = data;
-    core::string file{MemLabelId(kMemLabelGeneral)};
-    core::string shortStackTrace{MemLabelId(kMemLabelGeneral)};
-    core::string stackTrace{MemLabelId(kMemLabelGeneral)};
+    core::string file(kMemLabelGeneral);
+    core::string shortStackTrace(kMemLabelGeneral);
+    core::string stackTrace(kMemLabelGeneral);
 
     if ((data.mode & kLogModeNoStackTrace) == 0) {
         const StackTraceLogType wanted = StackTraceOf(type);

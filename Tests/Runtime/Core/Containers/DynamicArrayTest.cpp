@@ -126,7 +126,7 @@ TEST(DynamicBlockArray, ElementsStayWhereTheyWerePlaced) {
     texts.grow(100);                             // a fourth block, which holds no element yet
     for (size_t i = 0; i < 65; ++i)
         EXPECT_TRUE(texts.size() == 65 && places[i] == &texts[i]) << i;
-    EXPECT_EQ(texts[64].get_memory_label(), MemLabelId(kMemLabelFileList));
+    EXPECT_EQ(texts[64].get_memory_label(), kMemLabelFileList);
 }
 
 TEST(DynamicBlockArray, RefusedBlockEndsTheProcess) {
