@@ -58,10 +58,18 @@ void Delete(T* object, MemLabelHere here) {
     free_alloc_internal(object, here.label, here.where.file, here.where.line);
 }
 
-// For what can't go on without it: the pointer, or the end of the program when memory was refused.
+// Ends the program unless memory was granted. Sizes that come from a file or a caller are asked for with operations
+// that answer; whoever needs a few bytes to go on asks here, so that nobody writes a way out for a case that never
+// comes.
+inline void RequireMemory(bool isGranted) {
+    if (!isGranted) [[unlikely]]
+        C99Api::Footing_Process_Abort(ZarvoClassic::Footing_ErrorCode_OutOfMemory);
+}
+
+// The same for a pointer, which it returns.
 template <typename T>
 T* RequireMemory(T* pointer) {
-    if (pointer == nullptr) C99Api::Footing_Process_Abort(ZarvoClassic::Footing_ErrorCode_OutOfMemory);
+    RequireMemory(pointer != nullptr);
     return pointer;
 }
 

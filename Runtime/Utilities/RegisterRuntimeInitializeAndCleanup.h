@@ -26,11 +26,10 @@ public:
     // Whether a runs before b at start-up: by order, then by the objects' addresses.
     static bool Sort(const RegisterRuntimeInitializeAndCleanup* a, const RegisterRuntimeInitializeAndCleanup* b);
 
-    // Runs the init callbacks of those that are not initialized, so that a second call has no effect. When memory is
-    // refused, nothing runs, nor does it at the end.
+    // Runs the init callbacks of the registrations that are not initialized; a second call therefore has no effect.
     static void ExecuteInitializations();
 
-    // Runs the cleanup callbacks of those that are initialized, in the reverse order. A second call has no effect.
+    // Runs the cleanup callbacks of the initialized ones in reverse order. A second call has no effect.
     static void ExecuteCleanup();
 
 private:

@@ -76,7 +76,7 @@ void FileSystem::UnregisterHandler(FileSystemHandler* handler) {
     size_t kept = 0;
     for (FileSystemHandler* registered : handlers)
         if (registered != handler) handlers[kept++] = registered;
-    handlers.resize_initialized(kept);
+    handlers.truncate(kept);
 }
 
 // Undoes a binding. The path is left for the caller to overwrite.

@@ -117,8 +117,7 @@ ArchiveStorageReader::CachedBlock* ArchiveStorageReader::ClaimVictim() {
 
 // A new record, claimed; null when memory is refused.
 ArchiveStorageReader::CachedBlock* ArchiveStorageReader::AddCachedBlock() {
-    if (m_CachedBlocks.size() == m_CachedBlocks.capacity()) m_CachedBlocks.grow();
-    if (m_CachedBlocks.size() == m_CachedBlocks.capacity()) return nullptr;
+    if (m_CachedBlocks.size() == m_CachedBlocks.capacity() && !m_CachedBlocks.grow()) return nullptr;
     CachedBlock* block = New<CachedBlock>(m_Label, m_Label);
     if (block == nullptr) return nullptr;
     StampCachedBlock(block);
@@ -217,7 +216,7 @@ void ArchiveStorageReader::EmptyCache() {
         DeinitCachedBlock(block);
         Delete(block, m_Label);
     }
-    m_CachedBlocks.resize_initialized(kept);
+    m_CachedBlocks.truncate(kept);
 }
 
 // Remembers that a block's data can't be had from some place on. Only what would fail in the same way, and as silently,
@@ -272,7 +271,7 @@ ArchiveStorageReader::CacheResult ArchiveStorageReader::FillStreamCachedBlock(Ca
                     result = kCacheResultReadError;
                     break;
                 }
-                block->compressedBuffer.resize_uninitialized(static_cast<size_t>(delivered));
+                block->compressedBuffer.truncate(static_cast<size_t>(delivered));
                 block->compressedLoaded += static_cast<UInt32>(delivered);
             }
         }
@@ -302,7 +301,7 @@ ArchiveStorageReader::CacheResult ArchiveStorageReader::FillStreamCachedBlock(Ca
         block->compressedPos += static_cast<UInt32>(available);
         produced += room;
     }
-    block->buffer.resize_uninitialized(produced);
+    block->buffer.truncate(produced);
     return result;
 }
 
