@@ -3,5 +3,5 @@
 
 #include "Runtime/Core/Containers/String.h"
 
-// The result carries kMemLabelGeneral; one longer than 10,239 characters is cut there.
+// The result has the label kMemLabelGeneral and is cut after 10,239 characters.
 [[gnu::format(printf, 1, 2)]] core::string Format(const char* format, ...);

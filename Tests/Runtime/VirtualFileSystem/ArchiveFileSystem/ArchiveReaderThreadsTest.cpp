@@ -1,12 +1,8 @@
 // One reader, many threads. What must happen at the same time is held together by a disk that is shut, never by timing.
 #include "Tests/Runtime/VirtualFileSystem/ArchiveFileSystem/ReaderTest.h"
+#include "Tests/Support/MutexInspector.h"
 
 #include <thread>
-
-// What no operation tells: below 0, so many threads wait.
-struct MutexInspector {
-    static SInt32 Counter(const Mutex& mutex) { return mutex.m_Counter; }
-};
 
 // Threads read a part of a block at once, all of the same or each of its own, and the first is inside its fill before
 // the others start: the disk is shut until all of them use a record, and then fails so often.
