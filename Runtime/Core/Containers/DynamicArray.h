@@ -15,7 +15,7 @@
 
 #include "Runtime/Allocator/Allocator.h"
 #include "Runtime/Core/Types.h"
-#include "Runtime/Utilities/LogAssert.h"
+#include "Runtime/Utilities/FixedReports.h"
 
 #include <cstring>
 #include <new>
@@ -51,7 +51,7 @@ struct dynamic_array_data {
 
     // Grows when one more element does not fit.
     void make_room_for_one(size_t elementSize, size_t alignment) {
-        Check(size + 1 > size, "Assertion failed on expression: 'newSize > m_size'");
+        Check(size + 1 > size, FixedReports::kArraySizeWraps);
         if (size + 1 > capacity()) grow(elementSize, alignment);
         RequireMemory(size + 1 <= capacity());
     }
@@ -250,7 +250,7 @@ dynamic_array<T, Align>& dynamic_array<T, Align>::operator=(dynamic_array&& othe
     if (this == &other) return *this;
     if (!other.owns_data()) {
         release();
-        Check(other.size() < Untyped::kMaxSize, "Assertion failed on expression: 'm_size < max_size()'");
+        Check(other.size() < Untyped::kMaxSize, FixedReports::kArrayTooLong);
         m_Array.data = other.m_Array.data;
         m_Array.size = other.size();
         m_Array.capacityWord = other.size() * 2 + Untyped::kNotOwned;

@@ -1,10 +1,8 @@
 #include "Runtime/VirtualFileSystem/MemoryFileSystem/MemoryFile.h"
 
-#include "Runtime/Utilities/LogAssert.h"
+#include "Runtime/Utilities/FixedReports.h"
 #include "Runtime/VirtualFileSystem/MemoryFileSystem/MultiBlocksMemoryFileData.h"
 #include "Runtime/VirtualFileSystem/MemoryFileSystem/SingleBlockMemoryFileData.h"
-
-static constexpr char kSourceName[] = "./Runtime/VirtualFileSystem/MemoryFileSystem/MemoryFile";
 
 MemoryFile::MemoryFile(MemLabelId memLabel, MemoryFileData* contents, FilePermission filePermission)
     : data(contents), permission(filePermission), label(memLabel) {
@@ -39,7 +37,7 @@ bool MemoryFile::Close() {
 }
 
 bool MemoryFile::Read(VFS::FileSize from, UInt64 size, void* out, UInt64* actual, FileReadFlags) {
-    if (!IsReadable()) AssertImplementation(0, kSourceName, 37, -1, "Assertion failed on expression: 'IsReadable()'");
+    if (!IsReadable()) Report(FixedReports::kMemoryFileRead);
     if (data == nullptr || !IsReadable()) return false;
     const UInt64 count = data->Read(from, size, out);
     if (actual != nullptr) *actual = count;
@@ -53,7 +51,7 @@ bool MemoryFile::Read(UInt64 size, void* out, UInt64* actual, FileReadFlags flag
 }
 
 bool MemoryFile::Write(VFS::FileSize from, UInt64 size, const void* in, UInt64* written) {
-    if (!IsWritable()) AssertImplementation(0, kSourceName, 64, -1, "Assertion failed on expression: 'IsWritable()'");
+    if (!IsWritable()) Report(FixedReports::kMemoryFileWrite);
     if (data == nullptr || !IsWritable()) return false;
     const UInt64 count = data->Write(from, size, in);
     position = from.Cast<UInt64>() + count;
@@ -86,7 +84,7 @@ bool MemoryFile::Seek(VFS::FileOffset offset, FileOrigin origin) {
 VFS::FileSize MemoryFile::Position() const { return position; }
 
 bool MemoryFile::SetLength(VFS::FileSize length) {
-    if (!IsWritable()) AssertImplementation(0, kSourceName, 109, -1, "Assertion failed on expression: 'IsWritable()'");
+    if (!IsWritable()) Report(FixedReports::kMemoryFileSetLength);
     if (data == nullptr || !IsWritable()) return false;
     data->SetLength(length);
     return true;

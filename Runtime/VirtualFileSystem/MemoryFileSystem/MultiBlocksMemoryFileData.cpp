@@ -1,6 +1,6 @@
 #include "Runtime/VirtualFileSystem/MemoryFileSystem/MultiBlocksMemoryFileData.h"
 
-#include "Runtime/Utilities/LogAssert.h"
+#include "Runtime/Utilities/FixedReports.h"
 
 #include <algorithm>
 #include <cstring>
@@ -51,8 +51,7 @@ UInt64 MultiBlocksMemoryFileData::Read(VFS::FileSize position, UInt64 size, void
         if (blocks[slot] != nullptr) {
             memcpy(bytes + done, blocks[slot] + offset, count);
         } else {
-            AssertImplementation(0, "./Runtime/VirtualFileSystem/MemoryFileSystem/MultiBlocksMemoryFileData", 80, -1,
-                                 "Assertion failed in MultiBlocksMemoryFileData::Read(): Dirty data read \n");
+            Report(FixedReports::kMemoryFileDirtyRead);
             memset(bytes + done, 0, count);
         }
         done += count;
