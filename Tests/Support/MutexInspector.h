@@ -1,9 +1,9 @@
-// What a Mutex does not tell: its counter and its owner. Tests wait with it until so many threads wait for a lock.
+// The counter and the owner of a Mutex, for tests that wait until a number of threads wait for it.
 //
 //   while (MutexInspector::Counter(mutex) != -3) std::this_thread::yield();   // three threads wait
 //
-// Any thread. Private members are reached through the arguments of an explicit instantiation, which access rules leave
-// out, so that the class itself knows nothing of its tests.
+// Any thread. Access rules do not apply to the arguments of an explicit instantiation, so the private members can be
+// named there, and the class needs no friend.
 #pragma once
 
 #include "Runtime/Threads/Mutex.h"

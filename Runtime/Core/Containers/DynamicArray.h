@@ -73,11 +73,11 @@ constexpr bool kCarriesLabel =
 
 } // namespace dynamic_array_detail
 
-// Align 0 is the element type's own alignment.
+// Align is the buffer's alignment; 0 stands for the element type's own.
 template <typename T, size_t Align = 0>
 class dynamic_array {
 public:
-    // No buffer.
+    // Without a buffer.
     dynamic_array() : dynamic_array(kMemLabelGeneral) {}
     explicit dynamic_array(MemLabelId label) : m_Array{.label = label} {}
 

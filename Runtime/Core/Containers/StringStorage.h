@@ -7,12 +7,12 @@
 //   byte 31     mode       bytes 0-30
 //   31 - size   inline     the characters. A text of 31 has the mode byte 0, which is its terminating NUL too
 //   01xxxxxx    heap       pointer at 0, capacity at 8, size at 16; the buffer is ours: capacity + 1 bytes
-//   10xxxxxx    external   the same with capacity 0; the text is somebody else's, never written or freed
+//   10xxxxxx    external   the same with capacity 0; the text is borrowed, never written or freed
 //   11xxxxxx    never
 //
 // The x mean nothing: growing leaves them as they were; moving and borrowing set them. Inline and heap text ends in a
 // NUL at [size]. Nothing in the area points into the object, so a string may be moved byte by byte. A buffer never
-// shrinks, and stays until the string is moved from or to.
+// shrinks; it stays until the string is moved from or to.
 #pragma once
 
 #include "Runtime/Allocator/Allocator.h"
@@ -94,7 +94,7 @@ private:
     void store_words(const T* pointer, size_t capacity, size_t size);
     void free_buffer() { free_alloc_internal(load<T*>(kPointerOffset), m_Label, __FILE__, __LINE__); }
 
-    // Where the members must lie; inside, as offsetof needs the class.
+    // The layout, checked inside the class because offsetof needs access to the members.
     static void check_layout() {
         static_assert(sizeof(StringStorageDefault) == 40 && offsetof(StringStorageDefault, m_Area) == 0 &&
                       sizeof(m_Area) == 32 && offsetof(StringStorageDefault, m_Label) == 32);
