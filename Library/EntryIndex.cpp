@@ -135,7 +135,7 @@ bool EntryIndex::LinkIntoFolders(UInt32 entry, dynamic_array<UInt64>* hashes) {
 template <typename T>
 static bool AppendOne(dynamic_array<T>* array, T value) {
     const size_t size = array->size();
-    if (size == array->capacity()) array->reserve(size + size / 8 + 16);
+    if (size == array->capacity() && !array->reserve(size + size / 8 + 16)) return false;
     if (!array->resize_uninitialized(size + 1)) return false;
     (*array)[size] = value;
     return true;
