@@ -213,7 +213,7 @@ private:
             if (isFolder && m_Recursive)
                 (void)Enumerate_Internal(working, &folder); // a failure doesn't end the listing
         }
-        working.resize(prefixLength);
+        working.truncate(prefixLength);
     }
 
     dynamic_block_array<FileEntryInfo, 32>* m_Out;

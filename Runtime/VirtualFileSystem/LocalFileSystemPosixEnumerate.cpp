@@ -114,7 +114,7 @@ bool LocalFileSystemPosix::Enumerate(const char* path, dynamic_block_array<FileE
     if (working.back() != '/') working += '/';
     const size_t prefixLength = working.size();
     while (const char* name = stream.Next()) {
-        working.resize(prefixLength);
+        working.truncate(prefixLength);
         working.append(name, strnlen(name, kMaxNameLength));
         struct stat linkStatus;
         if (!GetLinkStatus(working.c_str(), &linkStatus)) continue; // removed meanwhile

@@ -14,7 +14,7 @@ MultiBlocksMemoryFileData::MultiBlocksMemoryFileData(MemLabelId memLabel, size_t
 MultiBlocksMemoryFileData::MultiBlocksMemoryFileData(MemLabelId objectLabel, MemLabelId contentsLabel,
                                                      size_t sizeOfBlock)
     : MemoryFileData(objectLabel), label(contentsLabel), blockSize(sizeOfBlock), blocks(contentsLabel) {
-    blocks.reserve(kReservedSlots); // when refused, the first write asks again
+    (void)blocks.reserve(kReservedSlots); // if memory is refused, the first write asks again
 }
 
 MultiBlocksMemoryFileData::~MultiBlocksMemoryFileData() {
@@ -85,7 +85,7 @@ void MultiBlocksMemoryFileData::SetLength(VFS::FileSize newLength) {
     if (!ReserveSlots(lastSlot)) return;
     for (UInt64 slot = lastSlot + 1; slot < blocks.size(); ++slot)
         free_alloc_internal(blocks[slot], label, __FILE__, __LINE__);
-    blocks.resize_initialized(lastSlot + 1);
+    blocks.truncate(lastSlot + 1);
     length = newLength.Cast<UInt64>();
 }
 

@@ -11,7 +11,7 @@ dynamic_array<UInt8> SingleBlockMemoryFileData::MakeBuffer(MemLabelId memLabel, 
                              : dynamic_array<UInt8>::wrap(bytes, size, size, memLabel);
     }
     dynamic_array<UInt8> empty(memLabel);
-    empty.reserve(size); // when refused, the first write asks again
+    (void)empty.reserve(size); // if memory is refused, the first write asks again
     return empty;
 }
 
