@@ -1,4 +1,4 @@
-// Makes the seed corpora of the fuzzers, a folder each: MakeSeeds FOLDER
+// Makes the seed corpora of the fuzzers, one folder per fuzzer: MakeSeeds FOLDER
 #include "Tools/ArchiveWriter/ArchiveWriter.h"
 
 #include <cstdio>
@@ -78,7 +78,7 @@ int main(int argumentCount, char** arguments) {
     WriteSeed(decompressor, "lzma-empty", CompressLzma("", {.endMark = true}));
     WriteSeed(decompressor, "lz4", CompressLz4(text));
     WriteSeed(decompressor, "lz4hc", CompressLz4HC(text));
-    // A directory alone, as it stands at the start of a legacy data stream.
+    // A directory alone, as a legacy data stream starts with it.
     ArchiveDescription directory = Describe(ArchiveLayout::kRaw, kCompressionNone, true, 0);
     const BuiltArchive built = BuildArchive(directory);
     WriteSeed(root / "LegacyFuzzer", "directory", built.stream);
