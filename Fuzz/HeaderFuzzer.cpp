@@ -1,5 +1,5 @@
-// Property: the block-based parsers never return more records than the bytes can hold, and reading the same bytes again
-// gives the same result.
+// Property: the block-based parsers never make more records than the bytes can hold, and what is read once is read the
+// same again.
 #include "Fuzz/FuzzSupport.h"
 #include "Runtime/VirtualFileSystem/ArchiveFileSystem/ArchiveStorageHeader.h"
 

@@ -115,8 +115,8 @@ struct ArchivePlan {
     std::vector<Node> nodes;
 };
 
-// Writes the archive to a file. In memory are the description, the section, and one LZ4 block or the LZMA encoder's
-// state, but never the whole data.
+// Writes the archive to a file. Never holds all of the data in memory: only the description, the section, and one LZ4
+// block or the LZMA encoder's state.
 ArchivePlan WriteArchive(const ArchiveDescription& description, const std::string& outputFile);
 
 // Writes an archive of every file and folder below a folder, in the order of their paths. form describes everything but

@@ -84,7 +84,8 @@ TEST_F(DisturbedWorld, TheArchiveMayBeCutAtAnyCall) {
     ExtractWithFaults({}, [&] { fs::resize_file(m_Path, fs::file_size(m_Path) / 2); });
 }
 
-// Every large request is answered, because the archive sets its size: the process goes on. So does the transfer buffer.
+// The archive sets the size of most large requests, so a refusal must not end the process. The other one is for the
+// transfer buffer.
 TEST_F(DisturbedWorld, LargeRequestsForMemoryMayBeRefused) {
     constexpr size_t kLarge = 4'096;
     for (const std::string form : kForms)
@@ -133,7 +134,7 @@ TEST_F(DisturbedWorld, AnyRequestForMemoryMayBeRefused) {
 // The folders are there from the start, but no query may tell so.
 TEST_F(DisturbedWorld, AFolderThatCantBeMadeFailsTheRun) {
     struct NoFolders : FaultyFileSystem {
-        // As when a file has taken the name meanwhile.
+        // A file has taken the name meanwhile.
         bool CreateAsDir(FileEntryData& entry) override {
             entry.lastError = kFileSystemErrorAlreadyExists;
             return false;

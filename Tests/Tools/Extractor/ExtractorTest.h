@@ -107,7 +107,7 @@ inline ArchiveDescription Archive(const std::string& words, ArchiveDescription a
         if (name == "levels") archive.levelCount = static_cast<UInt32>(value);
         if (name == "chunk") archive.chunkSize = value;
         const bool isOption = option != std::end(options) || word == "section" || name != word;
-        EXPECT_TRUE(isLayout || isKind || isOption) << word;
+        if (!isLayout && !isKind && !isOption) ADD_FAILURE() << "no such word: " << word;
         if (name != word && name != "version" && name != "levels" && name != "chunk") archive.fields[name] = value;
     }
     return archive;

@@ -1,4 +1,4 @@
-// Archives that can't be read, are cut, damaged or hostile: what is reported, and what is extracted all the same.
+// Archives that can't be read, are cut, damaged or hostile: what the command reports, and what it still extracts.
 #include "Tests/Tools/Extractor/ExtractorTest.h"
 
 #include <set>

@@ -1,4 +1,4 @@
-// Whole archives of every form: everything is extracted.
+// Whole archives of every form: the command extracts everything.
 #include "Tests/Tools/Extractor/ExtractorTest.h"
 
 namespace {
