@@ -1,5 +1,6 @@
 #include "Tests/Library/LibraryTest.h"
 
+#include <malloc.h>
 #include <map>
 #include <random>
 #include <thread>
@@ -122,6 +123,28 @@ TEST(Reading, OpenStreamsKeepTheirPlaces) {
         for (zarvo::stream& stream : streams)
             ASSERT_EQ(Delivered{text.substr(from, 100'000)}, ReadNext(stream, 100'000));
     EXPECT_LE(counts.bytesRead.load(), streams.size() * archive.info().stored_size);
+}
+
+// Properties that ask for 6 MB of decoder state count as what they cost.
+TEST(Reading, IdleStreamsStayInsideTheCache) {
+    const std::string text = SampleText(3'000'000);
+    constexpr char kLargestTables = 44; // 8 literal context bits, 4 literal position bits
+    const std::string bytes =
+        ArchiveOfOneBlock(text, kCompressionLzma, true, kLargestTables + CompressLzma(text).substr(1));
+    zarvo::archive archive = OpenBytes(bytes, {.cache_bytes = 1'000'000});
+    const auto usedMemory = [] {
+        const struct mallinfo2 info = mallinfo2();
+        return info.uordblks + info.hblkhd;
+    };
+    const size_t before = usedMemory();
+    {
+        std::vector<zarvo::stream> streams;
+        for (int number = 0; number < 10; ++number) {
+            streams.push_back(*archive.open_stream(0));
+            (void)ReadNext(streams.back(), 1); // damaged, but the state has been made
+        }
+    }
+    EXPECT_LE(usedMemory(), before + 10'000'000);
 }
 
 TEST(Reading, ThreadsReadOneArchiveAtOnce) {
