@@ -226,6 +226,7 @@ zarvo_code zarvo_get_item_path(const zarvo_archive* archive, uint64_t item, char
 
 zarvo_code zarvo_read(zarvo_archive* archive, uint64_t index, uint64_t offset, void* buffer, size_t size, size_t* count,
                       zarvo_error** error) {
+    if (count != nullptr) *count = 0;
     if (!IsEntry(archive, index)) return RefuseArgument(kNoEntry, error);
     if ((buffer == nullptr && size != 0) || count == nullptr) return RefuseArgument(kNoRoom, error);
     MessageScope scope(archive->Messages());
@@ -272,6 +273,7 @@ zarvo_code zarvo_stream_open(zarvo_archive* archive, uint64_t index, zarvo_strea
 }
 
 zarvo_code zarvo_stream_read(zarvo_stream* stream, void* buffer, size_t size, size_t* count, zarvo_error** error) {
+    if (count != nullptr) *count = 0;
     if (!IsLiveHandle(stream) || !IsLiveHandle(stream->archive)) return RefuseArgument("no open stream", error);
     if ((buffer == nullptr && size != 0) || count == nullptr) return RefuseArgument(kNoRoom, error);
     MessageScope scope(stream->archive->Messages());
@@ -313,8 +315,10 @@ zarvo_code zarvo_get_block(const zarvo_archive* archive, uint64_t index, zarvo_b
 }
 
 zarvo_code zarvo_read_block(zarvo_archive* archive, uint64_t index, void* buffer, size_t* count, zarvo_error** error) {
+    if (count != nullptr) *count = 0;
     if (index >= zarvo_block_count(archive)) return RefuseArgument("no open archive, or no such block", error);
-    if (buffer == nullptr || count == nullptr) return RefuseArgument(kNoRoom, error);
+    const bool hasRoom = buffer != nullptr || archive->Blocks().GetBlock(static_cast<UInt32>(index)).size == 0;
+    if (!hasRoom || count == nullptr) return RefuseArgument(kNoRoom, error);
     MessageScope scope(archive->Messages());
     Failure failure;
     return Deliver(archive->Data().ReadBlock(static_cast<UInt32>(index), buffer, count, &failure), failure, error);

@@ -127,7 +127,7 @@ typedef struct zarvo_open_options {
                                  (LZMA) or are stored as they are may be larger. Default: 2^31 */
 
     /* How much memory decoded blocks, and the states of streamed ones, may take while no call uses them. Blocks in use
-     * come on top. Default: 2^23 */
+     * come on top, and the one that was used last stays in any case. Default: 2^23 */
     uint64_t cache_bytes;
 
     /* Gets what the library has to say about an archive while it goes on, such as "Decompressing this format (7) is not
@@ -273,7 +273,8 @@ ZARVO_API uint64_t zarvo_item_count(const zarvo_archive* archive);
 
 /* Reads up to size bytes of an entry, from byte offset of it on, into buffer, and stores how many in *count: fewer than
  * size at the entry's end, 0 from there on (and always of a folder). After a failure *count says how many bytes before
- * the damage are in the buffer. Blocks that were decoded are kept in the archive's cache. */
+ * the damage are in the buffer, and 0 where the arguments were refused. Blocks that were decoded are kept in the
+ * archive's cache. */
 ZARVO_API zarvo_code zarvo_read(zarvo_archive* archive, uint64_t index, uint64_t offset, void* buffer, size_t size,
                                 size_t* count, zarvo_error** error);
 
@@ -325,8 +326,8 @@ typedef struct zarvo_block {
 ZARVO_API uint64_t zarvo_block_count(const zarvo_archive* archive);
 ZARVO_API zarvo_code zarvo_get_block(const zarvo_archive* archive, uint64_t index, zarvo_block* block);
 
-/* Decodes a whole block into buffer, which has room for its size, past the cache, and stores in *count how many bytes
- * were delivered: all of them, or, after a failure, those before the damage. */
+/* Decodes a whole block into buffer, which has room for its size (it may be NULL for none), past the cache, and stores
+ * in *count how many bytes were delivered: all of them, or, after a failure, those before the damage. */
 ZARVO_API zarvo_code zarvo_read_block(zarvo_archive* archive, uint64_t index, void* buffer, size_t* count,
                                       zarvo_error** error);
 

@@ -129,6 +129,20 @@ TEST(Interface, NullAndPastTheEndAreArgumentErrors) {
     EXPECT_EQ(std::string(""), zarvo_error_text(nullptr));
 }
 
+// A program may look at the count without looking at the code.
+TEST(Interface, RefusedReadsDeliverNothing) {
+    const std::string bytes = BuildArchive({.entries = {{.path = "a", .bytes = "text"}}}).bytes;
+    const zarvo::archive archive = OpenBytes(bytes);
+    char buffer[4];
+    size_t count = 77;
+    EXPECT_EQ(ZARVO_ERROR_ARGUMENT, zarvo_read(archive.get(), 1, 0, buffer, 4, &count, nullptr));
+    EXPECT_EQ(0u, std::exchange(count, 77));
+    EXPECT_EQ(ZARVO_ERROR_ARGUMENT, zarvo_stream_read(nullptr, buffer, 4, &count, nullptr));
+    EXPECT_EQ(0u, std::exchange(count, 77));
+    EXPECT_EQ(ZARVO_ERROR_ARGUMENT, zarvo_read_block(archive.get(), 1, buffer, &count, nullptr));
+    EXPECT_EQ(0u, count);
+}
+
 // Each request of the library is refused once: an error that says so, or right bytes, and no crash.
 TEST(Interface, EachRefusedRequestForMemoryIsAnError) {
     const std::string text = SampleText(30'000);

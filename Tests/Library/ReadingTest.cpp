@@ -313,4 +313,5 @@ TEST(Reading, EmptyBlocksCostNothing) {
     const std::string bytes = BuildArchive({.entries = {{.path = "a", .bytes = "0123456789"}}, .blocks = blocks}).bytes;
     zarvo::archive archive = OpenBytes(bytes);
     EXPECT_EQ(Delivered{"23456"}, Read(archive, 0, 2, 5));
+    EXPECT_EQ(ZARVO_OK, archive.read_block(1, {}).error.code());
 }
