@@ -1,11 +1,31 @@
-# What `cmake --install` puts where: the command with its manual page, and, for programs that embed the reader, the
-# library, its headers and the CMake package that find_package(Varnex) reads.
+# What `cmake --install` puts where: the command with its manual page; libzarvo, and for programs that use it its headers
+# with what pkg-config and find_package(Zarvo) read; and, for those who extend the runtime, the static library, its
+# headers and the CMake package that find_package(Varnex) reads.
 include(GNUInstallDirs)
 include(CMakePackageConfigHelpers)
 
 install(TARGETS Varnex COMPONENT command)
 install(FILES man/Varnex.1 DESTINATION ${CMAKE_INSTALL_MANDIR}/man1 COMPONENT command)
 install(FILES LICENSE DESTINATION ${CMAKE_INSTALL_DATAROOTDIR}/doc/varnex RENAME copyright COMPONENT command)
+
+install(TARGETS Zarvo EXPORT ZarvoTargets
+    LIBRARY COMPONENT libzarvo NAMELINK_COMPONENT libzarvo-dev
+    INCLUDES DESTINATION ${CMAKE_INSTALL_INCLUDEDIR})
+install(FILES LICENSE DESTINATION ${CMAKE_INSTALL_DATAROOTDIR}/doc/libzarvo0 RENAME copyright COMPONENT libzarvo)
+install(FILES Library/include/zarvo.h Library/include/zarvo.hpp DESTINATION ${CMAKE_INSTALL_INCLUDEDIR}
+    COMPONENT libzarvo-dev)
+install(FILES LICENSE DESTINATION ${CMAKE_INSTALL_DATAROOTDIR}/doc/libzarvo-dev RENAME copyright COMPONENT libzarvo-dev)
+
+# Both say where they are by their own place, so that an installed tree can be moved.
+cmake_path(RELATIVE_PATH CMAKE_INSTALL_FULL_INCLUDEDIR BASE_DIRECTORY ${CMAKE_INSTALL_FULL_LIBDIR}/pkgconfig
+    OUTPUT_VARIABLE ZARVO_INCLUDE_FROM_PKGCONFIG)
+configure_file(cmake/zarvo.pc.in zarvo.pc @ONLY)
+install(FILES ${PROJECT_BINARY_DIR}/zarvo.pc DESTINATION ${CMAKE_INSTALL_LIBDIR}/pkgconfig COMPONENT libzarvo-dev)
+set(ZARVO_PACKAGE_DIR ${CMAKE_INSTALL_LIBDIR}/cmake/Zarvo)
+write_basic_package_version_file(ZarvoConfigVersion.cmake COMPATIBILITY SameMajorVersion)
+install(EXPORT ZarvoTargets FILE ZarvoConfig.cmake NAMESPACE Zarvo:: DESTINATION ${ZARVO_PACKAGE_DIR}
+    COMPONENT libzarvo-dev)
+install(FILES ${PROJECT_BINARY_DIR}/ZarvoConfigVersion.cmake DESTINATION ${ZARVO_PACKAGE_DIR} COMPONENT libzarvo-dev)
 
 install(TARGETS VarnexRuntime EXPORT VarnexTargets COMPONENT development
     INCLUDES DESTINATION ${CMAKE_INSTALL_INCLUDEDIR}/varnex)
