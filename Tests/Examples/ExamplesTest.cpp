@@ -1,112 +1,97 @@
+// Every example, in C and in C++, with archives that are whole, damaged, and none.
 #include "Runtime/Utilities/Format.h"
-#include "Runtime/Utilities/SpookyHash.h"
 #include "Tests/Support/RunVarnex.h"
 #include "Tests/Support/TemporaryFolder.h"
 #include "Tools/ArchiveWriter/ArchiveWriter.h"
 
-#include <fcntl.h>
-#include <filesystem>
-
 namespace {
 
-namespace fs = std::filesystem;
-
-// A line that ParallelReader prints. It hashes pieces of 1 MiB, each hash the seed of the next.
-std::string HashLine(const ArchiveEntry& entry) {
-    UInt64 half1 = 0, half2 = 0;
-    for (size_t from = 0; from < entry.bytes.size(); from += 1 << 20)
-        SpookyHash::Hash128(&entry.bytes[from], entry.bytes.substr(from, 1 << 20).size(), &half1, &half2);
-    return Format("%016llx%016llx  %s\n", half1, half2, entry.path.c_str()).c_str();
-}
-
-std::string FailureLine(const std::string& path) { return "can't be read                     " + path + "\n"; }
-
-// Archives of the same files, larger than what the examples read at once.
-class Examples : public testing::Test {
-protected:
-    static std::string MakeText() {
-        std::string text;
-        while (text.size() < 2'500'000)
-            text += std::to_string(text.size()) + " ";
-        return text;
-    }
-
-    ArchiveDescription Archive(ArchiveLayout layout) const {
-        return {.layout = layout, .entries = {kSmall, kEmpty, kLarge, kLast}, .type = kCompressionLzma};
-    }
-
-    const ArchiveEntry kEmpty = {.path = "empty"}, kLarge = {.path = "large", .bytes = MakeText()},
-                       kSmall = {.path = "a/b", .bytes = kLarge.bytes.substr(0, 50'000)},
-                       kLast = {.path = "last", .bytes = "the end"};
-    const TemporaryFolder m_Folder;
-    const std::string m_Path = m_Folder / "a.zarvo";
-};
-
-constexpr ArchiveLayout kLayouts[] = {ArchiveLayout::kWeb, ArchiveLayout::kRaw, ArchiveLayout::kBlockBased};
-
-TEST_F(Examples, ReadOneFileWritesAnyFile) {
-    for (const ArchiveLayout layout : kLayouts) {
-        WriteArchive(Archive(layout), m_Path);
-        for (const ArchiveEntry& entry : Archive(layout).entries) {
-            const auto [status, output] = RunProgram(READ_ONE_FILE, {m_Path, entry.path});
-            EXPECT_EQ(0, status) << entry.path;
-            EXPECT_TRUE(output == entry.bytes) << entry.path << ": other bytes"; // too many to print
-        }
-    }
-}
-
-TEST_F(Examples, ParallelReaderHashesEveryFile) {
-    const std::string size = std::to_string(kLarge.bytes.size() + 50'007);
-    for (const ArchiveLayout layout : kLayouts) {
-        WriteArchive(Archive(layout), m_Path);
-        for (const std::string threads : {"1", "3", "8"}) {
-            const auto [status, output] = RunProgram(PARALLEL_READER, {m_Path, threads});
-            EXPECT_EQ(0, status);
-            const size_t lineEnd = output.find('\n') + 1;
-            const std::string said = size + " bytes by " + threads + " threads, ";
-            EXPECT_EQ(said, output.substr(0, said.size()));
-            EXPECT_EQ(HashLine(kSmall) + HashLine(kEmpty) + HashLine(kLarge) + HashLine(kLast), output.substr(lineEnd));
-        }
-    }
-}
-
-TEST_F(Examples, ReportFilesThatCantBeRead) {
-    WriteArchive(Archive(ArchiveLayout::kBlockBased), m_Path);
-    fs::resize_file(m_Path, fs::file_size(m_Path) - 100); // cuts the last block, which holds the end of "large"
-    EXPECT_EQ(Transcript(1, "last: damaged\n"), RunProgram(READ_ONE_FILE, {m_Path, "last"}));
-    const auto [status, output] = RunProgram(PARALLEL_READER, {m_Path, "2"});
-    EXPECT_EQ(1, status);
-    EXPECT_EQ(HashLine(kSmall) + HashLine(kEmpty) + FailureLine("large") + FailureLine("last"),
-              output.substr(output.find('\n') + 1));
-}
-
-TEST_F(Examples, ReadOneFileReportsAnUnknownPath) {
-    WriteArchive(Archive(ArchiveLayout::kBlockBased), m_Path);
-    EXPECT_EQ(Transcript(1, "b: no such file in the archive\n"), RunProgram(READ_ONE_FILE, {m_Path, "b"}));
-}
-
-TEST_F(Examples, ReportWhatIsNoArchive) {
-    const Transcript noArchive(1, "Unable to read header from archive file: .\n.: not a readable archive\n");
-    EXPECT_EQ(noArchive, RunProgram(READ_ONE_FILE, {".", "last"}));
-    EXPECT_EQ(noArchive, RunProgram(PARALLEL_READER, {"."}));
-}
-
-TEST_F(Examples, KeepMessagesOutOfTheirResults) {
-    // A block that is marked as a stream but can't be one makes a check fail, which prints a message.
-    constexpr UInt64 kStreamedLz4 = 0x42;
-    WriteArchive({.entries = {{.path = "a", .bytes = "text"}},
-                  .type = kCompressionLz4,
-                  .fields = {{"block[0].flags", kStreamedLz4}}},
-                 m_Path);
-    const auto splitOutput = [] {
-        return dup2(open("messages", O_WRONLY | O_CREAT | O_TRUNC, 0600), STDERR_FILENO) >= 0;
-    };
-    const std::string message = "Decompressor's stream must be initialized!\n";
-    EXPECT_EQ(Transcript(1, ""), RunProgram(READ_ONE_FILE, {m_Path, "a"}, m_Folder.Path(), splitOutput));
-    EXPECT_EQ(message, ReadFile(m_Folder / "messages").substr(0, message.size()));
-    EXPECT_EQ(Transcript(1, FailureLine("a")),
-              RunProgram(PARALLEL_READER, {m_Path, "2"}, m_Folder.Path(), splitOutput));
-    EXPECT_EQ(message, ReadFile(m_Folder / "messages").substr(0, message.size()));
-}
+constexpr char kDamaged[] = ": block 4 ends after the archive's last byte\n";
+constexpr char kNoArchive[] = "none: not a Zarvo archive\n";
 
 } // namespace
+
+class Examples : public testing::TestWithParam<const char*> {
+protected:
+    Examples() {
+        while (m_Text.size() < 500'000)
+            m_Text += std::to_string(m_Text.size()) + " ";
+        m_Archive.entries = {{.path = "a/b", .bytes = m_Text.substr(0, 50'000)},
+                             {.path = "empty"},
+                             {.path = "large", .bytes = m_Text},
+                             {.path = "last", .bytes = "the end"}};
+        m_Archive.type = kCompressionLzma;
+        WriteArchive(m_Archive, m_Folder / "whole");
+        // Inside the last block, where "large" ends.
+        WriteFile(m_Folder / "cut",
+                  ReadFile(m_Folder / "whole").erase(std::filesystem::file_size(m_Folder / "whole") - 100));
+        WriteFile(m_Folder / "none", m_Text);
+    }
+
+    Transcript Run(const std::string& example, const std::vector<std::string>& arguments) const {
+        return RunProgram((EXAMPLES + example + GetParam()).c_str(), arguments, m_Folder.Path());
+    }
+
+    // A line of ReadInThreads.
+    static std::string SumLine(const ArchiveEntry& entry) {
+        UInt64 sum = 0xcbf29ce484222325;
+        for (const char byte : entry.bytes)
+            sum = (sum ^ static_cast<UInt8>(byte)) * 0x100000001b3;
+        return Format("%016llx  %s\n", sum, entry.path.c_str()).c_str();
+    }
+
+    std::string m_Text;
+    ArchiveDescription m_Archive;
+    const TemporaryFolder m_Folder;
+};
+
+INSTANTIATE_TEST_SUITE_P(Languages, Examples, testing::Values("", "C"));
+
+TEST_P(Examples, ListEntriesPrintsFoldersWithASlash) {
+    m_Archive.entries.push_back({.path = "folder", .flags = kFolderEntry});
+    WriteArchive(m_Archive, m_Folder / "folder");
+    EXPECT_EQ(Transcript(0, "a/b\nempty\nlarge\nlast\nfolder/\n"), Run("ListEntries", {"folder"}));
+    EXPECT_EQ(Transcript(1, kNoArchive), Run("ListEntries", {"none"}));
+    EXPECT_EQ(Transcript(2, "Usage: ListEntries ARCHIVE\n"), Run("ListEntries", {}));
+}
+
+TEST_P(Examples, ReadOneFileWritesWhatCanBeRead) {
+    for (const ArchiveEntry& entry : m_Archive.entries)
+        EXPECT_EQ(Transcript(0, entry.bytes), Run("ReadOneFile", {"whole", entry.path}));
+    EXPECT_EQ(Transcript(1, std::string("last") + kDamaged), Run("ReadOneFile", {"cut", "last"}));
+    auto [status, output] = Run("ReadOneFile", {"cut", "large"});
+    EXPECT_EQ(1, status);
+    const std::string said = std::string("large") + kDamaged;
+    ASSERT_NE(std::string::npos, output.find(said));
+    output.erase(output.find(said), said.size());
+    EXPECT_LE(4 * m_Archive.chunkSize - m_Archive.entries[0].bytes.size(), output.size());
+    EXPECT_EQ(m_Text.substr(0, output.size()), output);
+}
+
+TEST_P(Examples, ReadOneFileSaysWhatIsNoFile) {
+    EXPECT_EQ(Transcript(1, "a: a folder\n"), Run("ReadOneFile", {"whole", "a"}));
+    EXPECT_EQ(Transcript(1, "b: no such entry\n"), Run("ReadOneFile", {"whole", "b"}));
+    EXPECT_EQ(Transcript(1, kNoArchive), Run("ReadOneFile", {"none", "a/b"}));
+    EXPECT_EQ(Transcript(2, "Usage: ReadOneFile ARCHIVE PATH\n"), Run("ReadOneFile", {"whole"}));
+}
+
+TEST_P(Examples, ReadInThreadsReadsEveryLayout) {
+    std::string lines;
+    for (const ArchiveEntry& entry : m_Archive.entries)
+        lines += SumLine(entry);
+    for (const ArchiveLayout layout : {ArchiveLayout::kWeb, ArchiveLayout::kRaw, ArchiveLayout::kBlockBased}) {
+        m_Archive.layout = layout;
+        WriteArchive(m_Archive, m_Folder / "whole");
+        EXPECT_EQ(Transcript(0, lines), Run("ReadInThreads", {"whole"}));
+    }
+    EXPECT_EQ(Transcript(1, kNoArchive), Run("ReadInThreads", {"none"}));
+    EXPECT_EQ(Transcript(2, "Usage: ReadInThreads ARCHIVE\n"), Run("ReadInThreads", {}));
+}
+
+TEST_P(Examples, ReadInThreadsNamesDamagedFiles) {
+    const auto [status, output] = Run("ReadInThreads", {"cut"});
+    EXPECT_EQ(1, status);
+    EXPECT_EQ(std::string("large") + kDamaged + "last" + kDamaged + SumLine(m_Archive.entries[0]) +
+                  SumLine(m_Archive.entries[1]),
+              output);
+}
