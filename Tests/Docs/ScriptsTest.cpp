@@ -47,7 +47,7 @@ TEST_F(Scripts, AskForAllTheirPackagesAtOnce) {
         std::vector<std::string> arguments;
         std::string packages;
     };
-    for (const Row& row : {Row{.script = "test", .arguments = {}, .packages = test + " dpkg-dev file"},
+    for (const Row& row : {Row{.script = "test", .arguments = {}, .packages = test + " pkgconf dpkg-dev file"},
                            Row{.script = "test", .arguments = {"debug"}, .packages = test},
                            Row{.script = "bench", .arguments = {"--help"}, .packages = "python3"},
                            Row{.script = "includes", .arguments = {}, .packages = lint}})

@@ -1,4 +1,5 @@
-// Runs the README's program with a back end that is derived from the library's, and says who was asked.
+// Runs the program that ARCHITECTURE.md shows with a back end that is derived from the library's, and says who was
+// asked.
 #include "Runtime/VirtualFileSystem/ArchiveFileSystem/ArchiveStorageReader.h"
 #include "Runtime/VirtualFileSystem/LocalFileSystemPosix.h"
 #include "Runtime/VirtualFileSystem/VirtualFileSystem.h"
@@ -16,15 +17,15 @@ public:
     int opened = 0;
 };
 
-static int RunReadmeProgram() {
-#include <ReadmeProgram.inc>
+static int RunShownProgram() {
+#include <ShownProgram.inc>
     return 0;
 }
 
 int RunPlugin() {
     CountingFileSystem fileSystem;
     GetFileSystem()->RegisterHandler(&fileSystem);
-    const int status = RunReadmeProgram();
+    const int status = RunShownProgram();
 
     FileSystemHandler* handler = GetFileSystem()->GetHandlerForPath("game.zarvo");
     printf("%s opened %d for %s\n", typeid(*handler).name(), fileSystem.opened, typeid(ArchiveStorageReader).name());
