@@ -51,20 +51,29 @@ static struct Process* Look(void) {
     return process;
 }
 
-/* What the program prints, in the place of both outputs. */
-static int CatchOutput(void) {
-    FILE* const file = tmpfile();
-    CHECK(file != NULL);
-    const int copy = dup(STDERR_FILENO);
-    CHECK(dup2(fileno(file), STDOUT_FILENO) == STDOUT_FILENO && dup2(fileno(file), STDERR_FILENO) == STDERR_FILENO);
-    return copy;
+static int s_Errors;    /* the standard error that was */
+static FILE* s_Printed; /* what goes to both outputs instead */
+
+static void ShowPrinted(void) {
+    char text[4096];
+    rewind(s_Printed);
+    text[fread(text, 1, sizeof(text) - 1, s_Printed)] = '\0';
+    dprintf(s_Errors, "%s", text);
+}
+
+static void CatchOutput(void) {
+    s_Errors = dup(STDERR_FILENO);
+    s_Printed = tmpfile();
+    CHECK(s_Printed != NULL && atexit(ShowPrinted) == 0);
+    CHECK(dup2(fileno(s_Printed), STDOUT_FILENO) == STDOUT_FILENO);
+    CHECK(dup2(fileno(s_Printed), STDERR_FILENO) == STDERR_FILENO);
 }
 
 int main(int argumentCount, char** arguments) {
     CHECK(argumentCount == 3);
     CHECK(setlocale(LC_ALL, "C.UTF-8") != NULL);
     CHECK(signal(SIGPIPE, SIG_IGN) != SIG_ERR);
-    const int errors = CatchOutput();
+    CatchOutput();
     struct Process* const before = Look();
 
     const struct Library library = Load(dlopen(arguments[2], RTLD_NOW));
@@ -75,7 +84,6 @@ int main(int argumentCount, char** arguments) {
     fflush(NULL);
     struct stat printed;
     CHECK(fstat(STDOUT_FILENO, &printed) == 0);
-    dup2(errors, STDERR_FILENO);
     CHECK(printed.st_size == 0);
     CHECK(memcmp(before->signals, after->signals, sizeof(before->signals)) == 0);
     CHECK(strcmp(before->locale, after->locale) == 0);
