@@ -1,5 +1,7 @@
 #include "Library/EntryIndex.h"
 
+#include "Library/PathRules.h"
+
 #include <sys/random.h>
 
 using ArchiveStorageHeader::Node;

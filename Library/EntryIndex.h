@@ -8,7 +8,6 @@
 #pragma once
 
 #include "Library/Failure.h"
-#include "Library/PathRules.h"
 #include "Runtime/Core/Containers/DynamicArray.h"
 #include "Runtime/VirtualFileSystem/ArchiveFileSystem/ArchiveStorageHeader.h"
 

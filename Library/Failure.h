@@ -7,7 +7,6 @@
 #pragma once
 
 #include "Library/include/zarvo.h"
-#include "Runtime/Core/Types.h"
 
 struct Failure {
     zarvo_code code = ZARVO_OK;

@@ -1,6 +1,7 @@
 // The functions of zarvo.h that work on archives: arguments are looked at here, and nowhere below.
 #include "Library/Archive.h"
 #include "Library/Handles.h"
+#include "Library/PathRules.h"
 #include "Library/PublicStructures.h"
 #include "Runtime/Allocator/Allocator.h"
 

@@ -4,6 +4,7 @@
 
 #include "Library/Failure.h"
 #include "Runtime/Core/NonCopyable.h"
+#include "Runtime/Core/Types.h"
 
 #include <sys/types.h>
 

@@ -2,7 +2,6 @@
 #pragma once
 
 #include "Library/include/zarvo.hpp"
-#include "Tools/ArchiveWriter/ArchiveWriter.h"
 
 #include <algorithm>
 #include <atomic>

@@ -1,4 +1,6 @@
-#include "Tests/Library/LibraryTest.h"
+#include "Library/include/zarvo.hpp"
+
+#include <gtest/gtest.h>
 
 #include <ctime>
 

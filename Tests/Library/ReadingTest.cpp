@@ -1,4 +1,5 @@
 #include "Tests/Library/LibraryTest.h"
+#include "Tools/ArchiveWriter/ArchiveWriter.h"
 
 #include <malloc.h>
 #include <map>
