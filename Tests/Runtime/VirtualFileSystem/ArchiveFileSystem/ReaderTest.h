@@ -1,7 +1,7 @@
 // What the tests of the archive reader share: archives on a disk that a test may disturb, and a look at the cache.
 #pragma once
 
-#include "Runtime/VirtualFileSystem/ArchiveFileSystem/ArchiveStorageReader.h"
+#include "Runtime/VirtualFileSystem/ArchiveFileSystem/CachedBlock.h"
 #include "Tests/Support/FaultyFileSystem.h"
 #include "Tests/Support/TemporaryFolder.h"
 #include "Tools/ArchiveWriter/ArchiveWriter.h"
