@@ -6,7 +6,7 @@
 #include "Runtime/Utilities/Format.h"
 #include "Runtime/Utilities/LogAssert.h"
 
-// What a kind does that takes no memory.
+// For kinds that need no memory to decode.
 DecompressResult IDecompressor::TryDecompressMemory(const void* src, size_t* srcSize, void* dst,
                                                     size_t* dstSize) const {
     return DecompressMemory(src, srcSize, dst, dstSize) ? DecompressResult::kOk : DecompressResult::kDamaged;
