@@ -39,7 +39,7 @@ public:
     [[nodiscard]] virtual bool DecompressMemory(const void* src, size_t* srcSize, void* dst, size_t* dstSize) const = 0;
 
     // Makes *state ready for a new stream: creates it when it is null, else resets it. False when the kind can't be
-    // streamed or memory is refused.
+    // streamed.
     [[nodiscard]] virtual bool DecompressStreamInit(void** state) const = 0;
 
     // Frees a state; null is allowed.
@@ -58,6 +58,6 @@ public:
                                                  size_t* dstSize, bool isLastInput) const;
 };
 
-// A new decompressor, allocated under label: free it with Delete(decompressor, label). Null for kCompressionNone, when
-// memory is refused, and for a kind without a decompressor, which is reported as an error.
+// A new decompressor, allocated under label: free it with Delete(decompressor, label). Null for kCompressionNone, and
+// for a kind without a decompressor, which is reported as an error.
 IDecompressor* CreateDecompressor(CompressionType type, MemLabelId label);

@@ -54,10 +54,7 @@ DecompressResult LzmaDecompressor::TryDecompressMemory(const void* src, size_t* 
 }
 
 bool LzmaDecompressor::DecompressStreamInit(void** state) const {
-    if (*state == nullptr) {
-        *state = New<LzmaStreamState>(kMemLabelFileSystem);
-        if (*state == nullptr) return false;
-    }
+    if (*state == nullptr) *state = RequireMemory(New<LzmaStreamState>(kMemLabelFileSystem));
     auto& stream = *static_cast<LzmaStreamState*>(*state);
     if (stream.started) LzmaDec_Free(&stream.decoder, &s_LzmaDecAlloc);
     LzmaDec_Construct(&stream.decoder);
@@ -81,8 +78,7 @@ bool LzmaDecompressor::DecompressStream(void* state, const void* src, size_t* sr
 DecompressResult LzmaDecompressor::TryDecompressStream(void* state, const void* src, size_t* srcSize, void* dst,
                                                        size_t* dstSize, bool isLastInput) const {
     auto* const stream = static_cast<LzmaStreamState*>(state);
-    if (stream == nullptr) return DecompressResult::kOutOfMemory; // a state is null only when memory was refused
-    if (stream->failed) return DecompressResult::kDamaged;
+    if (stream == nullptr || stream->failed) return DecompressResult::kDamaged;
     const Byte* const input = src != nullptr ? static_cast<const Byte*>(src) : &kNoInput;
     size_t consumed = 0;
     if (!stream->started) {

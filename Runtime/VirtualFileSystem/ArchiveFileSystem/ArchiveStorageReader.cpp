@@ -118,8 +118,7 @@ bool ArchiveStorageReader::BuildOffsetTables() {
 // Lets the parsers read a file that no handler serves. The caller keeps the file until the accessor is closed.
 static bool OpenFile(IFile* file, FileAccessor* accessor) {
     FileEntryData data;
-    data.accessorHandler = New<IFileAdapter>(kMemLabelGeneral, file, kMemLabelGeneral, false);
-    if (data.accessorHandler == nullptr) return false;
+    data.accessorHandler = RequireMemory(New<IFileAdapter>(kMemLabelGeneral, file, kMemLabelGeneral, false));
     FileSystemEntry entry(data);
     return accessor->Open(entry, kFilePermissionRead);
 }
@@ -193,14 +192,11 @@ namespace {
 class ScratchBuffer : private NonCopyable {
 public:
     explicit ScratchBuffer(size_t size) {
-        if (size == 0 || size < sizeof(m_Stack)) {
-            m_Data = size != 0 ? m_Stack : nullptr;
-            return;
-        }
-        m_Heap = Owned<char>(
-            static_cast<char*>(malloc_internal(size, 1, kMemLabelGeneral, kAllocateOptionNone, __FILE__, __LINE__)),
-            kMemLabelGeneral);
-        m_Data = m_Heap.get();
+        if (size >= sizeof(m_Stack))
+            m_Heap = {
+                static_cast<char*>(malloc_internal(size, 1, kMemLabelGeneral, kAllocateOptionNone, __FILE__, __LINE__)),
+                kMemLabelGeneral};
+        m_Data = size == 0 ? nullptr : size < sizeof(m_Stack) ? m_Stack : m_Heap.get();
     }
 
     void* Data() { return m_Data; }
@@ -208,7 +204,7 @@ public:
 private:
     char m_Stack[2000];
     Owned<char> m_Heap;
-    void* m_Data;
+    char* m_Data;
 };
 
 // LZ4 can't make more bytes than this of one: a header that promises more is damaged.
@@ -291,9 +287,8 @@ void ArchiveStorageReader::TryToReadDirectoryFromBlockData(UInt64 from, const vo
 
     if (isComplete && !m_DirectoryFile) {
         // The whole directory lies in the caller's buffer: parse it there.
-        auto* contents =
-            New<SingleBlockMemoryFileData>(kMemLabelGeneral, kMemLabelGeneral, const_cast<void*>(data), size, false);
-        if (contents == nullptr) return;
+        auto* contents = RequireMemory(
+            New<SingleBlockMemoryFileData>(kMemLabelGeneral, kMemLabelGeneral, const_cast<void*>(data), size, false));
         MemoryFile file(kMemLabelGeneral, contents, kFilePermissionRead);
         contents->Release();
         SetDirectoryReady(TryReadDirectoryInfoFromFile(&file));
@@ -301,11 +296,11 @@ void ArchiveStorageReader::TryToReadDirectoryFromBlockData(UInt64 from, const vo
     }
 
     if (!m_DirectoryFile) {
-        auto* contents = New<MultiBlocksMemoryFileData>(m_Label, m_Label, MultiBlocksMemoryFileData::kDefaultBlockSize);
-        if (contents == nullptr) return;
-        m_DirectoryFile = {New<MemoryFile>(m_Label, m_Label, contents, kFilePermissionReadWrite), m_Label};
+        auto* contents = RequireMemory(
+            New<MultiBlocksMemoryFileData>(m_Label, m_Label, MultiBlocksMemoryFileData::kDefaultBlockSize));
+        m_DirectoryFile = {RequireMemory(New<MemoryFile>(m_Label, m_Label, contents, kFilePermissionReadWrite)),
+                           m_Label};
         contents->Release();
-        if (!m_DirectoryFile) return;
     }
     UInt64 written = 0;
     if (!m_DirectoryFile->Write(VFS::FileSize(from), size, data, &written) || written != size) return;

@@ -101,12 +101,9 @@ ArchiveStorageReader::CachedBlock* ArchiveStorageReader::ClaimVictim() {
     return victim;
 }
 
-// Makes a record, which starts claimed; null when memory is refused.
+// Makes a record, which starts claimed.
 ArchiveStorageReader::CachedBlock* ArchiveStorageReader::AddCachedBlock() {
-    if (m_CachedBlocks.size() == m_CachedBlocks.capacity()) m_CachedBlocks.grow();
-    if (m_CachedBlocks.size() == m_CachedBlocks.capacity()) return nullptr;
-    CachedBlock* block = New<CachedBlock>(m_Label, m_Label);
-    if (block == nullptr) return nullptr;
+    CachedBlock* block = RequireMemory(New<CachedBlock>(m_Label, m_Label));
     StampCachedBlock(block);
     m_CachedBlocks.push_back(block);
     return block;
@@ -119,10 +116,6 @@ ArchiveStorageReader::AcquireAndPrefillUnusedBlock(UInt32 blockIndex, CacheResul
         Mutex::AutoLock lock(m_CacheLock);
         record = ClaimVictim();
         if (record == nullptr) record = AddCachedBlock();
-        if (record == nullptr) {
-            *result = kCacheResultDecompressError;
-            return nullptr;
-        }
         ReinitCachedBlock(record, blockIndex);
         Check(record->IsClaimed(), "ArchiveStorage block must be marked as being written!");
         Check(!record->HasReaders(), "ArchiveStorage block must have no readers before write!");
@@ -253,7 +246,7 @@ void ArchiveStorageReader::NoteBrokenBlock(const BrokenBlocks::Record& record) {
     m_HasBrokenBlocks.store(true, std::memory_order_relaxed);
 }
 
-// A block without a stream has been reported, and is reported each time.
+// Notes nothing for a kind that can't be streamed, because each read of the block must report it.
 void ArchiveStorageReader::NoteBrokenStream(const CachedBlock& block, UInt64 from) {
     if (block.streamState != nullptr) NoteBrokenBlock({.from = from, .blockIndex = block.blockIndex});
 }
