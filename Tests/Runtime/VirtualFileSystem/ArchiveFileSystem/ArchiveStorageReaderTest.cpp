@@ -222,7 +222,7 @@ TEST(ArchiveReader, CutStoredBlockEndsAReadBeforeIt) {
     EXPECT_EQ("0123456789", OpenedArchive(built.bytes.substr(0, built.dataOffset + 12)).Read(0, 15));
 }
 
-TEST(ArchiveReader, FailedStreamStartsOverAtTheNextRead) {
+TEST(ArchiveReader, StreamIsWholeAfterAFailedRead) {
     constexpr UInt64 kWindow = 65'536;
     constexpr UInt64 kSize = 3 * kWindow;
     std::string text(kSize, ' ');
