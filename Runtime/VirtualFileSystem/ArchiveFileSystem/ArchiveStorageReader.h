@@ -20,9 +20,9 @@
 //   n = 1    n + 1                     n 0, closes the file, then empties the cache   delivers
 //   n > 1    n + 1                     n - 1                                          delivers
 //
-// Locks: Storage has its own lock for the open file, and calls nothing that takes the other; m_CacheLock guards the
-// list of cached blocks. No lock is held while data is decompressed, and m_CacheLock is not held while the file is
-// read.
+// Locks: Storage locks the open file for itself and never calls the reader; m_CacheLock guards the list of cached
+// blocks. So no operation holds both. No lock is held while data is decompressed, and m_CacheLock is not held while the
+// file is read.
 #pragma once
 
 #include "Runtime/Allocator/Owned.h"
@@ -136,9 +136,9 @@ private:
         kCacheResultIncomplete = 1, // stored bytes, or the stream, ended early
     };
 
-    // The archive file, who uses it, and where its data starts. Positions are those of stored bytes, counted from the
-    // first one of block 0. Every operation takes the lock for itself and leaves it before it returns, and none calls
-    // the reader: nobody can hold this lock and the cache's. In ArchiveStorageReaderStorage.cpp.
+    // The archive file, how many use it, and where its data starts. Positions are those of stored bytes: 0 is the first
+    // byte of block 0. The lock is private and no operation calls the reader, so nobody can hold it together with
+    // m_CacheLock; and nobody calls Storage under m_CacheLock. In ArchiveStorageReaderStorage.cpp.
     class Storage {
     public:
         // Set-up, while no other thread uses the reader; so these take no lock.
@@ -154,7 +154,7 @@ private:
         [[nodiscard]] bool MakeUnused();
 
         [[nodiscard]] bool ReadFromStorage(UInt64 position, UInt64 size, void* destination, UInt64* delivered);
-        // Whether the file holds no stored byte at this position, nor after it.
+        // Whether the file ends at or before this position.
         bool EndsBy(UInt64 position);
         // Where stored bytes lie in the file: pieces[1] is empty unless they lie on both sides of a hidden field.
         void Locate(UInt64 position, UInt64 size, Block::Piece (&pieces)[2]) const;
@@ -187,7 +187,7 @@ private:
     void TryToReadDirectoryFromBlockData(UInt64 from, const void* data, size_t size);
     [[nodiscard]] bool TryReadDirectoryInfoFromFile(IFile* file);
 
-    // Blocks, in ArchiveStorageReader.cpp. No block has kCompressionNone and is not streamed.
+    // Blocks, in ArchiveStorageReader.cpp. kNoBlock counts as stored as is, and not streamed.
     CompressionType GetBlockType(UInt32 blockIndex) const;
     bool IsBlockStreamed(UInt32 blockIndex) const;
 

@@ -338,7 +338,27 @@ TEST(ArchiveReader, ReadsElsewhereKeepNothingForADirectory) {
     EXPECT_TRUE(archive.reader.FindDirectory());
 }
 
-// Archives of one short file, of which a test looks at the descriptors that are open.
+// A ZarvoWeb archive, in which 8 bytes between properties and coded bytes are hidden.
+class HiddenSizeField : public testing::Test {
+protected:
+    DisturbedDisk m_Disk;
+    OpenedArchive m_Archive{
+        ArchiveDescription{.layout = ArchiveLayout::kWeb, .blocks = {{4, {}, {}, "props8 bytes!coded"}}}};
+};
+
+TEST_F(HiddenSizeField, IsNoPartOfTheStoredBytes) {
+    EXPECT_EQ("propscoded", Access::ReadStored(m_Archive.reader, 0, 10));
+    EXPECT_EQ("sc", Access::ReadStored(m_Archive.reader, 4, 2));
+    EXPECT_EQ("props", Access::ReadStored(m_Archive.reader, 0, 5));
+    EXPECT_EQ("cod", Access::ReadStored(m_Archive.reader, 5, 3));
+}
+
+TEST_F(HiddenSizeField, DoesNotFollowCutProperties) {
+    m_Disk.Arm(1, {.isLasting = false, .isShort = true});
+    EXPECT_EQ("pr", Access::ReadStored(m_Archive.reader, 0, 10));
+}
+
+// An archive of one short file.
 class ArchiveStorage : public testing::Test {
 protected:
     int CountOpenFiles() const { return static_cast<int>(CountOpenDescriptors()) - m_DescriptorsBefore; }

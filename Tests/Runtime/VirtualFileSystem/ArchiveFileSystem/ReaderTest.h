@@ -39,6 +39,12 @@ struct ArchiveStorageReaderTestAccess {
             ++count;
         return count;
     }
+    static std::string ReadStored(ArchiveStorageReader& reader, UInt64 position, UInt64 size) {
+        std::string bytes(size, '\xEE');
+        UInt64 count = 0;
+        EXPECT_TRUE(reader.m_Storage.ReadFromStorage(position, size, bytes.data(), &count));
+        return bytes.substr(0, count);
+    }
     static const auto& Blocks(const ArchiveStorageReader& reader) { return reader.m_BlocksInfo.storageBlocks; }
 };
 using Access = ArchiveStorageReaderTestAccess;
