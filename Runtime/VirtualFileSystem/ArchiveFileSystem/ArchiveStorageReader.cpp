@@ -207,7 +207,7 @@ private:
     char* m_Data;
 };
 
-// LZ4 can't make more bytes than this of one: a header that promises more is damaged.
+// LZ4 makes at most this many bytes of one; a header that promises more is damaged.
 constexpr UInt64 kMaxLz4Expansion = 255;
 
 bool IsPossibleSize(CompressionType type, UInt64 compressedSize, UInt64 uncompressedSize) {
@@ -272,7 +272,7 @@ bool ArchiveStorageReader::CanDirectoryBecomeReady() const {
     return m_DirectoryScanner.CanCompleteWithin(m_UncompressedBlocksOffsets.back());
 }
 
-// Releases the directory to the threads that see it ready.
+// Publishes the directory: a thread that sees it ready sees all of it.
 void ArchiveStorageReader::SetDirectoryReady(bool isReady) {
     m_DirectoryReady.store(isReady, std::memory_order_release);
 }

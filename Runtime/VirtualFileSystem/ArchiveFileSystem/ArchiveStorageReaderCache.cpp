@@ -15,7 +15,7 @@ constexpr double kFillPollSeconds = 0.01;
 IDecompressor* ArchiveStorageReader::GetDecompressor(CompressionType type) {
     if (!Check(type < kCompressionCount, "Assertion failed on expression: 't < kCompressionCount'")) return nullptr;
     std::atomic<IDecompressor*>& slot = m_Decompressors[type];
-    IDecompressor* decompressor = slot.load(std::memory_order_acquire); // comes with what its maker wrote
+    IDecompressor* decompressor = slot.load(std::memory_order_acquire); // sees what its maker wrote
     if (decompressor != nullptr) return decompressor;
     Owned<IDecompressor> made(CreateDecompressor(type, m_Label), m_Label);
     // No lock is held here: when two threads make one at once, the second drops its own and takes the first one's.
@@ -60,7 +60,7 @@ ArchiveStorageReader::CachedBlock* ArchiveStorageReader::AcquireCachedBlock(UInt
               "Assertion failed on expression: 'AtomicCompareExchange(&block->bufferReaders, 0, 0)'");
         found->AddReader();
     } else if (found != nullptr) {
-        // A reader first, so that the record can't be pointed at another block while this thread waits for its filler.
+        // Count in first, so that nobody points the record at another block while this thread waits for its filler.
         found->AddReader();
         // Under the lock, a claimed record is being filled: a victim scan gives its marks back before it unlocks.
         if (found->IsClaimed()) {
@@ -173,11 +173,11 @@ ArchiveStorageReader::CacheResult ArchiveStorageReader::CopyFromCachedBlock(Cach
     return result;
 }
 
-// Ends the use that one of the two acquire operations began. result is that of the copying.
+// Ends the use that one of the two acquire operations began. result: of CopyFromCachedBlock.
 void ArchiveStorageReader::ReleaseCachedBlock(CachedBlock* block, CacheResult result) {
     const bool isStreamed = IsBlockStreamed(block->blockIndex);
     if (result < kCacheResultOk) {
-        // A failed stream can't be resumed; the next reader starts over.
+        // A failed decoder can't continue; the next reader starts the stream over.
         Mutex::AutoLock lock(m_CacheLock);
         ReinitCachedBlock(block, kNoBlock);
     }
@@ -238,8 +238,8 @@ void ArchiveStorageReader::EmptyCache() {
     m_CachedBlocks.resize_initialized(kept);
 }
 
-// Remembers from where on a block's data is damaged, until the file is closed. Only a failure that would come again
-// each time, and without a report, is noted.
+// Remembers until the file is closed that a block is damaged, and from where on. Call it only for a failure that would
+// repeat at each read, and that nobody reports.
 void ArchiveStorageReader::NoteBrokenBlock(const BrokenBlocks::Record& record) {
     Mutex::AutoLock lock(m_CacheLock);
     m_BrokenBlocks.Note(record);

@@ -69,7 +69,7 @@ bool ArchiveStorageReader::Read(VFS::FileSize fromPosition, UInt64 size, void* b
     return delivered != 0;
 }
 
-// A whole block straight into the caller's memory: no cached record, no copy.
+// Decodes a whole block straight into the caller's memory, without a cached record and without a copy.
 bool ArchiveStorageReader::ReadCompleteBlock(UInt32 blockIndex, void* destination, UInt64* delivered,
                                              BatchingFileReader* batch) {
     const UInt32 uncompressedSize = m_BlocksInfo.storageBlocks[blockIndex].uncompressedSize;
@@ -88,7 +88,7 @@ bool ArchiveStorageReader::ReadCompleteBlock(UInt32 blockIndex, void* destinatio
     return result >= kCacheResultOk;
 }
 
-// A part of a block: stored bytes from the file, compressed ones through the cache.
+// Reads a part of a block: from the file when it is stored as is, else through the cache.
 bool ArchiveStorageReader::ReadBlock(UInt32 blockIndex, UInt64 offsetInBlock, UInt64 size, void* destination,
                                      UInt64* delivered, BatchingFileReader* batch) {
     if (GetBlockType(blockIndex) == kCompressionNone)
