@@ -66,8 +66,10 @@ protected:
         return {refused, m_Disk.reads, Access::Look(m_Archive.reader)};
     }
 
+    void ReadPartOf(UInt64 block) { EXPECT_EQ(m_Text.substr(block * kPiece, 9), m_Archive.Read(block * kPiece, 9)); }
+
     // Makes the cache forget one block.
-    void ReadAnotherBlock() { EXPECT_EQ(m_Text.substr(12 * kPiece, 9), m_Archive.Read(12 * kPiece, 9)); }
+    void ReadAnotherBlock() { ReadPartOf(12); }
 
     const std::string m_Text = SampleText(13 * kPiece);
     DisturbedDisk m_Disk;
@@ -79,6 +81,7 @@ protected:
 
 using SoundDisk = ReaderCrowd;
 using FailingDisk = ReaderCrowd;
+using TwoRecords = ReaderCrowd;
 
 } // namespace
 
@@ -96,6 +99,19 @@ INSTANTIATE_TEST_SUITE_P(, SoundDisk,
                                          Crowd{.threads = 6}, Crowd{.threads = 6, .stride = 1},
                                          Crowd{.threads = 6, .streamed = true},
                                          Crowd{.threads = 6, .streamed = true, .stride = 1}));
+
+TEST_P(TwoRecords, ForgetWhatWasUsedLongestAgo) {
+    ReadAtOnce(0);
+    ReadPartOf(0);
+    ReadPartOf(1);
+    ReadAnotherBlock();
+    m_Disk.reads = 0;
+    ReadPartOf(1);
+    EXPECT_EQ(0u, m_Disk.reads);
+    ReadPartOf(0);
+    EXPECT_EQ(1u, m_Disk.reads);
+}
+INSTANTIATE_TEST_SUITE_P(, TwoRecords, testing::Values(Crowd{.threads = 2, .stride = 1}));
 
 TEST_P(FailingDisk, FailsOnlyTheThreadThatReads) {
     for (const UInt64 firstBlock : {0u, 6u, 0u}) {

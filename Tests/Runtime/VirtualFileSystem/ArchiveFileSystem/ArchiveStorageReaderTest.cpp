@@ -217,6 +217,12 @@ TEST(ArchiveReader, StreamThatEndsEarlyDeliversWhatItHolds) {
     EXPECT_EQ(kRefused, archive.Read(60'000, 10));
 }
 
+TEST(ArchiveReader, StreamLongerThanItsBlockIsDamaged) {
+    const std::string lzma = CompressLzma(SampleText(70'000), {});
+    OpenedArchive archive({.entries = {{"", SampleText(60'000)}}, .blocks = {{60'000, kCompressionLzma, true, lzma}}});
+    EXPECT_EQ(kRefused, archive.Read(0, 60'000));
+}
+
 TEST(ArchiveReader, CutStoredBlockEndsAReadBeforeIt) {
     const BuiltArchive built = BuildArchive({.entries = {{"", "0123456789abcdefghij"}}, .chunkSize = 10});
     EXPECT_EQ("0123456789", OpenedArchive(built.bytes.substr(0, built.dataOffset + 12)).Read(0, 15));
@@ -471,6 +477,11 @@ TEST(ArchiveReader, BlocksNameTheirBytesInTheFile) {
          .stored = {"prop"},
          .streamed = {true},
          .firstPieceSize = 4},
+        {.what = "ZarvoWeb, too short for the field",
+         .description = {.layout = ArchiveLayout::kWeb, .blocks = {{4, {}, {}, "8 bytes!"}}},
+         .stored = {"8 bytes!"},
+         .streamed = {true},
+         .firstPieceSize = 8},
     };
     for (const auto& row : rows) {
         SCOPED_TRACE(row.what);
