@@ -223,6 +223,23 @@ TEST(ArchiveReader, StreamLongerThanItsBlockIsDamaged) {
     EXPECT_EQ(kRefused, archive.Read(0, 60'000));
 }
 
+TEST(ArchiveReader, ChunkShorterThanItsBlockIsDamaged) {
+    const std::string lzma = CompressLzma(SampleText(60'000), {.endMark = true});
+    OpenedArchive archive({.entries = {{"", SampleText(90'000)}}, .blocks = {{90'000, kCompressionLzma, false, lzma}}});
+    EXPECT_EQ(kRefused, archive.Read(0, 90'000));
+    EXPECT_EQ(kRefused, archive.Read(10, 20));
+}
+
+TEST(ArchiveReader, StoredBlockIsNotReadPastTheRange) {
+    constexpr UInt64 kBlock = 10'000;
+    const std::string text = SampleText(2 * kBlock);
+    DisturbedDisk disk;
+    OpenedArchive archive({.entries = {{"", text}}, .chunkSize = kBlock});
+    disk.bytes = 0;
+    EXPECT_EQ(text.substr(kBlock - 10, 30), archive.Read(kBlock - 10, 30));
+    EXPECT_EQ(30u, disk.bytes);
+}
+
 TEST(ArchiveReader, CutStoredBlockEndsAReadBeforeIt) {
     const BuiltArchive built = BuildArchive({.entries = {{"", "0123456789abcdefghij"}}, .chunkSize = 10});
     EXPECT_EQ("0123456789", OpenedArchive(built.bytes.substr(0, built.dataOffset + 12)).Read(0, 15));
