@@ -1,9 +1,9 @@
 // The least that extracting an archive can cost: Floor ARCHIVE FOLDER
 //
-// Reads ARCHIVE.plan (see PackFolder.cpp), so it parses and checks nothing of the archive; decodes the blocks into one
-// buffer that stays in the processor's cache, and makes each file of FOLDER with open, one write (a large one with one
-// for each piece) and close, each folder with mkdir. A stored block is copied piece by piece, and so is LZMA that is
-// larger than a piece decoded; other blocks are decoded in one call. An unexpected result ends it with status 1.
+// Reads ARCHIVE.plan (see PackFolder.cpp), so it neither parses nor checks the archive. Decodes the blocks into one
+// buffer that stays in the processor's cache. Makes each folder with mkdir, and each file with open, write (one call
+// per piece) and close. Stored blocks are copied piece by piece, and LZMA blocks larger than a piece are decoded piece
+// by piece; other blocks are decoded in one call. An unexpected result ends it with status 1.
 #include "Runtime/Utilities/Compression/Compression.h"
 
 #include <algorithm>
@@ -24,7 +24,7 @@
 namespace {
 
 constexpr UInt64 kPiece = 131'072;
-constexpr UInt64 kSlack = 524'288; // bytes that have been written stay in the buffer until there are so many
+constexpr UInt64 kSlack = 524'288; // written bytes are dropped from the buffer when there are more than this
 constexpr UInt64 kLzmaPropertiesSize = 5;
 
 void Require(bool isTrue, const char* what) {
@@ -37,7 +37,7 @@ void* AllocateForDecoder(void*, size_t size) { return malloc(size); }
 void FreeForDecoder(void*, void* address) { free(address); }
 
 struct Block {
-    UInt64 storedSize, size, type, behind;
+    UInt64 storedSize, size, type, codedOffset;
 };
 
 struct Node {
@@ -76,7 +76,7 @@ Plan ReadPlan(const char* path) {
     return plan;
 }
 
-// The data stream, of which a part that only moves forward is in memory.
+// The data stream. Only a part of it, which moves forward, is in memory.
 class Stream {
 public:
     Stream(const char* archive, const Plan& plan)
@@ -88,13 +88,13 @@ public:
             largestBlock = std::max(largestBlock, block.size);
             largestStored = std::max(largestStored, block.storedSize);
         }
-        // Not vectors: what is about to be overwritten need not be cleared.
+        // A vector would clear bytes that are about to be overwritten.
         m_Buffer = std::make_unique_for_overwrite<char[]>(kSlack + kPiece + 2 * largestBlock);
         m_Stored = std::make_unique_for_overwrite<char[]>(largestStored);
         LzmaDec_Construct(&m_Lzma);
     }
 
-    // Those bytes, at most kPiece; offsets must not go back.
+    // The bytes [offset, offset + size). size is at most kPiece, and offset never decreases.
     const char* At(UInt64 offset, UInt64 size) {
         while (m_Start + m_Filled < offset + size) {
             const UInt64 unwanted = std::min(m_Filled, offset - m_Start);
@@ -137,7 +137,7 @@ private:
         m_Filled += size;
         m_Taken += size;
         if (m_Taken < block.size) return;
-        m_Position += m_StoredLeft; // an end mark
+        m_Position += m_StoredLeft; // skips an end mark
         m_StoredLeft = m_Loaded = m_Consumed = m_Taken = 0;
         ++m_NextBlock;
     }
@@ -148,20 +148,20 @@ private:
                                                  static_cast<int>(block.size));
             return Require(size == static_cast<int>(block.size), "LZ4_decompress_safe");
         }
-        SizeT size = block.size, storedSize = block.storedSize - block.behind;
+        SizeT size = block.size, storedSize = block.storedSize - block.codedOffset;
         const Byte* const stored = reinterpret_cast<const Byte*>(m_Stored.get());
         ELzmaStatus status;
-        const SRes result = LzmaDecode(reinterpret_cast<Byte*>(to), &size, stored + block.behind, &storedSize, stored,
-                                       kLzmaPropertiesSize, LZMA_FINISH_ANY, &status, &m_Allocator);
+        const SRes result = LzmaDecode(reinterpret_cast<Byte*>(to), &size, stored + block.codedOffset, &storedSize,
+                                       stored, kLzmaPropertiesSize, LZMA_FINISH_ANY, &status, &m_Allocator);
         Require(result == SZ_OK && size == block.size, "LzmaDecode");
     }
 
-    // The next bytes of a stream of LZMA.
+    // Decodes the next size bytes of an LZMA block.
     void DecodePiece(const Block& block, char* to, UInt64 size) {
         const Byte* const stored = reinterpret_cast<const Byte*>(m_Stored.get());
         if (m_Taken == 0) {
-            ReadStored(m_Stored.get(), block.behind);
-            m_StoredLeft = block.storedSize - block.behind;
+            ReadStored(m_Stored.get(), block.codedOffset);
+            m_StoredLeft = block.storedSize - block.codedOffset;
             Require(LzmaDec_Allocate(&m_Lzma, stored, kLzmaPropertiesSize, &m_Allocator) == SZ_OK, "LzmaDec_Allocate");
             LzmaDec_Init(&m_Lzma);
         }
@@ -185,22 +185,22 @@ private:
 
     int m_Archive;
     const Plan& m_Plan;
-    UInt64 m_Position;      // in the archive, of the next stored byte
-    size_t m_NextBlock = 0; // to be decoded
-    UInt64 m_Taken = 0;     // of it, when it is decoded in pieces
-    UInt64 m_Start = 0;     // in the data stream, of the buffer's first byte
-    UInt64 m_Filled = 0;    // of the buffer
+    UInt64 m_Position;      // of the next stored byte in the archive
+    size_t m_NextBlock = 0; // the block that is decoded next
+    UInt64 m_Taken = 0;     // bytes of that block that have been decoded, when it is decoded in pieces
+    UInt64 m_Start = 0;     // the buffer's first byte in the data stream
+    UInt64 m_Filled = 0;    // bytes in the buffer
     std::unique_ptr<char[]> m_Buffer;
-    std::unique_ptr<char[]> m_Stored; // one block's bytes, or a piece of them
+    std::unique_ptr<char[]> m_Stored; // the stored bytes of a block, or a piece of them
 
     ISzAlloc m_Allocator = {AllocateForDecoder, FreeForDecoder};
     CLzmaDec m_Lzma;
-    UInt64 m_StoredLeft = 0; // of the block, behind the piece
-    UInt64 m_Loaded = 0;     // the piece
-    UInt64 m_Consumed = 0;   // of it
+    UInt64 m_StoredLeft = 0; // stored bytes of the block after the piece in m_Stored
+    UInt64 m_Loaded = 0;     // size of that piece
+    UInt64 m_Consumed = 0;   // decoded bytes of that piece
 };
 
-// Makes the folder of a file, and those above it, unless the file before it lay in the same one.
+// Makes the folder of a file, and those above it, unless the file before it was in the same one.
 void MakeParent(std::string_view path, std::string* last) {
     const size_t slash = path.rfind('/');
     if (slash == std::string_view::npos || path.substr(0, slash) == *last) return;

@@ -1,8 +1,8 @@
 // Runs a command and prints what it cost: Measure COMMAND [ARGUMENT...]
 //
-// One line: wall, user and system seconds, the peak of resident memory in KiB, and the exit status. What the command
-// prints is thrown away. A small program measures this because the peak that the system reports for a process starts
-// with that of the process that it was forked from.
+// Prints one line: wall, user and system seconds, the peak of resident memory in KiB, and the exit status. The
+// command's output is discarded. A small program measures this because a process's reported peak is at least that of
+// the process that it was forked from.
 #include <cstdio>
 #include <fcntl.h>
 #include <spawn.h>

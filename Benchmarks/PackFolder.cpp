@@ -1,9 +1,9 @@
-// Makes the archives that scripts/bench extracts: PackFolder KIND FOLDER ARCHIVE packs what a folder holds, and
-// PackFolder KIND COUNT ARCHIVE makes so many empty files, a thousand in each folder. ARCHIVE.plan says what lies
-// where, in lines of text:
+// Makes the archives that scripts/bench extracts. PackFolder KIND FOLDER ARCHIVE packs the contents of a folder.
+// PackFolder KIND COUNT ARCHIVE packs that many empty files, a thousand per folder. ARCHIVE.plan says where everything
+// is, in lines of text:
 //
-//   data OFFSET                         the data's, in the archive
-//   block STORED SIZE TYPE BEHIND       stored and uncompressed size; of the coded bytes, how far behind the first
+//   data OFFSET                         where the data starts in the archive
+//   block STORED SIZE TYPE CODED        stored and uncompressed size; where the coded bytes start in the stored ones
 //   node FLAGS OFFSET SIZE PATH         place in the data stream
 #include "Tools/ArchiveWriter/ArchiveWriter.h"
 
@@ -13,8 +13,8 @@
 
 namespace {
 
-// Level 4 is the strongest of the encoder's fast mode. What is compared with these archives is packed with the same
-// level, dictionary and match finder.
+// The strongest level of the encoder's fast mode. The archives of the other programs are packed with the same level,
+// dictionary and match finder.
 constexpr int kLzmaLevel = 4;
 constexpr UInt32 kChunk = 131'072;
 constexpr UInt32 kStream = 8'388'608;
@@ -23,7 +23,7 @@ struct Kind {
     const char* name;
     ArchiveLayout layout;
     CompressionType type = kCompressionNone;
-    UInt32 blockSize = kChunk; // and the dictionary; the legacy layouts have one block
+    UInt32 blockSize = kChunk; // also the dictionary's; the legacy layouts have one block
     bool streamed = false;
 };
 
@@ -56,9 +56,9 @@ bool WritePlan(const ArchivePlan& plan, ArchiveLayout layout, const std::string&
     if (file == nullptr) return false;
     fprintf(file, "data %llu\n", plan.dataOffset);
     for (const StoredBlock& block : plan.blocks) {
-        // The legacy stream has a size field behind the properties.
-        const unsigned behind = block.type != kCompressionLzma ? 0 : layout == ArchiveLayout::kWeb ? 13 : 5;
-        fprintf(file, "block %llu %llu %u %u\n", block.compressedSize, block.uncompressedSize, block.type, behind);
+        // The legacy stream has a size field after the properties.
+        const unsigned codedOffset = block.type != kCompressionLzma ? 0 : layout == ArchiveLayout::kWeb ? 13 : 5;
+        fprintf(file, "block %llu %llu %u %u\n", block.compressedSize, block.uncompressedSize, block.type, codedOffset);
     }
     for (const ArchivePlan::Node& node : plan.nodes)
         fprintf(file, "node %u %llu %llu %s\n", node.flags, node.offset, node.size, node.path.c_str());
@@ -76,9 +76,9 @@ int main(int argumentCount, char** arguments) {
         form.chunkSize = kind.blockSize;
         form.streamed = kind.streamed;
         form.lzma = {.level = kLzmaLevel, .dictionarySize = kind.blockSize};
-        char* behindNumber;
-        const unsigned long count = strtoul(arguments[2], &behindNumber, 10);
-        const bool isCount = *behindNumber == '\0';
+        char* numberEnd;
+        const unsigned long count = strtoul(arguments[2], &numberEnd, 10);
+        const bool isCount = *numberEnd == '\0';
         const ArchivePlan plan =
             isCount ? WriteEmptyFiles(count, arguments[3], form) : PackFolder(arguments[2], arguments[3], form);
         return WritePlan(plan, form.layout, std::string(arguments[3]) + ".plan") ? 0 : 1;

@@ -1,8 +1,8 @@
 // How much faster two threads read different blocks through one reader than one thread does: ReaderScaling
 //
-// For each kind of block and way of reading it prints the best of some rounds, which alternate between one thread and
-// two, and their ratio. The rows "decoder alone" read nothing: they say what ratio the machine itself allows. What is
-// read is compared with the source.
+// Measures each kind of block and each way of reading in several rounds, which alternate between one thread and two,
+// and prints the best of each and their ratio. The rows "decoder alone" read nothing: they show the ratio that the
+// machine allows. All bytes are compared with the source.
 #include "Runtime/VirtualFileSystem/ArchiveFileSystem/ArchiveStorageReader.h"
 #include "Tools/ArchiveWriter/ArchiveWriter.h"
 
@@ -20,7 +20,7 @@ constexpr UInt64 kBlockSize = 131'072;
 constexpr UInt64 kBlocks = 64;
 constexpr int kRounds = 8;
 
-// Text that compresses.
+// Text that can be compressed.
 std::string MakeText() {
     std::string text;
     for (UInt64 seed = 1; text.size() < kBlocks * kBlockSize; seed = seed * 6364136223846793005u + 1442695040888963407u)
@@ -29,8 +29,9 @@ std::string MakeText() {
     return text;
 }
 
-// Bytes a second by that many threads; work(block) handles one block and says whether it came out right. Each thread
-// handles every block so many times, from another one on, so that two hardly ever handle the same at once.
+// Bytes per second of threadCount threads. work(block) handles one block and returns whether the result was right. Each
+// thread handles every block passes times; the threads start at different blocks, so that two rarely handle the same
+// one at once.
 template <typename Work>
 double Measure(UInt64 threadCount, UInt64 passes, Work work) {
     const auto start = std::chrono::steady_clock::now();
@@ -59,7 +60,7 @@ void Compare(const char* kind, const char* way, UInt64 passes, Work work) {
     printf("%-8s %-22s %9.1f MB/s %9.1f MB/s   ratio %.2f\n", kind, way, one / 1e6, two / 1e6, two / one);
 }
 
-// passes: as many as take some tenths of a second.
+// passes should take some tenths of a second.
 void CompareKind(const char* kind, CompressionType type, bool isStreamed, UInt64 passes) {
     char path[] = "/tmp/varnex-scaling-XXXXXX";
     close(mkstemp(path));

@@ -1,5 +1,5 @@
-// What the operations cost that every extraction is made of (Google Benchmark). A row named "...Floor" does the same
-// with the standard library or the system alone. Every result is checked.
+// Measures the operations that every extraction is made of (Google Benchmark). A row named "...Floor" does the same
+// with only the standard library or the system. Every result is checked.
 #include "Runtime/Core/Containers/DynamicArray.h"
 #include "Runtime/Core/Containers/String.h"
 #include "Runtime/Utilities/FileUtilities.h"
@@ -20,7 +20,7 @@ namespace {
 constexpr UInt64 kBlockSize = 131'072;
 constexpr UInt64 kBlocks = 64;
 
-// An archive in a file that goes when the scope ends.
+// An archive in a file, which is removed at the end of the scope.
 class TemporaryArchive {
 public:
     explicit TemporaryArchive(const ArchiveDescription& description) {
@@ -76,7 +76,7 @@ BENCHMARK_CAPTURE(ParseDirectory, Archive, ArchiveLayout::kArchive, kCompression
 
 // ---- reads ----
 
-// Text that compresses.
+// Text that can be compressed.
 std::string MakeText(UInt64 size) {
     std::string text;
     for (UInt64 seed = 1; text.size() < size; seed = seed * 6364136223846793005u + 1442695040888963407u)
@@ -90,8 +90,8 @@ struct ReadForm {
     bool streamed = false;
 };
 
-// Reads of size bytes that start at step, 2 step, and so on: with a step of a block each is the first of its block (a
-// streamed one is gone on with, so its step is the size); with a step of 0 the block is in the cache.
+// Reads size bytes at 0, step, 2 * step and so on. A step of a block's size makes each read the first of its block. A
+// streamed block is read on, with a step of size. With a step of 0 the block is in the cache.
 void ReadRange(benchmark::State& state, ReadForm form, UInt64 size, UInt64 step) {
     const std::string text = MakeText(kBlocks * kBlockSize);
     ArchiveDescription description;
@@ -203,7 +203,7 @@ void PathJoinFloor(benchmark::State& state) {
 }
 BENCHMARK(PathJoinFloor);
 
-// Eight folders in one another, which go when the scope ends.
+// Eight nested folders, which are removed at the end of the scope.
 class FolderChain {
 public:
     FolderChain() {

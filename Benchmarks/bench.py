@@ -20,13 +20,13 @@ def roomiest_memory_folder():
 
 
 def write_docs(name, text):
-    """Puts the text between the two comments of that name in docs/performance.md."""
+    """Replaces the text between the two comments of that name in docs/performance.md."""
     path = os.path.join(os.path.dirname(os.path.abspath(__file__)), "..", "docs", "performance.md")
     with open(path) as file:
         before, _, rest = file.read().partition(f"<!-- {name}: begin -->\n")
-    behind = rest.partition(f"<!-- {name}: end -->")[2]
+    after = rest.partition(f"<!-- {name}: end -->")[2]
     with open(path, "w") as file:
-        file.write(f"{before}<!-- {name}: begin -->\n{text.strip()}\n<!-- {name}: end -->{behind}")
+        file.write(f"{before}<!-- {name}: begin -->\n{text.strip()}\n<!-- {name}: end -->{after}")
 
 
 def main():
@@ -34,18 +34,18 @@ def main():
     parser = argparse.ArgumentParser(prog="scripts/bench", description="Measures Varnex and prints Markdown tables.")
     parser.add_argument("folder", nargs="?", help=f"what to pack (default: a part of {DEFAULT_FOLDER})")
     parser.add_argument("--flat", action="store_true",
-                        help="instead of comparing: the cost of a file and of a byte for more and more of them")
-    parser.add_argument("--write-docs", action="store_true", help="put the tables into docs/performance.md, too")
-    parser.add_argument("--kinds", help=f"only these archives, and what they are held against: {','.join(KINDS)}")
+                        help="instead of comparing, measure the cost per file and per byte as their number grows")
+    parser.add_argument("--write-docs", action="store_true", help="also put the tables into docs/performance.md")
+    parser.add_argument("--kinds", help=f"only these archives, and those they are compared with: {','.join(KINDS)}")
     parser.add_argument("--rounds", type=int, default=7)
-    parser.add_argument("--scratch", default=f"{temporary}/varnex-bench", help="packed archives are kept here")
+    parser.add_argument("--scratch", default=f"{temporary}/varnex-bench", help="where packed archives are kept (default: %(default)s)")
     parser.add_argument("--memory", default=roomiest_memory_folder(),
-                        help="a folder on a memory file system (default: the roomiest: %(default)s)")
-    parser.add_argument("--disk", default=temporary, help="a folder on a disk; empty: not measured")
+                        help="a folder on a memory file system (default: the one with most room, %(default)s)")
+    parser.add_argument("--disk", default=temporary, help="a folder on a disk, or '' not to measure it")
     parser.add_argument("--build", help=argparse.SUPPRESS)
     options = parser.parse_args()
     if not options.memory:
-        sys.exit("there is no memory file system to write to: give one with --memory")
+        sys.exit("there is no writable memory file system: name one with --memory")
     os.makedirs(options.scratch, exist_ok=True)
     text = io.StringIO()
     with contextlib.redirect_stdout(text):

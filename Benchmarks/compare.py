@@ -1,4 +1,4 @@
-"""Varnex beside other extractors: packs a folder, extracts the archives in turn, prints what each costs."""
+"""Compares Varnex with other extractors: packs a folder, extracts the archives in turn, prints what each costs."""
 
 import hashlib
 import os
@@ -13,10 +13,10 @@ from measuring import Row, count_calls, cpu, measure, median, run, table, verify
 
 MIB = 1 << 20
 DEFAULT_FOLDER = "/usr"
-# Of the default folder: as many files as make both, without the few large ones that would crowd out the rest.
+# How much of the default folder is packed. A few very large files would crowd out the rest.
 WANTED_BYTES, WANTED_FILES, LARGEST_FILE = 400_000_000, 10_000, 16 * MIB
 
-# Ours: name of the kind (see PackFolder.cpp) and how the tables call it.
+# Our archives: the name of the kind (see PackFolder.cpp) and its name in the tables.
 KINDS = {
     "lz4hc": "LZ4HC chunks",
     "lzma": "LZMA chunks",
@@ -26,12 +26,12 @@ KINDS = {
     "raw": "ZarvoRaw",
 }
 
-# The encoder that PackFolder uses, said to 7-Zip: level 4 is the fast mode with 32 fast bytes, and no filter for
-# machine code. Solid blocks are as large as our blocks.
+# The settings of PackFolder's encoder for 7-Zip: level 4 is the fast mode with 32 fast bytes. There is no filter for
+# machine code, and solid blocks are as large as our blocks.
 SEVEN_ZIP = "7zz a -bd -mf=off -mmt=1 -ms={size} -m0=LZMA:a=0:fb=32:mf=hc4:d={size} {archive} ."
 
-# Peers: how the tables call each, how its archive is made (in the tree, a pack command's current folder), and how it is
-# extracted into the folder "out".
+# Other extractors: the name in the tables, the archive, the command that packs the current folder, and the command that
+# extracts into the folder "out".
 Peer = namedtuple("Peer", "title archive pack extract")
 PEERS = {
     "squashfs-lz4hc": Peer("`unsquashfs -p 1`, lz4hc", "lz4hc.squashfs",
@@ -49,7 +49,7 @@ PEERS = {
     "tar": Peer("`tar xf`", "plain.tar", "tar cf {archive} .", "tar xf {archive} -C out"),
 }
 
-# What is wanted on the memory file system: kind, peer, wall, cpu; a floor for every row besides.
+# Targets on the memory file system, as ratios: kind, peer, wall time, processor time. Every row also has its floor.
 WANTED_WALL_TO_FLOOR = 1.15
 WANTED = [
     ("lz4hc", "erofs", 0.90, None),
@@ -66,7 +66,7 @@ WANTED = [
 
 
 def choose_files(folder, is_default):
-    """Regular files in the order of a sorted walk; of the default folder, as many as are wanted."""
+    """The regular files in the order of a sorted walk; of the default folder, only as many as are wanted."""
     count = size = 0
     for parent, folders, names in os.walk(folder):
         folders.sort()
@@ -84,7 +84,7 @@ def choose_files(folder, is_default):
 
 
 def make_tree(folder, is_default, scratch):
-    """Copies the files once, so that all packers see the same tree; the tree's folder. It holds no empty folder."""
+    """Copies the files once, so that all packers see the same tree. Returns its folder, which has no empty folders."""
     listing = [f"{os.path.getsize(path)} {path}" for path in choose_files(folder, is_default)]
     if not listing:
         sys.exit(f"{folder} holds no file")
@@ -102,7 +102,7 @@ def make_tree(folder, is_default, scratch):
 
 
 def pack(build, tree, archive, command=None, kind=None):
-    """Makes an archive unless it is there from an earlier run."""
+    """Makes an archive unless an earlier run has made it."""
     if os.path.exists(archive):
         return
     print(f"packing {os.path.basename(archive)}", file=sys.stderr, flush=True)
@@ -146,7 +146,7 @@ def make_rows(build, kinds, peers):
 
 
 def place(archives, rows, folder):
-    """The archives and their plans on the measured file system: links where that can be."""
+    """Puts the archives and their plans on the measured file system, as links where possible."""
     names = {row.archive for row in rows.values()}
     for name in names | {name + ".plan" for name in names if os.path.exists(f"{archives}/{name}.plan")}:
         try:
@@ -156,7 +156,7 @@ def place(archives, rows, folder):
 
 
 def measure_in(parent, build, archives, tree, rows, rounds, is_memory):
-    """Medians of every row, and in memory its system calls; before, each tree is compared with the source."""
+    """Compares each extracted tree with the source; then returns each row's medians and, in memory, its system calls."""
     samples = {name: [] for name in rows}
     calls = {}
     with tempfile.TemporaryDirectory(prefix="varnex-bench-", dir=parent) as folder:
@@ -189,7 +189,7 @@ def print_costs(rows, archives, medians, calls):
 
 
 def print_ratios(medians, kinds, peers):
-    print("\nWall time, and behind the stroke processor time, as a ratio to each:")
+    print("\nRatios of wall time / processor time to each:")
     table([""] + ["floor"] + [PEERS[peer].title for peer in peers],
           [[f"**{KINDS[kind]}**"] + [f"{medians[kind].wall / medians[other].wall:.2f} / "
                                      f"{cpu(medians[kind]) / cpu(medians[other]):.2f}"
@@ -198,7 +198,7 @@ def print_ratios(medians, kinds, peers):
 
 
 def memory_bound(plan):
-    """8 MiB, twice the largest block and the directory: a node takes 64 bytes, and its path what does not fit in 31."""
+    """8 MiB, twice the largest block, and the directory: 64 bytes per node, and paths of more than 31 bytes."""
     block = directory = 0
     with open(plan, errors="surrogateescape") as file:
         for line in file:
@@ -229,8 +229,8 @@ def print_wanted(archives, medians, kinds):
         lines.append(line(kind, "its floor", "wall", ours.wall / floor.wall, WANTED_WALL_TO_FLOOR))
         lines.append(line(kind, "8 MiB + 2 blocks + directory", "peak, MiB", ours.peak / 1024,
                           memory_bound(f"{archives}/{kind}.zarvo.plan") / MIB, "{:.1f}"))
-    print("\nWhat is wanted:")
-    table(["", "against", "of", "is", "at most", "holds"], lines)
+    print("\nTargets:")
+    table(["", "compared with", "measure", "result", "at most", "met"], lines)
 
 
 def describe_machine():

@@ -1,4 +1,4 @@
-"""Whether the cost of a file, and of a byte, stays the same however many there are in one archive."""
+"""Measures whether the cost per file and per byte stays the same as one archive holds more of them."""
 
 import os
 import re
@@ -16,7 +16,7 @@ ARCHIVE = "flat.zarvo"
 
 
 def measure_archive(options, kind, source, counts_calls=False):
-    """Packs the source, on the disk; the median of extracting it on the memory file system, and the system calls."""
+    """Packs the source on the disk. Returns the median cost of extracting it in memory, and the system calls."""
     row = Row("", ARCHIVE, [f"{options.build}/Varnex", ARCHIVE], ARCHIVE + "_data")
     with tempfile.TemporaryDirectory(prefix="varnex-flat-", dir=options.memory) as folder:
         with tempfile.TemporaryDirectory(dir=options.scratch) as packed:
@@ -27,7 +27,7 @@ def measure_archive(options, kind, source, counts_calls=False):
 
 
 def write_data(tree, path, size):
-    """A file of that size: the tree's files one after another, again and again."""
+    """Writes a file of that size: the tree's files one after another, repeated."""
     with open(path, "wb") as out:
         while True:
             for parent, folders, names in os.walk(tree):
@@ -58,12 +58,12 @@ def print_flatness(options):
                       f"{cpu(cost) / count * 1e6:.2f}", f"{cost.peak / 1024:.1f}",
                       f"{calls / count:.2f}" if calls else ""])
     print(f"Empty files in folders of 1,000, on a memory file system, medians of {options.rounds} rounds:")
-    table(["files", "wall, s", "a file, µs", "of the processor, µs", "peak, MiB", "system calls a file"], lines)
+    table(["files", "wall, s", "wall per file, µs", "processor per file, µs", "peak, MiB", "system calls per file"], lines)
 
     tree = make_tree(os.path.abspath(options.folder or DEFAULT_FOLDER), options.folder is None, options.scratch)
     lines = []
     for size in BYTE_COUNTS:
-        if not has_room(options.memory, 2.1 * size):  # the archive and what comes out of it
+        if not has_room(options.memory, 2.1 * size):  # the archive and the extracted file
             progress(f"no room for {size:,} bytes")
             continue
         with tempfile.TemporaryDirectory(dir=options.scratch) as source:
@@ -76,5 +76,5 @@ def print_flatness(options):
                                       (f"{cost.wall:.3f}", f"{cost.wall / size * 1e9:.3f}",
                                        f"{cpu(cost) / size * 1e9:.3f}", f"{cost.peak / 1024:.1f}")])
     print("\nOne file, in blocks of 128 KiB:")
-    costs = ["wall, s", "a byte, ns", "of the processor, ns", "peak, MiB"]
+    costs = ["wall, s", "wall per byte, ns", "processor per byte, ns", "peak, MiB"]
     table(["bytes"] + ["stored: " + cost for cost in costs] + ["LZ4HC: " + cost for cost in costs], lines)

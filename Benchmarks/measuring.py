@@ -1,4 +1,4 @@
-"""Running commands and what they cost. Extractors run in a folder that holds the archives, and write below it."""
+"""Runs commands and measures their cost. Extractors run in a folder that holds the archives, and write below it."""
 
 import os
 import shutil
@@ -26,8 +26,8 @@ def prepare(row, folder):
 
 
 def discard(output, spent):
-    """Frees what a command has made. With a folder for it, emptied files stay there: ext4 searches the inodes that were
-    deleted in the last minutes for each file that it makes, which would be most of what is measured."""
+    """Frees the space of what a command has made. If spent is a folder, the emptied files are moved there, not removed:
+    ext4 searches recently deleted inodes for each new file, which would dominate the measurement."""
     if spent is None:
         shutil.rmtree(output, ignore_errors=True)
         return

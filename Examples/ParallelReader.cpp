@@ -1,5 +1,5 @@
 // Hashes every file of an archive from several threads through one reader, prints "hash  path" in the order of the
-// directory, and says on standard error how fast it was: ParallelReader ARCHIVE [THREADS]
+// directory, and prints its speed on standard error: ParallelReader ARCHIVE [THREADS]
 #include "Runtime/Utilities/LogHooks.h"
 #include "Runtime/Utilities/SpookyHash.h"
 #include "Runtime/VirtualFileSystem/ArchiveFileSystem/ArchiveStorageReader.h"
@@ -22,8 +22,8 @@ struct FileHash {
     UInt64 half2 = 0;
 };
 
-// One thread's share: whichever file nobody has taken yet, until none is left. A file is hashed piece by piece, each
-// hash the seed of the next.
+// The work of one thread: takes the next file until none is left. A file is hashed piece by piece, with each hash as
+// the seed of the next.
 void HashFiles(ArchiveStorageReader& reader, std::atomic<size_t>& next, std::vector<FileHash>& hashes,
                std::atomic<UInt64>& bytesRead) {
     const dynamic_array<Node>& nodes = reader.GetDirectoryInfo().nodes;
@@ -50,8 +50,8 @@ int main(int argumentCount, char** arguments) {
         fprintf(stderr, "Usage: ParallelReader ARCHIVE [THREADS]\n");
         return 2;
     }
-    gConsoleFile = stderr; // where the runtime's messages go; the standard output is for results
-    // The file system comes to be before a second thread may need it: Initialize sees to that.
+    gConsoleFile = stderr; // for the runtime's messages; standard output is for the results
+    // Initialize also creates the file system, which must happen before a second thread uses it.
     ArchiveStorageReader reader(kMemLabelFileSystem);
     if (reader.Initialize(core::string(arguments[1]), 0) != 0 || !reader.FindDirectory()) {
         fprintf(stderr, "%s: not a readable archive\n", arguments[1]);
@@ -80,7 +80,7 @@ int main(int argumentCount, char** arguments) {
         else
             printf("%-32s  %s\n", "can't be read", nodes[index].path.c_str());
     }
-    fprintf(stderr, "%llu bytes by %d threads, %.0f bytes a second\n", bytesRead.load(), threadCount,
+    fprintf(stderr, "%llu bytes by %d threads, %.0f bytes per second\n", bytesRead.load(), threadCount,
             static_cast<double>(bytesRead.load()) / std::max(seconds.count(), 1e-9));
     return isAllRead ? 0 : 1;
 }

@@ -17,7 +17,7 @@ bool WriteToOutput(ArchiveStorageReader& reader, const ArchiveStorageHeader::Nod
             fprintf(stderr, "%s: damaged\n", node.path.c_str());
             return false;
         }
-        fwrite(piece.data(), 1, static_cast<size_t>(count), stdout); // what went wrong, fflush still knows
+        fwrite(piece.data(), 1, static_cast<size_t>(count), stdout); // fflush and ferror report a failure below
     }
     if (fflush(stdout) == 0 && ferror(stdout) == 0) return true;
     fprintf(stderr, "%s: can't be written\n", node.path.c_str());
@@ -31,7 +31,7 @@ int main(int argumentCount, char** arguments) {
         fprintf(stderr, "Usage: ReadOneFile ARCHIVE PATH\n");
         return 2;
     }
-    gConsoleFile = stderr; // where the runtime's messages go; the standard output is for results
+    gConsoleFile = stderr; // for the runtime's messages; standard output is for the results
     ArchiveStorageReader reader(kMemLabelFileSystem);
     if (reader.Initialize(core::string(arguments[1]), 0) != 0 || !reader.FindDirectory()) {
         fprintf(stderr, "%s: not a readable archive\n", arguments[1]);

@@ -11,8 +11,8 @@ int32_t Footing_Process_GetCurrentProcessId() { return getpid(); }
 char* Footing_Process_GetWorkingDirectory() { return getcwd(nullptr, 0); }
 
 void Footing_Process_OpenStandardDescriptors() {
-    // The system hands out the lowest free number, so the gaps below 3 fill before a higher one comes. These stay open
-    // in programs that this one starts.
+    // The system gives the lowest free number, so numbers below 3 come first. They stay open in programs that this one
+    // starts.
     int descriptor;
     do
         descriptor = open("/dev/null", O_RDWR);

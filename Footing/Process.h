@@ -1,4 +1,4 @@
-// What the base library knows of the process it runs in.
+// The current process.
 #pragma once
 
 #include <cstdint>
@@ -12,12 +12,12 @@ enum Footing_ErrorCode : int32_t {
 
 int32_t Footing_Process_GetCurrentProcessId();
 
-// The working directory as an absolute path, or null when there is none or memory is refused. The caller frees it with
+// The working directory as an absolute path; null if it has been removed or memory is refused. The caller frees it with
 // free().
 char* Footing_Process_GetWorkingDirectory();
 
-// Opens /dev/null on those of the descriptors 0 to 2 that are closed, so that no file that the program opens later gets
-// one of them and with it what is printed. To be called first of all, while there is one thread.
+// Opens /dev/null on each closed descriptor from 0 to 2. Otherwise a file that is opened later could get such a number,
+// and printed text would end up in it. Call this first in main, while there is one thread.
 void Footing_Process_OpenStandardDescriptors();
 
 } // namespace ZarvoClassic

@@ -1,6 +1,6 @@
-// The base library's semaphores: what every lock of the runtime waits on. Any thread may acquire and release; creation
-// and freeing are one thread's, while no other uses the semaphore. A release happens before the return of the acquire
-// that takes it.
+// The base library's semaphores, which every lock of the runtime waits on. Any thread may acquire and release. One
+// thread creates and frees a semaphore while no other uses it. A release happens before the return of the acquire that
+// takes it.
 //
 // The system semaphore waits in the system each time. States by operations (c: releases not yet consumed):
 //
@@ -24,7 +24,7 @@
 
 namespace ZarvoClassic {
 
-// More releases than this are never outstanding; what goes beyond is dropped.
+// The limit of outstanding releases; releases beyond it are dropped.
 constexpr int32_t Footing_SystemSemaphore_MaxCount = 0x7FFFFFFF;
 
 struct Footing_SystemSemaphore_Storage {
@@ -33,11 +33,11 @@ struct Footing_SystemSemaphore_Storage {
 };
 using Footing_SystemSemaphore_Handle = Footing_SystemSemaphore_Storage*;
 
-// Makes a semaphore with nothing to acquire in storage, which must outlive the handle and stay where it is. Ends the
-// process when the platform refuses.
+// Makes a semaphore with no releases in storage, which must outlive the handle and must not move. Ends the process when
+// the platform refuses.
 Footing_SystemSemaphore_Handle Footing_SystemSemaphore_CreateInplace(Footing_SystemSemaphore_Storage* storage);
 
-// Waits, without time limit, for one release and consumes it.
+// Waits for one release, without a time limit, and takes it.
 void Footing_SystemSemaphore_Acquire(Footing_SystemSemaphore_Handle handle);
 
 void Footing_SystemSemaphore_Release(Footing_SystemSemaphore_Handle handle, uint32_t count);
@@ -51,7 +51,7 @@ struct Footing_Semaphore {
     std::atomic<int32_t> count;
 };
 
-// As the operations above. The count, waiting threads included, must stay within 32 bits.
+// These do the same for the counting semaphore. Its count, with the waiting threads, must stay within 32 bits.
 void Footing_Semaphore_CreateInplace(Footing_Semaphore* semaphore);
 void Footing_Semaphore_Acquire(Footing_Semaphore* semaphore);
 void Footing_Semaphore_Release(Footing_Semaphore* semaphore, uint32_t count);

@@ -16,8 +16,8 @@ uint64_t Footing_Timer_GetHighPrecisionTimerTicks();
 
 Footing_Timer_TickToNanosecondConversionRatio Footing_Timer_GetTicksToNanosecondsConversionRatio();
 
-// Set once by the runtime's static initialisers, constant from then on.
-extern uint64_t nsSinceBootAtStartup; // the raw monotonic clock; what time since start-up is reckoned from
+// Set by the runtime's static initialisers, and constant after them.
+extern uint64_t nsSinceBootAtStartup; // the raw monotonic clock; time since start-up counts from it
 extern Footing_Timer_TickToNanosecondConversionRatio s_conversionRatio;
 extern double Footing_Timer_TickToNanosecondsConversionFactor; // the ratio's quotient
 

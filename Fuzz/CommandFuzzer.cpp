@@ -1,6 +1,6 @@
 // Property: whatever the bytes are, the command makes one folder, beside the archive, and touches nothing else. After
-// "All ok!", that folder holds every file and folder that the archive lists, with the bytes that another reader
-// delivers, and nothing else.
+// "All ok!", that folder contains exactly the files and folders that the archive lists, and the files have the bytes
+// that another reader delivers.
 #include "Fuzz/FuzzSupport.h"
 #include "Runtime/Utilities/RegisterRuntimeInitializeAndCleanup.h"
 #include "Runtime/VirtualFileSystem/ArchiveFileSystem/ArchiveStorageReader.h"
@@ -22,11 +22,11 @@ namespace {
 namespace fs = std::filesystem;
 
 constexpr rlim_t kMaxFileSize = 1 << 20;
-constexpr UInt64 kPiece = 4'099; // other pieces than the command's
+constexpr UInt64 kPiece = 4'099; // differs from the command's, so that the reads differ
 constexpr const char* kArchiveName = "a.zarvo";
 constexpr const char* kOutputName = "a.zarvo_data";
 
-// outer/box is the working directory; outer/witness stands for everything else.
+// Returns the folder outer. outer/box becomes the working directory; outer/witness must stay as it is.
 fs::path MakeWorkplace() {
     std::string pattern = (fs::is_directory("/dev/shm") ? "/dev/shm" : "/tmp") + std::string("/varnex-fuzz-XXXXXX");
     FuzzCheck(mkdtemp(pattern.data()) != nullptr);
@@ -34,7 +34,7 @@ fs::path MakeWorkplace() {
     fs::create_directory(fs::path(pattern) / "witness");
     FuzzCheck(chdir((fs::path(pattern) / "box").c_str()) == 0);
 
-    // Output that grows out of hand fails as on a full disk.
+    // Writing past this limit fails as on a full disk.
     const rlimit limit{kMaxFileSize, kMaxFileSize};
     FuzzCheck(setrlimit(RLIMIT_FSIZE, &limit) == 0);
     signal(SIGXFSZ, SIG_IGN);
@@ -51,7 +51,7 @@ fs::path MakeWorkplace() {
     return outer;
 }
 
-// Where a stored path leads, below the output folder; it has no ".." after "All ok!".
+// Where a stored path leads, relative to the output folder. After "All ok!", no path has a component "..".
 fs::path Place(const ArchiveStorageHeader::Node& node) {
     std::string path = node.path.c_str();
     std::replace(path.begin(), path.end(), '\\', '/');
@@ -79,7 +79,7 @@ void CheckOutput() {
     FuzzCheck(reader.Initialize(core::string(kArchiveName), 0) == 0);
     FuzzCheck(reader.FindDirectory());
 
-    std::map<fs::path, const ArchiveStorageHeader::Node*> files; // of one that is listed twice the last
+    std::map<fs::path, const ArchiveStorageHeader::Node*> files; // the last node counts when a path is listed twice
     std::set<fs::path> listed;
     for (const ArchiveStorageHeader::Node& node : reader.GetDirectoryInfo().nodes) {
         const bool isFolder = (node.flags & ArchiveStorageHeader::kNodeDirectory) != 0;

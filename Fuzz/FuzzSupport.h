@@ -1,5 +1,5 @@
-// What the fuzz targets share. A target states a property and holds it with FuzzCheck, which is never compiled out.
-// Parameters are drawn from the end of the input, so that its front stays a valid sample.
+// What the fuzz targets share. A target states a property and checks it with FuzzCheck, which is never compiled out.
+// Parameters are taken from the end of the input, so that its start remains a valid sample.
 #pragma once
 
 #include "Runtime/Core/SourceLocation.h"
@@ -19,18 +19,21 @@ inline void FuzzCheck(bool condition, SourceLocation where = SourceLocation::cur
     abort();
 }
 
-// The input, with parameters taken off its end.
+// The input without the parameters that have been taken from its end.
 class FuzzInput {
 public:
     FuzzInput(const std::uint8_t* data, size_t size) : m_Data(data), m_Size(size) {}
 
-    // A number below bound (which is not 0), drawn from up to four bytes at the end.
+    // A number below bound, from up to four bytes at the end. bound must not be 0.
     UInt64 TakeBelow(UInt64 bound) {
         UInt64 value = 0;
         for (int count = 0; count < 4 && m_Size != 0; ++count)
             value = value << 8 | m_Data[--m_Size];
         return value % bound;
     }
+
+    // A number below bound, which is at most 256, drawn from one byte.
+    UInt64 TakeByteBelow(UInt64 bound) { return m_Size != 0 ? m_Data[--m_Size] % bound : 0; }
 
     const std::uint8_t* data() const { return m_Data; }
     size_t size() const { return m_Size; }
@@ -40,7 +43,7 @@ private:
     size_t m_Size;
 };
 
-// An accessor over the bytes, which must outlive it. Closed when destroyed.
+// An open file whose contents are the bytes, which must outlive it.
 class FuzzFile {
 public:
     FuzzFile(const std::uint8_t* data, size_t size)
@@ -56,5 +59,5 @@ public:
     FileAccessor file;
 };
 
-// Drops what the log sink prints. Call once.
+// Discards what the log sink prints.
 void SilenceConsole();

@@ -1,4 +1,4 @@
-// Makes the seed corpora of the fuzzers, a folder each: MakeSeeds FOLDER
+// Makes the seed corpora of the fuzzers, one folder per fuzzer: MakeSeeds FOLDER
 #include "Tools/ArchiveWriter/ArchiveWriter.h"
 
 #include <cstdio>
@@ -46,7 +46,7 @@ int main(int argumentCount, char** arguments) {
     const auto write = [&](const ArchiveDescription& archive) {
         const std::string bytes = BuildArchive(archive).bytes;
         const std::string name = "seed" + std::to_string(count++);
-        for (const char* fuzzer : {"HeaderFuzzer", "LegacyFuzzer", "ReaderFuzzer", "CommandFuzzer"})
+        for (const char* fuzzer : {"HeaderFuzzer", "LegacyFuzzer", "ReaderFuzzer", "CommandFuzzer", "LibraryFuzzer"})
             WriteSeed(root / fuzzer, name, bytes);
     };
     for (CompressionType type : {kCompressionNone, kCompressionLzma, kCompressionLz4, kCompressionLz4HC}) {
@@ -78,9 +78,13 @@ int main(int argumentCount, char** arguments) {
     WriteSeed(decompressor, "lzma-empty", CompressLzma("", {.endMark = true}));
     WriteSeed(decompressor, "lz4", CompressLz4(text));
     WriteSeed(decompressor, "lz4hc", CompressLz4HC(text));
-    // A directory alone, as it stands at the start of a legacy data stream.
+    // A directory alone, as a legacy data stream starts with it.
     ArchiveDescription directory = Describe(ArchiveLayout::kRaw, kCompressionNone, true, 0);
     const BuiltArchive built = BuildArchive(directory);
     WriteSeed(root / "LegacyFuzzer", "directory", built.stream);
+
+    // Both draw all they need from single bytes.
+    WriteSeed(root / "PatternFuzzer", "text", Text(60));
+    WriteSeed(root / "PathFuzzer", "text", Text(300));
     return 0;
 }

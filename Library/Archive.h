@@ -27,6 +27,10 @@ struct zarvo_archive : private NonCopyable {
     const BlockDecoder& Blocks() const { return m_Blocks; }
     DataReader& Data() { return *m_Data; }
     MessageLog* Messages() { return &m_Messages; }
+    UInt64 MaxBlockBytes() const { return m_Options.max_block_bytes; }
+
+    // Whether this is the file that the archive is read from.
+    bool IsFile(dev_t device, ino_t inode) const { return m_Source->IsFile(device, inode); }
 
     // Builds the index at the first call.
     zarvo_code GetIndex(const EntryIndex** index, Failure* failure);

@@ -12,12 +12,26 @@ static zarvo_code SetDamaged(UInt32 index, const char* why, Failure* failure) {
     return failure->Set(ZARVO_ERROR_DAMAGED, "block %u %s", index, why);
 }
 
+zarvo_code SetOutsideData(Failure* failure) {
+    return failure->Set(ZARVO_ERROR_DAMAGED, "lies outside the archive's data");
+}
+
+zarvo_code SetTooLarge(UInt32 index, const Block& block, UInt64 maxBlockBytes, Failure* failure) {
+    return failure->Set(ZARVO_ERROR_LIMIT, "block %u takes %u bytes of memory, and the limit is %llu", index,
+                        block.size, static_cast<unsigned long long>(maxBlockBytes));
+}
+
 static bool HasLz4(const Block& block) { return block.type == kCompressionLz4 || block.type == kCompressionLz4HC; }
 
 bool BlockDecoder::IsStoredAsIs(const Block& block) {
     if (block.type == kCompressionNone) return true;
     const bool hasDecoder = block.type == kCompressionLzma || HasLz4(block);
     return hasDecoder && !block.isStreamed && block.storedSize == block.size;
+}
+
+bool BlockDecoder::IsReadInPieces(const Block& block, UInt64 maxBlockBytes) {
+    if (block.type != kCompressionLzma || IsStoredAsIs(block)) return false;
+    return block.size > maxBlockBytes || (block.isStreamed && block.size > kLargestWholeStream);
 }
 
 UInt64 BlockDecoder::DataSize() const {

@@ -31,7 +31,10 @@ public:
     UInt32 FindBlock(UInt64 position) const;
 
     static bool IsStoredAsIs(const Block& block);
-    static bool IsLzma(const Block& block) { return block.type == kCompressionLzma && !IsStoredAsIs(block); }
+
+    // Whether a block is decoded piece by piece: LZMA that is streamed and large, or larger than may be held in memory.
+    // Smaller streams are decoded whole, as other blocks are, so that reading in them can jump.
+    static bool IsReadInPieces(const Block& block, UInt64 maxBlockBytes);
 
     // Reads bytes [offset, offset + size) of a block that is stored as is. *count is how many are there.
     zarvo_code ReadStoredAsIs(UInt32 index, UInt64 offset, void* out, size_t size, size_t* count,
@@ -44,6 +47,8 @@ public:
 private:
     friend class StreamCursor;
 
+    static constexpr UInt64 kLargestWholeStream = 1'048'576;
+
     // Reads stored bytes [from, from + size) of a block; *count is how many the archive has.
     zarvo_code ReadStored(const Block& block, UInt64 from, void* out, size_t size, size_t* count,
                           Failure* failure) const;
@@ -53,6 +58,10 @@ private:
     const ArchiveStorageReader* m_Reader;
     const Source* m_Source;
 };
+
+// The failure of an entry that leaves the data, and that of a block that may not be held in memory.
+zarvo_code SetOutsideData(Failure* failure);
+zarvo_code SetTooLarge(UInt32 index, const BlockDecoder::Block& block, UInt64 maxBlockBytes, Failure* failure);
 
 // A place inside an LZMA block from which decoding can go on.
 class StreamCursor : private NonCopyable {

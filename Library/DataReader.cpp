@@ -21,12 +21,7 @@ zarvo_code DataReader::Read(UInt64 position, void* out, size_t size, size_t* cou
         if (code != ZARVO_OK) return code;
     }
     if (*count == size) return ZARVO_OK;
-    return failure->Set(ZARVO_ERROR_DAMAGED, "lies outside the archive's data");
-}
-
-bool DataReader::IsReadInPieces(const BlockDecoder::Block& block) const {
-    if (!BlockDecoder::IsLzma(block)) return false;
-    return block.size > m_MaxBlockBytes || (block.isStreamed && block.size > kLargestWholeStream);
+    return SetOutsideData(failure);
 }
 
 zarvo_code DataReader::ReadInBlock(UInt32 blockIndex, UInt64 offset, UInt8* out, size_t size, size_t* count,
@@ -34,10 +29,9 @@ zarvo_code DataReader::ReadInBlock(UInt32 blockIndex, UInt64 offset, UInt8* out,
     const BlockDecoder::Block block = m_Decoder->GetBlock(blockIndex);
     if (BlockDecoder::IsStoredAsIs(block))
         return m_Decoder->ReadStoredAsIs(blockIndex, offset, out, size, count, failure);
-    if (IsReadInPieces(block)) return ReadFromCursor(blockIndex, offset, out, size, count, kept, failure);
-    if (block.size > m_MaxBlockBytes)
-        return failure->Set(ZARVO_ERROR_LIMIT, "block %u takes %u bytes of memory; the limit (max_block_bytes) is %llu",
-                            blockIndex, block.size, static_cast<unsigned long long>(m_MaxBlockBytes));
+    if (BlockDecoder::IsReadInPieces(block, m_MaxBlockBytes))
+        return ReadFromCursor(blockIndex, offset, out, size, count, kept, failure);
+    if (block.size > m_MaxBlockBytes) return SetTooLarge(blockIndex, block, m_MaxBlockBytes, failure);
     if (size == block.size && !m_Cache->Has(blockIndex)) return m_Decoder->DecodeWhole(blockIndex, out, count, failure);
 
     BlockCache::Use use(m_Cache);

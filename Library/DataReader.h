@@ -21,10 +21,6 @@ public:
     void GiveBack(StreamCursor* cursor) { m_Cache->GiveCursorBack(cursor); }
 
 private:
-    // Streamed blocks up to this size are decoded whole and kept, as others are: reading in them can then jump.
-    static constexpr UInt64 kLargestWholeStream = 1'048'576;
-
-    bool IsReadInPieces(const BlockDecoder::Block& block) const;
     zarvo_code ReadInBlock(UInt32 blockIndex, UInt64 offset, UInt8* out, size_t size, size_t* count,
                            StreamCursor** kept, Failure* failure);
     zarvo_code ReadFromCursor(UInt32 blockIndex, UInt64 offset, UInt8* out, size_t size, size_t* count,

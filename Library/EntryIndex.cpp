@@ -70,6 +70,10 @@ bool EntryIndex::ReserveSlots(size_t count) {
 
 zarvo_code EntryIndex::Build(Failure* failure) {
     const UInt32 count = static_cast<UInt32>(m_Nodes.size());
+    // What an attempt that found no memory has left.
+    m_Implied.clear();
+    m_Slots = dynamic_array<Slot>(kMemLabelFileSystem);
+    m_FirstInRoot = kNoItem;
     if (m_Nodes.size() >= kRoot || !ReserveSlots(size_t{count} + count / 16) ||
         !m_NextSibling.resize_uninitialized(count, kResizeExact) ||
         !m_FirstChild.resize_uninitialized(count, kResizeExact))
@@ -131,7 +135,7 @@ bool EntryIndex::LinkIntoFolders(UInt32 entry, dynamic_array<UInt64>* hashes) {
 template <typename T>
 static bool AppendOne(dynamic_array<T>* array, T value) {
     const size_t size = array->size();
-    if (size == array->capacity()) array->reserve(size + size / 8 + 16);
+    if (size == array->capacity() && !array->reserve(size + size / 8 + 16)) return false;
     if (!array->resize_uninitialized(size + 1)) return false;
     (*array)[size] = value;
     return true;

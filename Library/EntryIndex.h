@@ -22,7 +22,7 @@ public:
     // nodes outlives the index.
     explicit EntryIndex(const Nodes& nodes);
 
-    // Once, before anything else.
+    // Before anything else; once more where memory was refused.
     [[nodiscard]] zarvo_code Build(Failure* failure);
 
     UInt32 ItemCount() const { return static_cast<UInt32>(m_NextSibling.size()); }
@@ -30,7 +30,7 @@ public:
     // kNoItem when nothing has that path; kRoot when its normal form is empty.
     UInt32 Find(core::string_ref path) const;
 
-    // In the archive's order; an implied folder stands where the last entry below it does. kNoItem at the end.
+    // In the archive's order; an implied folder stands where the last item in it does. kNoItem at the end.
     UInt32 FirstChild(UInt32 item) const { return item == kRoot ? m_FirstInRoot : m_FirstChild[item]; }
     UInt32 NextSibling(UInt32 item) const { return m_NextSibling[item]; }
 

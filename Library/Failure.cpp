@@ -36,7 +36,7 @@ zarvo_code Failure::SetSystem(int error, const char* what) {
 
 zarvo_code Deliver(zarvo_code code, const Failure& failure, zarvo_error** error) {
     if (code == ZARVO_OK || error == nullptr) return code;
-    *error = New<zarvo_error>(kMemLabelGeneral, failure);
+    *error = New<zarvo_error>(kMemLabelGeneral, zarvo_error{failure});
     if (*error == nullptr) *error = &s_NoMemory;
     return code;
 }

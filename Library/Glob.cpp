@@ -1,6 +1,6 @@
 #include "Library/Glob.h"
 
-#include "Runtime/Core/Types.h"
+#include "Library/PathRules.h"
 
 namespace {
 
@@ -96,7 +96,7 @@ struct Star {
 
 } // namespace
 
-bool MatchGlob(core::string_ref glob, core::string_ref text) {
+bool MatchGlobOrFolder(core::string_ref glob, core::string_ref text) {
     size_t globAt = 0;
     size_t textAt = 0;
     // A later star of either kind makes earlier ones of that kind not worth another try: what it could take in
@@ -104,7 +104,8 @@ bool MatchGlob(core::string_ref glob, core::string_ref text) {
     Star star;     // "*"
     Star deepStar; // "**"
     while (true) {
-        if (globAt == glob.size() && textAt == text.size()) return true;
+        const bool isAtEnd = textAt == text.size() || (textAt != 0 && IsSeparator(text[textAt]));
+        if (globAt == glob.size() && isAtEnd) return true;
         if (globAt < glob.size() && glob[globAt] == '*') {
             const bool isAtComponent = globAt == 0 || glob[globAt - 1] == '/';
             size_t end = globAt;

@@ -14,9 +14,9 @@
 
 #include "Runtime/Core/Containers/StringRef.h"
 
-// Whether the glob takes the whole text. Needs no memory, and never more time than the two lengths and the text's once
-// more, multiplied.
-bool MatchGlob(core::string_ref glob, core::string_ref text);
+// Whether the glob takes the whole text, or a folder above it: what lies before a "/" or "\". Needs no memory, and
+// never more time than the two lengths and the text's once more, multiplied.
+bool MatchGlobOrFolder(core::string_ref glob, core::string_ref text);
 
 // Whether a text holds anything that a glob reads otherwise than as itself.
 bool IsGlob(core::string_ref text);

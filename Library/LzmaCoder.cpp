@@ -37,7 +37,7 @@ LzmaResult LzmaStream::Begin(const UInt8 properties[kLzmaPropertiesSize], UInt64
     const SRes result = LzmaDec_Allocate(&m_Decoder, bounded, sizeof(bounded), &s_Allocation);
     if (result == SZ_ERROR_MEM) return kLzmaNoMemory;
     if (result != SZ_OK) return kLzmaDamaged;
-    m_MemoryUsed = m_Decoder.dicBufSize;
+    m_MemoryUsed = m_Decoder.dicBufSize + UInt64{m_Decoder.numProbs} * sizeof(CLzmaProb);
     LzmaDec_Init(&m_Decoder);
     return kLzmaOk;
 }

@@ -14,7 +14,7 @@ struct MessageHook {
     // Handed every text that the runtime is about to print; the answer is that it is not to be printed.
     static bool Collect(LogType, const char* format, va_list arguments) {
         MessageScope* const scope = t_Innermost;
-        if (scope == nullptr || scope->m_Log == nullptr || scope->m_Collected.size() >= kMaxMessages) return false;
+        if (scope == nullptr || scope->m_Collected.size() >= kMaxMessages) return false;
         char text[512];
         const int length = vsnprintf(text, sizeof(text), format, arguments);
         if (length <= 0) return false;
@@ -49,10 +49,31 @@ bool MessageLog::IsNew(const core::string& message) {
     return true;
 }
 
+void MessageQueue::Add(dynamic_array<core::string>* messages) {
+    Mutex::AutoLock lock(m_Lock);
+    for (core::string& message : *messages) {
+        const size_t index = m_Messages.size();
+        if (index < kMaxMessages && m_Messages.resize_initialized(index + 1)) m_Messages[index] = std::move(message);
+    }
+}
+
+void MessageQueue::TellAll(MessageLog* log) {
+    dynamic_array<core::string> messages;
+    {
+        Mutex::AutoLock lock(m_Lock);
+        messages = std::move(m_Messages);
+    }
+    for (const core::string& message : messages)
+        log->Tell(message);
+}
+
 MessageScope::MessageScope(MessageLog* log) : m_Log(log), m_Outer(t_Innermost) { t_Innermost = this; }
+MessageScope::MessageScope(MessageQueue* queue) : m_Queue(queue), m_Outer(t_Innermost) { t_Innermost = this; }
 
 MessageScope::~MessageScope() {
     t_Innermost = m_Outer;
+    if (m_Queue != nullptr) m_Queue->Add(&m_Collected);
+    if (m_Log == nullptr) return;
     for (const core::string& message : m_Collected)
         m_Log->Tell(message);
 }

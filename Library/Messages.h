@@ -30,16 +30,29 @@ private:
     dynamic_array<UInt64> m_Told VARNEX_GUARDED_BY(m_Lock); // hashes
 };
 
+// What a thread that works for a call has collected, on its way to the thread that made the call. Any thread.
+class MessageQueue : private NonCopyable {
+public:
+    void Add(dynamic_array<core::string>* messages);
+    void TellAll(MessageLog* log);
+
+private:
+    Mutex m_Lock;
+    dynamic_array<core::string> m_Messages VARNEX_GUARDED_BY(m_Lock);
+};
+
 // Collects this thread's reports for a log for the time of a call. Scopes nest: the innermost collects.
 class MessageScope : private NonCopyable {
 public:
-    explicit MessageScope(MessageLog* log);
-    ~MessageScope(); // tells them
+    explicit MessageScope(MessageLog* log);     // tells them at the end
+    explicit MessageScope(MessageQueue* queue); // hands them on at the end
+    ~MessageScope();
 
 private:
     friend struct MessageHook;
 
-    MessageLog* m_Log;
+    MessageLog* m_Log = nullptr;
+    MessageQueue* m_Queue = nullptr;
     MessageScope* m_Outer;
     dynamic_array<core::string> m_Collected;
 };

@@ -3,6 +3,9 @@
 #include "Library/include/zarvo.h"
 #include "Runtime/Utilities/SpookyHash.h"
 
+#include <cstring>
+#include <sys/random.h>
+
 bool PathComponents::Next() {
     do {
         m_Begin = m_End;
@@ -46,7 +49,20 @@ bool IsSamePath(core::string_ref a, core::string_ref b) {
     }
 }
 
+static bool HasTwoDots(core::string_ref path) {
+    const char* const end = path.data() + path.size();
+    for (const char* at = path.data(); at != end; ++at) {
+        at = static_cast<const char*>(memchr(at, '.', static_cast<size_t>(end - at)));
+        if (at == nullptr || at + 1 == end) return false;
+        if (at[1] == '.') return true;
+    }
+    return false;
+}
+
 SInt32 GetPathProblem(core::string_ref path, bool isFile) {
+    // Nearly every path is told by a look at its ends and a search for "..".
+    if (!path.empty() && path[0] != '.' && !IsSeparator(path[0]) && !IsSeparator(path.back()) && !HasTwoDots(path))
+        return ZARVO_PROBLEM_NONE;
     bool isEmpty = true;
     for (PathComponents at(path); at.Next(); isEmpty = false)
         if (at.Name() == "..") return ZARVO_PROBLEM_PARENT;
@@ -59,6 +75,14 @@ UInt64 HashComponent(UInt64 folderHash, core::string_ref name) {
     UInt64 otherHalf = folderHash;
     SpookyHash::Hash128(name.data(), name.size(), &folderHash, &otherHalf);
     return folderHash;
+}
+
+UInt64 RandomHashSeed() {
+    UInt64 seed;
+    // Without a random number an address of this process is the seed.
+    if (getrandom(&seed, sizeof(seed), GRND_NONBLOCK) != static_cast<ssize_t>(sizeof(seed)))
+        seed = reinterpret_cast<UInt64>(&seed);
+    return seed;
 }
 
 size_t zarvo_normalize_path(const char* path, size_t length, char* out) {

@@ -41,3 +41,6 @@ SInt32 GetPathProblem(core::string_ref path, bool isFile);
 // The hash of a normal form, component by component: a folder's hash is on the way to those of what it holds. The hash
 // of the root is a seed, which nobody who makes an archive should know.
 UInt64 HashComponent(UInt64 folderHash, core::string_ref name);
+
+// A seed for such hashes that differs from run to run.
+UInt64 RandomHashSeed();

@@ -91,13 +91,6 @@ bool zarvo_patterns::UseLiterals(core::string_ref path) {
     return isMatch;
 }
 
-// Whether the glob takes a text that names a path, or one of the folders above it.
-static bool MatchWithFolders(core::string_ref glob, core::string_ref text) {
-    for (size_t end = 1; end < text.size(); ++end)
-        if (IsSeparator(text[end]) && MatchGlob(glob, text.substr(0, end))) return true;
-    return MatchGlob(glob, text);
-}
-
 int zarvo_patterns::Match(core::string_ref path) {
     if (m_Patterns.empty()) return 0;
     bool isMatch = UseLiterals(path);
@@ -110,8 +103,8 @@ int zarvo_patterns::Match(core::string_ref path) {
     for (const UInt32 index : m_Globs) {
         Pattern& pattern = m_Patterns[index];
         if (isMatch && pattern.isUsed) continue;
-        const bool takes = MatchWithFolders(pattern.text, normalForm) ||
-                           (!(stored == normalForm) && MatchWithFolders(pattern.text, stored));
+        const bool takes = MatchGlobOrFolder(pattern.text, normalForm) ||
+                           (!(stored == normalForm) && MatchGlobOrFolder(pattern.text, stored));
         pattern.isUsed = pattern.isUsed || takes;
         isMatch = isMatch || takes;
     }

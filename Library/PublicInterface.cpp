@@ -1,6 +1,7 @@
 // The functions of zarvo.h that work on archives: arguments are looked at here, and nowhere below.
 #include "Library/Archive.h"
 #include "Library/Handles.h"
+#include "Library/PublicStructures.h"
 #include "Runtime/Allocator/Allocator.h"
 
 #include <algorithm>
@@ -20,22 +21,6 @@ struct zarvo_stream {
 
 namespace {
 
-// Structures of an older caller are shorter than ours, those of a newer one longer: what both know is copied.
-template <typename T>
-T CopyIn(const T* given) {
-    T copy = {};
-    if (given != nullptr) memcpy(&copy, given, std::min(given->struct_size, sizeof(copy)));
-    return copy;
-}
-
-template <typename T>
-void CopyOut(const T& filled, T* out) {
-    const size_t size = std::min(out->struct_size, sizeof(filled));
-    if (size > sizeof(out->struct_size))
-        memcpy(reinterpret_cast<char*>(out) + sizeof(out->struct_size),
-               reinterpret_cast<const char*>(&filled) + sizeof(out->struct_size), size - sizeof(out->struct_size));
-}
-
 zarvo_open_options FillInDefaults(const zarvo_open_options* given) {
     zarvo_open_options options = CopyIn(given);
     if (options.max_entries == 0) options.max_entries = kDefaultMaxEntries;
@@ -43,11 +28,6 @@ zarvo_open_options FillInDefaults(const zarvo_open_options* given) {
     if (options.max_block_bytes == 0) options.max_block_bytes = kDefaultMaxBlockBytes;
     if (options.cache_bytes == 0) options.cache_bytes = kDefaultCacheBytes;
     return options;
-}
-
-zarvo_code RefuseArgument(const char* what, zarvo_error** error) {
-    Failure failure;
-    return Deliver(failure.SetArgument(what), failure, error);
 }
 
 // openSource: opens a source at an offset, and answers as the functions of Source.h do.
@@ -246,6 +226,7 @@ zarvo_code zarvo_get_item_path(const zarvo_archive* archive, uint64_t item, char
 
 zarvo_code zarvo_read(zarvo_archive* archive, uint64_t index, uint64_t offset, void* buffer, size_t size, size_t* count,
                       zarvo_error** error) {
+    if (count != nullptr) *count = 0;
     if (!IsEntry(archive, index)) return RefuseArgument(kNoEntry, error);
     if ((buffer == nullptr && size != 0) || count == nullptr) return RefuseArgument(kNoRoom, error);
     MessageScope scope(archive->Messages());
@@ -292,6 +273,7 @@ zarvo_code zarvo_stream_open(zarvo_archive* archive, uint64_t index, zarvo_strea
 }
 
 zarvo_code zarvo_stream_read(zarvo_stream* stream, void* buffer, size_t size, size_t* count, zarvo_error** error) {
+    if (count != nullptr) *count = 0;
     if (!IsLiveHandle(stream) || !IsLiveHandle(stream->archive)) return RefuseArgument("no open stream", error);
     if ((buffer == nullptr && size != 0) || count == nullptr) return RefuseArgument(kNoRoom, error);
     MessageScope scope(stream->archive->Messages());
@@ -333,8 +315,10 @@ zarvo_code zarvo_get_block(const zarvo_archive* archive, uint64_t index, zarvo_b
 }
 
 zarvo_code zarvo_read_block(zarvo_archive* archive, uint64_t index, void* buffer, size_t* count, zarvo_error** error) {
+    if (count != nullptr) *count = 0;
     if (index >= zarvo_block_count(archive)) return RefuseArgument("no open archive, or no such block", error);
-    if (buffer == nullptr || count == nullptr) return RefuseArgument(kNoRoom, error);
+    const bool hasRoom = buffer != nullptr || archive->Blocks().GetBlock(static_cast<UInt32>(index)).size == 0;
+    if (!hasRoom || count == nullptr) return RefuseArgument(kNoRoom, error);
     MessageScope scope(archive->Messages());
     Failure failure;
     return Deliver(archive->Data().ReadBlock(static_cast<UInt32>(index), buffer, count, &failure), failure, error);

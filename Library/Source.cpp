@@ -46,16 +46,22 @@ auto RepeatOnInterrupt(Call&& call) {
     return answer;
 }
 
-// What changes with a file's contents.
+// Which file it is, and what changes with its contents.
 struct Stamp {
     explicit Stamp(const struct stat& status)
-        : size(status.st_size), modified(status.st_mtim), changed(status.st_ctim) {}
+        : device(status.st_dev),
+          inode(status.st_ino),
+          size(status.st_size),
+          modified(status.st_mtim),
+          changed(status.st_ctim) {}
 
     bool operator==(const Stamp& other) const {
         return size == other.size && IsSame(modified, other.modified) && IsSame(changed, other.changed);
     }
     static bool IsSame(const timespec& a, const timespec& b) { return a.tv_sec == b.tv_sec && a.tv_nsec == b.tv_nsec; }
 
+    dev_t device;
+    ino_t inode;
     off_t size;
     timespec modified;
     timespec changed;
@@ -68,6 +74,8 @@ public:
     ~FileSource() override { close(m_Descriptor); }
 
     zarvo_code Begin(UInt64 wholeSize, UInt64 offset, Failure* failure) { return SetRange(wholeSize, offset, failure); }
+
+    bool IsFile(dev_t device, ino_t inode) const override { return m_Stamp.device == device && m_Stamp.inode == inode; }
 
 private:
     zarvo_code ReadSome(UInt64 position, void* buffer, size_t size, size_t* count, Failure* failure) const override {
@@ -143,17 +151,22 @@ public:
     zarvo_code Begin(UInt64 offset, Failure* failure) {
         uint64_t size = 0;
         const int answer = m_Callbacks.get_size(m_Callbacks.context, &size);
-        if (answer != 0) return failure->SetSystem(answer < 0 ? -answer : EIO);
+        if (answer != 0) return SetAnswer(answer, failure);
         return SetRange(size, offset, failure);
     }
 
 private:
     zarvo_code ReadSome(UInt64 position, void* buffer, size_t size, size_t* count, Failure* failure) const override {
         const int64_t answer = m_Callbacks.read_at(m_Callbacks.context, buffer, size, position);
-        if (answer < 0) return failure->SetSystem(answer < -INT32_MAX ? EIO : static_cast<int>(-answer));
+        if (answer < 0) return SetAnswer(answer, failure);
         if (static_cast<UInt64>(answer) > size) return failure->SetSystem(EIO, "a read delivered more than was asked");
         *count = static_cast<size_t>(answer);
         return ZARVO_OK;
+    }
+
+    // The errno that a callback answers, where it can be one.
+    static zarvo_code SetAnswer(int64_t answer, Failure* failure) {
+        return failure->SetSystem(answer > 0 || answer < -INT32_MAX ? EIO : static_cast<int>(-answer));
     }
 
     zarvo_source m_Callbacks;

@@ -5,6 +5,8 @@
 #include "Library/Failure.h"
 #include "Runtime/Core/NonCopyable.h"
 
+#include <sys/types.h>
+
 class Source : private NonCopyable {
 public:
     virtual ~Source() = default;
@@ -15,6 +17,9 @@ public:
 
     // Bytes from the archive's start to the source's end, as they were when it was opened.
     UInt64 Size() const { return m_Size; }
+
+    // Whether this is the file that the bytes come from.
+    virtual bool IsFile(dev_t, ino_t) const { return false; }
 
 protected:
     // A single read at a position of the whole source, inside its size: some bytes, 0 at its end, or a failure.

@@ -1,9 +1,9 @@
-// Every static object of the runtime whose order matters, in its order. They come before the static objects of a
-// program, which may log, lock and register; the order within this file is that of the lines.
+// The static objects of the runtime whose order matters. They are constructed in the order of the lines, before the
+// static objects of any program, which may log, lock and register.
 //
-// A program takes this object from the library with the first symbol that it needs of it: g_LogHandlerListMutex for
-// whoever logs, s_LastRegistered for whoever registers or runs the callbacks. So the scripting generator's
-// registration, which nobody names, is there wherever it can be run.
+// A linker takes this file from the library when a program needs any of its symbols: g_LogHandlerListMutex for logging,
+// s_LastRegistered for registering and running callbacks. So every program that can run the scripting generator's
+// registration has it, although no program names it.
 #include "Runtime/RuntimeStatics.h"
 
 #include "Footing/Timer.h"
@@ -12,7 +12,7 @@
 #include "Runtime/Threads/Thread.h"
 #include "Runtime/Utilities/LogHooks.h"
 
-// The first that is not the compiler's own.
+// The highest priority that is not reserved for the implementation.
 constexpr int kBeforeAllOthers = 101;
 
 using namespace ZarvoClassic;
@@ -25,12 +25,13 @@ constinit RegisterRuntimeInitializeAndCleanup* RegisterRuntimeInitializeAndClean
 
 namespace {
 
-// Only objects of a class can be given a place in the order; plain values are set by one that runs a function.
-struct RunAtStartUp {
-    explicit RunAtStartUp(void (*step)()) { step(); }
+// A step between the objects. Only an object of a class has a place in the order, so plain values are set by its
+// constructor.
+struct StartUpStep {
+    explicit StartUpStep(void (*run)()) { run(); }
 };
 
-[[gnu::init_priority(kBeforeAllOthers)]] const RunAtStartUp kSetMainThread([] {
+[[gnu::init_priority(kBeforeAllOthers)]] const StartUpStep kMainThreadStep([] {
     Thread::mainThreadId = PlatformThread::GetCurrentThreadID();
 });
 
@@ -45,11 +46,11 @@ struct RunAtStartUp {
 
 namespace {
 
-[[gnu::init_priority(kBeforeAllOthers)]] const RunAtStartUp kSetStartTime([] {
+[[gnu::init_priority(kBeforeAllOthers)]] const StartUpStep kStartTimeStep([] {
     nsSinceBootAtStartup = clock_gettime_nsec_np(CLOCK_MONOTONIC_RAW);
 });
 
-[[gnu::init_priority(kBeforeAllOthers)]] const RunAtStartUp kSetConversion([] {
+[[gnu::init_priority(kBeforeAllOthers)]] const StartUpStep kConversionStep([] {
     s_conversionRatio = Footing_Timer_GetTicksToNanosecondsConversionRatio();
     Footing_Timer_TickToNanosecondsConversionFactor =
         static_cast<double>(s_conversionRatio.ticksToNanosecondsNumerator) /

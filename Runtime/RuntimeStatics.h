@@ -1,11 +1,11 @@
-// Static objects of the runtime that have no room of their own. They exist before the static objects of any program.
+// Static objects of the runtime that belong to no other header. They exist before the static objects of any program.
 #pragma once
 
 #include "Runtime/Core/Containers/DynamicArray.h"
 #include "Runtime/Core/Containers/String.h"
 #include "Runtime/Utilities/RegisterRuntimeInitializeAndCleanup.h"
 
-// What the process would be started again with; nothing fills it yet. The main thread's.
+// The arguments for starting the process again; nothing fills it yet. Main thread only.
 extern dynamic_array<core::string> relaunchArguments;
 
 extern RegisterRuntimeInitializeAndCleanup gScriptingRandInitAndCleanup;

@@ -1,4 +1,4 @@
-// Makes the sample archives, one of each layout: MakeSamples FOLDER
+// Makes the sample archives, one per layout: MakeSamples FOLDER
 #include "Tools/ArchiveWriter/ArchiveWriter.h"
 
 #include <cstdio>
@@ -6,7 +6,7 @@
 
 namespace {
 
-// Large enough for the ZarvoWeb sample: the command looks for that directory in whole pieces of 65,536 bytes.
+// Large enough for the ZarvoWeb sample, whose data must have at least 65,536 bytes.
 std::string MakeTable() {
     std::string table = "number,square\n";
     for (int number = 0; number < 6'000; ++number)
@@ -27,7 +27,7 @@ ArchiveDescription Describe(ArchiveLayout layout) {
     ArchiveDescription archive;
     archive.layout = layout;
     for (const ArchiveEntry& entry : kEntries) {
-        // The legacy directories know no folders.
+        // The legacy directories have no folders.
         const bool isFolder = (entry.flags & kFolderEntry) != 0;
         if (isFolder && (layout == ArchiveLayout::kWeb || layout == ArchiveLayout::kRaw)) continue;
         archive.entries.push_back(entry);

@@ -1,7 +1,7 @@
 # For the other scripts to source.
 #
-# run_quietly COMMAND... runs a command or function and keeps its output back, which it shows on standard error when the
-# command fails. While ninja builds, it says there how far it is. The status is the command's.
+# run_quietly COMMAND... runs a command or function. It prints the command's output only when the command fails, on
+# standard error. While ninja builds, it prints the progress there. Returns the command's status.
 run_quietly() {
     local log out in status=0
     log="$(mktemp)"
@@ -13,7 +13,7 @@ run_quietly() {
     return "$status"
 }
 
-# Copies its input; every ten seconds at most, a line of ninja's, "[24/117] ...", becomes one for the user.
+# Copies its input. At most every ten seconds, it also reports a line of ninja's, "[24/117] ...", to the user.
 show_progress() {
     local line next=0
     while IFS= read -r line; do

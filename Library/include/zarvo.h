@@ -70,7 +70,9 @@ enum {
     ZARVO_ERROR_UNSUPPORTED = 6,    /* the data needs a kind of compression that is not known */
     ZARVO_ERROR_LIMIT = 7,          /* a limit of zarvo_open_options was reached */
     ZARVO_ERROR_CHANGED = 8,        /* the archive's file has changed since it was opened */
-    ZARVO_ERROR_NOT_FOUND = 9       /* no entry has that path */
+    ZARVO_ERROR_NOT_FOUND = 9,      /* no entry has that path */
+    ZARVO_ERROR_STOPPED = 10,       /* the progress callback asked for it */
+    ZARVO_ERROR_REFUSED = 11        /* extraction refuses the entry's path */
 };
 
 typedef struct zarvo_error zarvo_error;
@@ -125,7 +127,7 @@ typedef struct zarvo_open_options {
                                  (LZMA) or are stored as they are may be larger. Default: 2^31 */
 
     /* How much memory decoded blocks, and the states of streamed ones, may take while no call uses them. Blocks in use
-     * come on top. Default: 2^23 */
+     * come on top, and the one that was used last stays in any case. Default: 2^23 */
     uint64_t cache_bytes;
 
     /* Gets what the library has to say about an archive while it goes on, such as "Decompressing this format (7) is not
@@ -271,7 +273,8 @@ ZARVO_API uint64_t zarvo_item_count(const zarvo_archive* archive);
 
 /* Reads up to size bytes of an entry, from byte offset of it on, into buffer, and stores how many in *count: fewer than
  * size at the entry's end, 0 from there on (and always of a folder). After a failure *count says how many bytes before
- * the damage are in the buffer. Blocks that were decoded are kept in the archive's cache. */
+ * the damage are in the buffer, and 0 where the arguments were refused. Blocks that were decoded are kept in the
+ * archive's cache. */
 ZARVO_API zarvo_code zarvo_read(zarvo_archive* archive, uint64_t index, uint64_t offset, void* buffer, size_t size,
                                 size_t* count, zarvo_error** error);
 
@@ -323,8 +326,8 @@ typedef struct zarvo_block {
 ZARVO_API uint64_t zarvo_block_count(const zarvo_archive* archive);
 ZARVO_API zarvo_code zarvo_get_block(const zarvo_archive* archive, uint64_t index, zarvo_block* block);
 
-/* Decodes a whole block into buffer, which has room for its size, past the cache, and stores in *count how many bytes
- * were delivered: all of them, or, after a failure, those before the damage. */
+/* Decodes a whole block into buffer, which has room for its size (it may be NULL for none), past the cache, and stores
+ * in *count how many bytes were delivered: all of them, or, after a failure, those before the damage. */
 ZARVO_API zarvo_code zarvo_read_block(zarvo_archive* archive, uint64_t index, void* buffer, size_t* count,
                                       zarvo_error** error);
 
@@ -350,6 +353,136 @@ ZARVO_API int zarvo_patterns_used(const zarvo_patterns* patterns, size_t index);
 
 /* NULL is allowed. */
 ZARVO_API void zarvo_patterns_free(zarvo_patterns* patterns);
+
+/* ---- Working on a whole archive ---------------------------------------------------------------------------------- */
+
+/* How far a run is. */
+typedef struct zarvo_progress {
+    size_t struct_size;
+    uint64_t bytes;       /* of data that has been dealt with */
+    uint64_t bytes_total; /* that will have been when the run ends */
+    uint64_t files;       /* entries that have been dealt with */
+    uint64_t files_total;
+} zarvo_progress;
+
+/* What zarvo_extract, zarvo_test and zarvo_visit have in common. A zero, or NULL, asks for the default. The callbacks
+ * are called on the calling thread unless they say otherwise, with no lock held. */
+typedef struct zarvo_run_options {
+    size_t struct_size;
+
+    uint32_t threads; /* to use. Default: as many as the process has processors. Results never depend on it */
+    uint64_t memory;  /* bytes that decoding may take: fewer threads are used first, then a block that can't be held is
+                         ZARVO_ERROR_LIMIT. Default: half of what the machine has free */
+
+    zarvo_patterns* wanted;   /* which entries. Default: all. Must not be in use elsewhere during the call */
+    zarvo_patterns* excluded; /* which of them not. Default: none. As above */
+
+    /* Called ten times a second, and at the end. Anything but 0 stops the run with ZARVO_ERROR_STOPPED. */
+    int (*progress)(void* context, const zarvo_progress* progress);
+    void* context; /* for all callbacks of the run */
+} zarvo_run_options;
+#define ZARVO_RUN_OPTIONS_INIT                                                                                         \
+    { sizeof(zarvo_run_options), 0, 0, NULL, NULL, NULL, NULL }
+
+/* What became of an entry. */
+enum {
+    ZARVO_OUTCOME_DONE = 0,  /* put in place */
+    ZARVO_OUTCOME_KEPT = 1,  /* what was there was left (ZARVO_OVERWRITE_NEVER) */
+    ZARVO_OUTCOME_FAILED = 2 /* see code and text */
+};
+typedef struct zarvo_report {
+    size_t struct_size;
+    uint64_t index;   /* of the entry */
+    int32_t outcome;  /* ZARVO_OUTCOME_... */
+    zarvo_code code;  /* of a failure, else ZARVO_OK */
+    int system_code;  /* an errno, or 0 */
+    const char* text; /* as zarvo_error_text; valid until the callback returns */
+} zarvo_report;
+
+enum {
+    ZARVO_OVERWRITE_ALWAYS = 0, /* a file that is there is replaced */
+    ZARVO_OVERWRITE_NEVER = 1,  /* it is left */
+    ZARVO_OVERWRITE_FAIL = 2    /* it is left, and that is a failure of the entry */
+};
+
+typedef struct zarvo_extract_options {
+    size_t struct_size;
+    int32_t overwrite;   /* ZARVO_OVERWRITE_... */
+    int32_t keep_broken; /* 1: of a damaged file, what lies before the damage is put in place, too */
+    int32_t dry_run;     /* 1: nothing is written; what would be is reported */
+    uint64_t strip;      /* components that each path loses at its front; what has no more is left out */
+    uint64_t max_bytes;  /* to write at most: ZARVO_ERROR_LIMIT before anything is written where the files are larger.
+                            Default: no limit */
+
+    /* Called once for each entry that was wanted and counts, in the archive's order. May be NULL. */
+    void (*report)(void* context, const zarvo_report* report);
+} zarvo_extract_options;
+#define ZARVO_EXTRACT_OPTIONS_INIT                                                                                     \
+    { sizeof(zarvo_extract_options), 0, 0, 0, 0, 0, NULL }
+
+/* What a run has done. */
+typedef struct zarvo_summary {
+    size_t struct_size;
+    uint64_t files;    /* put in place (of a test: looked at) */
+    uint64_t folders;  /* entries that are folders, put in place */
+    uint64_t kept;     /* left as they were */
+    uint64_t failures; /* entries that failed (of a test: entries with unreadable bytes) */
+    uint64_t bytes;    /* of the files */
+    uint64_t damaged_blocks;
+} zarvo_summary;
+#define ZARVO_SUMMARY_INIT                                                                                             \
+    { sizeof(zarvo_summary), 0, 0, 0, 0, 0, 0 }
+
+/* Writes entries below folder, which is made with those above it where it is missing. Nothing is written elsewhere:
+ * links below it are not followed, and paths with ".." are refused. A new file gets its name when it is whole, and
+ * takes the place of what is there in one step; what is no file or folder there is never opened. Entries that can't
+ * both be (a file where a folder has to be): the first in the archive stays, the other fails. Of entries with one path
+ * the last is written.
+ *
+ * options and how may be NULL. *summary, which may be NULL, is filled also after a failure. ZARVO_OK also where entries
+ * failed: see the summary. A disk that is full or can't be written ends the run with ZARVO_ERROR_SYSTEM.
+ *
+ * A program whose file sizes are limited (ulimit -f) should ignore SIGXFSZ, to get an error instead of a signal. */
+ZARVO_API zarvo_code zarvo_extract(zarvo_archive* archive, const char* folder, const zarvo_run_options* options,
+                                   const zarvo_extract_options* how, zarvo_summary* summary, zarvo_error** error);
+
+typedef struct zarvo_test_options {
+    size_t struct_size;
+
+    /* Called for each block that can't be decoded, in order, once all have been tried. May be NULL. */
+    void (*block)(void* context, uint64_t block_index, const char* text);
+
+    /* Called for each entry with bytes that can't be read, in the archive's order, with how many before them can. May
+     * be NULL. */
+    void (*entry)(void* context, uint64_t index, uint64_t readable);
+} zarvo_test_options;
+#define ZARVO_TEST_OPTIONS_INIT                                                                                        \
+    { sizeof(zarvo_test_options), NULL, NULL }
+
+/* Decodes every block once, and writes nothing. The formats hold no checksums: damage that decodes is not seen.
+ * Otherwise as zarvo_extract; patterns are not used. */
+ZARVO_API zarvo_code zarvo_test(zarvo_archive* archive, const zarvo_run_options* options,
+                                const zarvo_test_options* what, zarvo_summary* summary, zarvo_error** error);
+
+typedef struct zarvo_visit_options {
+    size_t struct_size;
+    uint64_t strip; /* as of zarvo_extract_options; which entries count depends on it */
+
+    /* Called with the bytes of the files that extraction would write, piece by piece: each file's in order, from offset
+     * 0 on, and none after damage. Called by many threads at once, for different files; must not call the library for
+     * this archive's run, nor throw. Empty files have no bytes. */
+    void (*bytes)(void* context, uint64_t index, uint64_t offset, const void* bytes, size_t size);
+
+    /* Called once for each entry that extraction would make a report of, in the archive's order; of a file, after its
+     * bytes. May be NULL. */
+    void (*report)(void* context, const zarvo_report* report);
+} zarvo_visit_options;
+#define ZARVO_VISIT_OPTIONS_INIT                                                                                       \
+    { sizeof(zarvo_visit_options), 0, NULL, NULL }
+
+/* Hands the bytes of files to a callback, decoding each block once, in all threads. Otherwise as zarvo_extract. */
+ZARVO_API zarvo_code zarvo_visit(zarvo_archive* archive, const zarvo_run_options* options,
+                                 const zarvo_visit_options* what, zarvo_summary* summary, zarvo_error** error);
 
 #ifdef __cplusplus
 }

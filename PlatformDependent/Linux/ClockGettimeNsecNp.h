@@ -1,4 +1,4 @@
-// clock_gettime_nsec_np, under its name on other systems: a clock in nanoseconds, 0 for a clock that is not there.
+// clock_gettime_nsec_np, as other systems name it: a clock's time in nanoseconds, or 0 if the system lacks the clock.
 #pragma once
 
 #include <cstdint>

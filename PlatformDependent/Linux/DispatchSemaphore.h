@@ -1,12 +1,11 @@
-// Dispatch semaphores, under their names on other systems: counting semaphores that live on the heap.
+// Dispatch semaphores, as other systems name them: counting semaphores on the heap.
 //
-//   dispatch_semaphore_t semaphore = dispatch_semaphore_create(0);   // null when there is no memory
+//   dispatch_semaphore_t semaphore = dispatch_semaphore_create(0);   // null when memory is refused
 //   dispatch_semaphore_signal(semaphore);                            // any thread
 //   dispatch_semaphore_wait(semaphore, DISPATCH_TIME_FOREVER);       // any thread; 0 once a signal was taken
-//   dispatch_release(semaphore);                                     // nobody waits any more
+//   dispatch_release(semaphore);                                     // while no thread waits
 //
-// A signal happens before the return of the wait that takes it (sem_t synchronises memory), so that data may be handed
-// over with it.
+// A signal happens before the return of the wait that takes it (sem_t synchronises memory), so it can hand data over.
 #pragma once
 
 #include <cerrno>
@@ -36,7 +35,7 @@ inline dispatch_semaphore_t dispatch_semaphore_create(intptr_t value) {
     return semaphore;
 }
 
-// 0 when a signal was taken. A handler that interrupts the wait does not end it.
+// 0 when a signal was taken. A POSIX signal that interrupts the wait does not end it.
 inline intptr_t dispatch_semaphore_wait(dispatch_semaphore_t semaphore, dispatch_time_t timeout) {
     int result;
     do

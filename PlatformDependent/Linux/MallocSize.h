@@ -1,4 +1,4 @@
-// malloc_size, under its name on other systems: the usable size of a block of the C heap, 0 for null.
+// malloc_size, as other systems name it: the usable size of a block of the C heap, 0 for null.
 #pragma once
 
 #include <malloc.h>

@@ -19,22 +19,22 @@ constexpr char kUserDataFolder[] = "Library/Zarvo";
 constexpr char kUserCacheFolder[] = "Library/Caches/com.zarvo3d.ZarvoEditor"; // named after the editor's bundle
 constexpr size_t kErrorTextSize = 2048;
 
-// The fields that the status answers, the hidden flag aside.
+// The fields that a status fills, apart from the hidden flag.
 constexpr UInt32 kStatusQuery = kFileEntryQuerySize | kFileEntryQueryLastModified | kFileEntryQueryDirectory |
                                 kFileEntryQuerySymLink | kFileEntryQueryReadOnly;
 static_assert(kStatusQuery == 0x334);
 
-// strerror_r has two forms: one answers a status and fills the buffer, the other answers the text.
+// strerror_r has two forms: one returns a status and fills the buffer, the other returns the text.
 [[maybe_unused]] const char* ErrorText(int, const char* buffer) { return buffer; }
 [[maybe_unused]] const char* ErrorText(const char* text, const char*) { return text; }
 
-core::basic_string<char> HomeFolder() { return MakeString(Platform_HomeDirectory()); }
+core::string HomeFolder() { return MakeString(Platform_HomeDirectory()); }
 
 bool GetPlatformStatus(const FileEntryData& entry, PlatformStatus* status) {
     return RepeatOnInterrupt([&] { return PlatformStat(entry.path, status); }) == 0;
 }
 
-// Whether the platform has a text for it; where it has none, it is handed the empty one.
+// Other paths reach the platform as the empty text.
 bool IsUtf8(const char* path) { return NSString_stringWithUTF8String(path) != nullptr; }
 
 } // namespace
@@ -68,22 +68,21 @@ bool LocalFileSystemOSX::CreateAsFile(FileEntryData& entry) {
 
 bool LocalFileSystemOSX::MoveToTrash(FileEntryData& entry) {
     NSURL* url = NSURL_URLByResolvingSymlinksInPath(NSURL_fileURLWithPath(MakeNSString(entry.path)));
-    const core::basic_string_ref<char> resolved = NSURL_fileSystemRepresentation(url);
+    const core::string_ref resolved = NSURL_fileSystemRepresentation(url);
     strcpy_truncate(entry.path, resolved.data(), sizeof(entry.path), resolved.length());
-    // What is cut, is no text, or has a backslash would name something else further on; nothing takes the whole disk.
+    // These would name something else below, because they are cut or converted; and "/" is the whole disk.
     if (resolved.length() > kMaxPathLength || !IsUtf8(entry.path)) return false;
     if (strchr(entry.path, '\\') != nullptr || resolved == "/") return false;
     if (!IsPathCreated(entry.path)) return false;
 
-    const core::basic_string<char> path = PathToAbsolutePath(entry.path);
-    if (path.empty()) return false; // memory was refused
+    const core::string path = PathToAbsolutePath(entry.path);
     int tag = 0;
-    // What counts is whether the path is gone, not what the workspace says.
+    // Its answer doesn't count, only whether the path is gone.
     (void)NSWorkspace_performFileOperation(Platform_RecycleOperation(), MakeNSString(DeleteLastPathNameComponent(path)),
                                            MakeNSString(""),
                                            NSArray_arrayWithObject(MakeNSString(GetLastPathNameComponent(path))), &tag);
     const FileSystemEntry thing(path);
-    if (thing.Exists()) (void)DeleteFileOrDirectory(path); // the test below tells
+    if (thing.Exists()) (void)DeleteFileOrDirectory(path); // tested below
     return !thing.Exists();
 }
 
@@ -118,53 +117,51 @@ FileEntryInfoQueryFlags LocalFileSystemOSX::GetFileEntryInfo(const FileEntryData
     return answer;
 }
 
-core::basic_string<char> LocalFileSystemOSX::GetApplicationPath() const {
-    static core::basic_string<char> appPath(kMemLabelPathString);
+core::string LocalFileSystemOSX::GetApplicationPath() const {
+    static core::string appPath(kMemLabelPathString);
     static Mutex appPathLock;
     const Mutex::AutoLock lock(appPathLock);
     if (appPath.empty()) {
         const AutoreleasePool pool;
         appPath = MakeString(NSBundle_bundlePath());
     }
-    return core::basic_string<char>(appPath, kMemLabelPathString);
+    return core::string(appPath, kMemLabelPathString);
 }
 
-core::basic_string<char> LocalFileSystemOSX::GetApplicationFolder() const {
-    const core::basic_string<char> application = GetApplicationPath();
-    return core::basic_string<char>(DeleteLastPathNameComponent(application), kMemLabelGeneral);
+core::string LocalFileSystemOSX::GetApplicationFolder() const {
+    const core::string application = GetApplicationPath();
+    return core::string(DeleteLastPathNameComponent(application), kMemLabelGeneral);
 }
 
-core::basic_string<char> LocalFileSystemOSX::GetApplicationManagedPath() const {
+core::string LocalFileSystemOSX::GetApplicationManagedPath() const {
     return AppendPathName(GetApplicationContentsPath(), "Managed");
 }
 
-core::basic_string<char> LocalFileSystemOSX::GetApplicationContentsPath() const {
+core::string LocalFileSystemOSX::GetApplicationContentsPath() const {
     return AppendPathName(GetApplicationPath(), "Contents");
 }
 
-core::basic_string<char> LocalFileSystemOSX::GetExecutablePath() const {
+core::string LocalFileSystemOSX::GetExecutablePath() const {
     const AutoreleasePool pool;
     return MakeString(NSBundle_executablePath());
 }
 
-core::basic_string<char> LocalFileSystemOSX::GetUserAppCacheFolder() const {
-    core::basic_string<char> folder(kMemLabelGeneral);
+core::string LocalFileSystemOSX::GetUserAppCacheFolder() const {
+    core::string folder(kMemLabelGeneral);
     AppendPathNameImpl(HomeFolder(), kUserCacheFolder, '/', folder);
     return folder;
 }
 
-core::basic_string<char> LocalFileSystemOSX::GetUserAppDataFolder() const {
-    return AppendPathName(HomeFolder(), kUserDataFolder);
-}
+core::string LocalFileSystemOSX::GetUserAppDataFolder() const { return AppendPathName(HomeFolder(), kUserDataFolder); }
 
-core::basic_string<char> LocalFileSystemOSX::GetSharedApplicationDataFolder() const {
+core::string LocalFileSystemOSX::GetSharedApplicationDataFolder() const {
     const AutoreleasePool pool;
     return MakeString(NSArray_firstObject(
         Platform_SearchPathForDirectoriesInDomains(NSApplicationSupportDirectory, NSLocalDomainMask, true)));
 }
 
-core::basic_string<char> LocalFileSystemOSX::LastErrorMessage() {
+core::string LocalFileSystemOSX::LastErrorMessage() {
     char buffer[kErrorTextSize] = {};
     const char* text = ErrorText(strerror_r(errno, buffer, sizeof(buffer)), buffer);
-    return core::basic_string<char>(text, kMemLabelPathString);
+    return core::string(text, kMemLabelPathString);
 }

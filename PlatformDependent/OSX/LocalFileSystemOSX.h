@@ -1,15 +1,15 @@
-// The local back end of macOS: the POSIX one with what the platform has services of its own for. Folders are listed in
-// bulk, the hidden mark is a file flag, files are made, copied and thrown away by the platform's file manager and
-// workspace, and the folders of application and user are the platform's.
+// The local back end of macOS: the POSIX one, with the platform's own services where it has them. Folders are listed in
+// bulk, a file flag marks files as hidden, the platform's file manager and workspace create, copy and trash files, and
+// the platform names the folders of the application and the user.
 //
-// No operation here records a lastError. Any thread, as for the POSIX back end. Where it differs from that one:
-//  - a path that is not valid UTF-8, which the platform's own disks do not hold, can't be handed to its services. It is
-//    listed as it stands, but nothing is made, copied or thrown away there;
-//  - a name that starts with "." is listed as hidden, but only the file flag counts for the filters and for IsHidden;
-//  - a folder that can't be opened is listed as empty, with success; a listed folder has size 0, and a listed link that
-//    does not lead to a folder the size and time of the link itself; no listed entry is ever marked read-only;
-//  - a relative listing is relative to the process's working directory, and its paths are relative again when that is,
-//    or lies in, the file system's current directory. With an empty current directory they lose their "/" alone.
+// No operation here records a lastError. Any thread. Differences from the POSIX back end:
+//  - The platform's services take only valid UTF-8. Other paths are listed, but can't be created, copied or trashed.
+//  - A name that starts with "." is listed as hidden, but filters and IsHidden look at the file flag only.
+//  - A folder that can't be opened is listed as empty, with success.
+//  - A listed folder has size 0. A listed link that does not lead to a folder has the size and time of the link itself.
+//    No listed entry is marked read-only.
+//  - A relative path is listed from the process's working directory. The listed paths are relative too if that is the
+//    file system's current directory or lies in it; if the current directory is empty, they only lose the leading "/".
 #pragma once
 
 #include "Runtime/VirtualFileSystem/LocalFileSystemPosix.h"
@@ -20,20 +20,20 @@ public:
 
     bool IsHidden(const FileEntryData& entry) const override;
 
-    // Of mask and flags only kFileEntryIsHidden counts; a bit in flags is set whether or not mask holds it.
+    // Only kFileEntryIsHidden counts, in mask and in flags. A bit in flags is set even if mask does not hold it.
     bool SetFlags(FileEntryData& entry, UInt32 mask, UInt32 flags) override;
 
     bool CreateAsFile(FileEntryData& entry) override;
 
-    // Of a link, what it leads to goes to the trash. The entry's path becomes the resolved one, also on failure; when
-    // that is longer than an entry holds it is cut and nothing is thrown away, nor is what is not valid UTF-8, has a
-    // backslash, or is "/". What the trash does not take is deleted. True when the path is gone.
+    // Trashes the target of a link. The entry's path becomes the resolved one, even on failure. A resolved path that is
+    // too long for an entry, not valid UTF-8, contains a backslash, or is "/" is refused. What the trash refuses is
+    // deleted. True when the path is gone.
     bool MoveToTrash(FileEntryData& entry) override;
 
-    // Always true: the target need not exist. A path that is longer than an entry holds is cut.
+    // Always true: the target need not exist. A resolved path that is too long for an entry is cut.
     bool Target(const FileEntryData& entry, FileSystemEntry& target) const override;
 
-    // Copies folders too, with their contents; false when the destination exists.
+    // Copies folders too, with their contents. False when the destination exists.
     bool Copy(FileEntryData& from, FileEntryData& to) override;
 
     bool Enumerate(const char* path, dynamic_block_array<FileEntryInfo, 32>* out, bool recursive, void** handlerData,
@@ -42,14 +42,14 @@ public:
     FileEntryInfoQueryFlags GetFileEntryInfo(const FileEntryData& entry, FileEntryInfo& info,
                                              FileEntryInfoQueryFlags query) const override;
 
-    core::basic_string<char> GetApplicationPath() const override;   // the bundle; takes a lock of its own
-    core::basic_string<char> GetApplicationFolder() const override; // the folder that holds it
-    core::basic_string<char> GetApplicationManagedPath() const override;
-    core::basic_string<char> GetApplicationContentsPath() const override;
-    core::basic_string<char> GetExecutablePath() const override;
-    core::basic_string<char> GetUserAppCacheFolder() const override; // not created
-    core::basic_string<char> GetUserAppDataFolder() const override;
-    core::basic_string<char> GetSharedApplicationDataFolder() const override;
+    core::string GetApplicationPath() const override;   // the bundle, cached under a lock
+    core::string GetApplicationFolder() const override; // the folder that holds it
+    core::string GetApplicationManagedPath() const override;
+    core::string GetApplicationContentsPath() const override;
+    core::string GetExecutablePath() const override;
+    core::string GetUserAppCacheFolder() const override; // not created
+    core::string GetUserAppDataFolder() const override;
+    core::string GetSharedApplicationDataFolder() const override;
 
-    core::basic_string<char> LastErrorMessage() override; // of errno as it stands
+    core::string LastErrorMessage() override; // the text for the current errno
 };

@@ -8,17 +8,17 @@ NSString* OrEmpty(NSString* string) { return string != nullptr ? string : NSStri
 
 } // namespace
 
-core::basic_string<char> MakeString(NSString* string) {
+core::string MakeString(NSString* string) {
     const char* text = NSString_UTF8String(string);
-    return core::basic_string<char>(text != nullptr ? text : "", kMemLabelPathString);
+    return core::string(text != nullptr ? text : "", kMemLabelPathString);
 }
 
-NSString* MakeNSString(const core::basic_string<char>& text) { return MakeNSString(text.c_str()); }
+NSString* MakeNSString(const core::string& text) { return MakeNSString(text.c_str()); }
 
 NSString* MakeNSString(const char* text) {
     return OrEmpty(text != nullptr ? NSString_stringWithUTF8String(text) : nullptr);
 }
 
-NSString* MakeNSString(core::basic_string_ref<char> text) {
+NSString* MakeNSString(core::string_ref text) {
     return OrEmpty(text.empty() ? nullptr : NSString_initWithBytes(text.data(), text.length(), NSUTF8StringEncoding));
 }

@@ -1,14 +1,14 @@
-// Texts to and from the platform's strings. A string made here is autoreleased and never nil: what is not valid UTF-8
-// becomes the empty one. Any thread.
+// Conversions to and from the platform's strings. MakeNSString returns an autoreleased string, never nil: the empty one
+// for text that is not valid UTF-8. Any thread.
 #pragma once
 
 #include "Runtime/Core/Containers/String.h"
 
 class NSString;
 
-// kMemLabelPathString; empty for nil and for a string that has no UTF-8 form.
-core::basic_string<char> MakeString(NSString* string);
+// The label is kMemLabelPathString. Empty for nil, and for a string that has no UTF-8 form.
+core::string MakeString(NSString* string);
 
-NSString* MakeNSString(const core::basic_string<char>& text); // up to its first NUL
-NSString* MakeNSString(const char* text);                     // null: the empty one
-NSString* MakeNSString(core::basic_string_ref<char> text);    // need not be terminated
+NSString* MakeNSString(const core::string& text); // up to its first NUL
+NSString* MakeNSString(const char* text);         // null gives the empty string
+NSString* MakeNSString(core::string_ref text);    // need not end in a NUL

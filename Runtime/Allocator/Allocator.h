@@ -1,6 +1,6 @@
-// Allocation with a memory label. Every block is aligned to 16 bytes at least, all labels share one heap, and label,
-// options and source position change nothing about where a block comes from. A refused request gives null: nothing
-// here throws, and only RequireMemory ends the program. Any thread.
+// Allocation with a memory label. Every block is aligned to at least 16 bytes. All labels share one heap; label,
+// options and source position do not change where a block comes from. A refused request returns null; nothing here
+// throws, and only RequireMemory ends the program. Any thread.
 //
 //   Thing* thing = New<Thing>(label, constructorArguments...);   // null when memory is refused
 //   Delete(thing, label);
@@ -17,9 +17,9 @@ enum AllocateOptions : UInt32 { kAllocateOptionNone = 0 };
 
 void* malloc_internal(size_t size, size_t align, MemLabelId label, AllocateOptions options, const char* file, int line);
 
-// Always moves: the result is a fresh block that holds what fits of the old one, which is freed. A null pointer gives a
-// plain allocation. When the new block is refused the answer is null and the old block stays as it is. A new size of 0
-// gives what the platform's realloc(pointer, 0) gives.
+// Allocates a new block, copies as much of the old one as fits, and frees the old one. A null pointer makes it a plain
+// allocation. Null when memory is refused; the old block is unchanged then. With a size of 0 the answer is that of the
+// platform's realloc(pointer, 0).
 void* realloc_internal(void* pointer, size_t size, size_t align, MemLabelId label, AllocateOptions options,
                        const char* file, int line);
 
@@ -30,11 +30,11 @@ void free_alloc_internal(void* pointer, MemLabelId label, const char* file, int 
 bool try_to_transfer_between_label(void* pointer, MemLabelId from, MemLabelId to, size_t size, size_t align,
                                    AllocateOptions options, const char* file, int line);
 
-// noexcept, so that no constructor runs on a refused block.
+// noexcept, so that a new expression runs no constructor when memory is refused.
 void* operator new(size_t size, MemLabelId label, size_t align, const char* file, int line) noexcept;
 void operator delete(void* pointer, MemLabelId label, size_t align, const char* file, int line) noexcept;
 
-// A label and the place that names it.
+// A label and the source position of the call that passes it.
 struct MemLabelHere {
     MemLabelHere(MemLabelId id, SourceLocation location = SourceLocation::current()) : label(id), where(location) {}
     MemLabelHere(MemLabelIdentifier id, SourceLocation location = SourceLocation::current())
@@ -49,8 +49,8 @@ template <typename T, typename... Arguments>
     return new (here.label, alignof(T), here.where.file, here.where.line) T(std::forward<Arguments>(arguments)...);
 }
 
-// Destroys what New made (null is allowed) and frees it under its label. T may be a base with a virtual destructor
-// whose object starts where the whole object starts.
+// Destroys an object that New returned and frees it under its label; null is allowed. T may be a base class with a
+// virtual destructor, if it is the first base.
 template <typename T>
 void Delete(T* object, MemLabelHere here) {
     if (object == nullptr) return;
@@ -58,15 +58,23 @@ void Delete(T* object, MemLabelHere here) {
     free_alloc_internal(object, here.label, here.where.file, here.where.line);
 }
 
-// For what can't go on without it: the pointer, or the end of the program when memory was refused.
+// Ends the program unless memory was granted. Sizes that come from a file or a caller are asked for with operations
+// that answer; whoever needs a few bytes to go on asks here, so that nobody writes a way out for a case that never
+// comes.
+inline void RequireMemory(bool isGranted) {
+    if (!isGranted) [[unlikely]]
+        C99Api::Footing_Process_Abort(ZarvoClassic::Footing_ErrorCode_OutOfMemory);
+}
+
+// The same for a pointer, which it returns.
 template <typename T>
 T* RequireMemory(T* pointer) {
-    if (pointer == nullptr) C99Api::Footing_Process_Abort(ZarvoClassic::Footing_ErrorCode_OutOfMemory);
+    RequireMemory(pointer != nullptr);
     return pointer;
 }
 
-// For standard containers: allocates under the label and alignment of its template arguments. Memory that is refused
-// ends the program, as a standard container can't go on without it.
+// For standard containers: allocates with the label and alignment of its template arguments. The program ends when
+// memory is refused, because a standard container can't handle null.
 template <typename T, MemLabelIdentifier label, int align>
 struct stl_allocator {
     using value_type = T;

@@ -1,13 +1,13 @@
 // The global operators new and delete: blocks aligned to 16 bytes or what was asked, null when memory is refused.
-// Every form is replaced. One that is left out would throw, and under the address sanitizer it would be the sanitizer's
-// own, whose blocks only its own delete may free.
-// Linked into the command, the tests and what makes archives for them, and not into the library, so that a program that
-// embeds it keeps its own. Standard containers can't go on from null; the runtime itself uses the labelled form alone.
+// Every form is replaced. A form that is left out would throw, and under the address sanitizer it would be the
+// sanitizer's, whose blocks only the sanitizer's delete may free.
+// Linked into the command, the tests and the archive writer, but not into the library: a program that embeds it keeps
+// its own operators. Standard containers can't handle null; the runtime itself uses only the labelled form.
 #include <algorithm>
 #include <cstdlib>
 #include <new>
 
-// clang's thread sanitizer links a set of its own and refuses a second.
+// clang's thread sanitizer has its own operators and does not link with a second set.
 #if defined(__has_feature)
 #if __has_feature(thread_sanitizer)
 #define VARNEX_KEEP_SANITIZER_NEW
@@ -26,7 +26,7 @@ void* Allocate(size_t size, std::align_val_t alignment = std::align_val_t{16}) {
 
 } // namespace
 
-// Compilers take a form without nothrow for never null, and the undefined behaviour sanitizer holds us to that.
+// Compilers assume that a form without nothrow never returns null, and the undefined behaviour sanitizer checks it.
 #define VARNEX_MAY_BE_NULL __attribute__((no_sanitize("returns-nonnull-attribute")))
 
 VARNEX_MAY_BE_NULL void* operator new(size_t size) { return Allocate(size); }

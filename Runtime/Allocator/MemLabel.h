@@ -1,5 +1,5 @@
-// Memory labels: every allocation names what it is for. All labels share one heap; strings compare labels to
-// decide whether a buffer may change hands, and all containers keep theirs for life.
+// Memory labels: every allocation names its purpose. All labels share one heap. A string hands its buffer over only to
+// a string with the same label, and a container never changes its label.
 #pragma once
 
 #include "Runtime/Core/Types.h"

@@ -1,4 +1,4 @@
-// Base of classes whose objects have an identity: copying is refused by the compiler. Derive privately.
+// A base for classes whose objects can't be copied. Derive privately.
 #pragma once
 
 class NonCopyable {

@@ -1,15 +1,15 @@
-// Objects that are owned together: each holder keeps one reference, and the one that lets go of the last destroys the
-// object. The count starts at 1, which is the maker's.
+// Objects with several owners: each holds one reference, and releasing the last one destroys the object. The count
+// starts at 1, the creator's reference.
 //
 //   T* object = New<T>(label, label, ...);
 //   object->AddRef();    // a second holder
-//   object->Release();   // and so on: the last one frees it under its label
+//   object->Release();   // the last Release frees the object under its label
 //
 //   count    AddRef    Release
-//   1        2         0: destroyed, by the thread that released it; what all holders did before comes before that
+//   1        2         0: this thread destroys the object, after everything that its holders did before their Release
 //   n > 1    n + 1     n - 1
 //
-// AddRef and Release may be called from any thread by a thread that holds a reference.
+// Any thread that holds a reference may call AddRef and Release.
 #pragma once
 
 #include "Runtime/Allocator/Allocator.h"
@@ -35,9 +35,9 @@ public:
     void AddRef() const { refCount.fetch_add(1, std::memory_order_relaxed); }
 
     void Release() const {
-        // Release: our writes come before the last holder's free.
+        // Release: our writes happen before the last holder destroys the object.
         if (refCount.fetch_sub(1, std::memory_order_release) != 1) return;
-        // An acquire load orders as the fence does, and the thread sanitizer follows it.
+        // An acquire load orders as an acquire fence does, and the thread sanitizer understands it.
         (void)refCount.load(std::memory_order_acquire);
         Factory::Destroy(static_cast<T*>(const_cast<SharedObject*>(this)), label);
     }

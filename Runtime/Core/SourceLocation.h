@@ -1,5 +1,5 @@
-// Where a call stands in the source: a default argument of SourceLocation::current() names the caller's file and line.
-// The standard library's own is not to be had with every compiler that builds this.
+// A position in the source: a default argument of SourceLocation::current() is the caller's file and line.
+// Not every compiler that builds this has std::source_location.
 #pragma once
 
 struct SourceLocation {

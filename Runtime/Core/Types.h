@@ -1,5 +1,5 @@
-// The runtime's integer types. They are spelled as the compression libraries' headers spell theirs (64 bits is
-// long long), so that both can be included side by side.
+// The runtime's integer types. They are the same types as in the compression libraries' headers (64 bits is long long),
+// so that both can be included together.
 #pragma once
 
 #include <cstddef>

@@ -58,7 +58,3 @@ void Mutex::Unlock() {
 
     if (before < kHeld) Footing_SystemSemaphore_Release(m_Semaphore, 1);
 }
-
-bool Mutex::IsLockedByCurrentThread() const {
-    return m_Owner.load(std::memory_order_relaxed) == PlatformThread::GetCurrentThreadID();
-}

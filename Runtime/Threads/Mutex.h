@@ -35,11 +35,7 @@ public:
     void Lock() VARNEX_ACQUIRE();
     void Unlock() VARNEX_RELEASE();
 
-    bool IsLockedByCurrentThread() const;
-
 private:
-    friend struct MutexInspector; // tests look at the counter
-
     static constexpr SInt32 kFree = 1;
     static constexpr SInt32 kHeld = 0;
     static constexpr int kSpinRounds = 200;

@@ -1,5 +1,5 @@
-// Clang's thread-safety attributes: members name the lock that guards them and the compiler proves the rule. Other
-// compilers see nothing.
+// Clang's thread-safety attributes: members name the lock that guards them, and the compiler checks it. Other compilers
+// ignore them.
 #pragma once
 
 #if defined(__clang__)

@@ -4,7 +4,7 @@
 #include <bit>
 #include <type_traits>
 
-// The value whose big-endian bytes stored holds; its own inverse.
+// Converts between a value and its big-endian form, in either direction.
 template <typename T>
 constexpr T FromBigEndian(T stored) {
     static_assert(std::is_unsigned_v<T> && (sizeof(T) == 2 || sizeof(T) == 4 || sizeof(T) == 8));

@@ -1,4 +1,4 @@
-// A point in time: 100-nanosecond ticks since 0001-01-01 00:00:00. A default DateTime is 0 ("not known").
+// A point in time: 100-nanosecond ticks since 0001-01-01 00:00:00. The default, 0, means "not known".
 #pragma once
 
 #include "Runtime/Core/Types.h"
@@ -17,7 +17,7 @@ static_assert(kUnixEpochTicks == 0x089F7FF5F7B58000);
 // The time of day (gettimeofday), to the microsecond.
 DateTime GetCurrentTimeAsDateTime();
 
-// Seconds since the Unix epoch to ticks; out of the range of ticks the result wraps.
+// Seconds since the Unix epoch to ticks; a result out of range wraps.
 void UnixTimeToZarvoTime(long seconds, DateTime& time);
 
 // Ticks to seconds since the Unix epoch, rounded toward 1970.

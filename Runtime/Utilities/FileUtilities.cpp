@@ -13,14 +13,12 @@ bool IsFileCreated(string_ref path) { return !path.empty() && FileSystemEntry(Pa
 bool IsPathCreated(string_ref path) { return !path.empty() && FileSystemEntry(PathToAbsolutePath(path)).Exists(); }
 
 bool CreateDirectory(string_ref path) {
-    // Bits of the embedding application; the back ends here give them no meaning.
+    // Bits that mean something to the engine alone; the back ends here ignore them.
     constexpr UInt32 kNewFolderFlagsMask = 0x0B;
     constexpr UInt32 kNewFolderFlags = 0x02;
 
-    bool isLocal;
-    const core::string absolute = GetFileSystem()->ToAbsolute(path, &isLocal);
-    // Of any other path the local back end leaves nothing only when memory is refused.
-    if (absolute.empty()) return !isLocal || path.empty() || path == "~";
+    const core::string absolute = PathToAbsolutePath(path);
+    if (absolute.empty()) return true;
     FileSystemEntry entry(absolute);
     FileEntryInfo info;
     const FileEntryInfoQueryFlags answer =
@@ -28,11 +26,11 @@ bool CreateDirectory(string_ref path) {
     if ((answer & kFileEntryQueryExists) != 0) return (info.flags & kFileEntryIsDirectory) != 0;
 
     if (entry.CreateAsDir()) {
-        (void)entry.SetFlags(kNewFolderFlagsMask, kNewFolderFlags); // the folder is there all the same
+        (void)entry.SetFlags(kNewFolderFlagsMask, kNewFolderFlags); // the folder exists either way
         return true;
     }
-    const core::string error = GetFileSystem()->LastErrorMessage(); // of this call: the next may change it
-    // Somebody else may have made it meanwhile.
+    const core::string error = GetFileSystem()->LastErrorMessage(); // now: the next call may change it
+    // Another process may have made it meanwhile.
     if (entry.lastError == kFileSystemErrorAlreadyExists && entry.IsDir()) return true;
     printf_console("CreateDirectory '%s' failed: %s (current dir: %s)\n", absolute.c_str(), error.c_str(),
                    GetFileSystem()->CurrentDirectory().c_str());
@@ -49,7 +47,7 @@ bool CreateDirectoryRecursive(string_ref path) {
 
 bool DeleteFileOrDirectory(string_ref path) {
     const core::string absolute = PathToAbsolutePath(path);
-    // Cut, the path would name something else.
+    // A longer path would be cut, and name something else.
     return absolute.size() <= kMaxPathLength && GetFileSystem()->Delete(absolute, true);
 }
 
@@ -59,7 +57,8 @@ bool GetFolderContentsAtPath(string_ref path, FileEnumerationFlag flags, FolderC
                              FolderContentsPathMode mode, const core::string& base, bool recursive) {
     FileSystemEntry entry(PathToAbsolutePath(path));
     dynamic_block_array<FileEntryInfo, 32> list(kMemLabelFileList);
-    (void)GetFileSystem()->Enumerate(entry.Path(), &list, recursive, flags); // what could be listed is taken
+    (void)GetFileSystem()->Enumerate(entry.Path(), &list, recursive,
+                                     flags); // a failed listing counts as far as it went
     const core::string currentDirectory = GetFileSystem()->CurrentDirectory();
     for (size_t index = 0; index < list.size(); ++index) {
         const string_ref listed(list[index].path);

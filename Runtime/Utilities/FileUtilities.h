@@ -1,5 +1,5 @@
-// One-call questions and changes to folders and files. Paths are made absolute through the registry and reach the
-// handler that claims them. Any thread, once the registry exists.
+// Questions about files and folders, and changes to them, in one call each. Paths are made absolute through the
+// registry and served by the handler that claims them. Any thread, once the registry exists.
 #pragma once
 
 #include "Runtime/Allocator/Allocator.h"
@@ -9,40 +9,40 @@
 #include <functional>
 #include <set>
 
-// How GetFolderContentsAtPath writes the paths that it collects; other values collect nothing.
+// What the paths that GetFolderContentsAtPath collects are relative to; other values collect nothing.
 enum FolderContentsPathMode : SInt32 {
     kFolderContentsRelativeToCurrentDirectory = 0, // the file system's, not the process's
     kFolderContentsRelativeToBase = 1,
     kFolderContentsAbsolute = 2,
 };
 
-using FolderContents = std::set<core::basic_string<char>, std::less<core::basic_string<char>>,
-                                stl_allocator<core::basic_string<char>, kMemLabelGeneral, 16>>;
+using FolderContents =
+    std::set<core::string, std::less<core::string>, stl_allocator<core::string, kMemLabelGeneral, 16>>;
 
-core::basic_string<char> PathToAbsolutePath(core::basic_string_ref<char> path);
+core::string PathToAbsolutePath(core::string_ref path);
 
-// An empty path stands for the current directory as a folder, and for nothing as a file or path.
-bool IsDirectoryCreated(core::basic_string_ref<char> path);
-bool IsFileCreated(core::basic_string_ref<char> path);
-bool IsPathCreated(core::basic_string_ref<char> path);
+// An empty path names the current directory for IsDirectoryCreated, and nothing for the other two.
+bool IsDirectoryCreated(core::string_ref path);
+bool IsFileCreated(core::string_ref path);
+bool IsPathCreated(core::string_ref path);
 
-// True when the folder is there afterwards, and for a path that a handler makes nothing of. A failed creation prints
-// one message; a file in the way does not.
-bool CreateDirectory(core::basic_string_ref<char> path);
+// True when the folder exists afterwards, and for a path whose absolute form is empty. If the folder can't be created,
+// one message is printed, except when a file is in the way.
+[[nodiscard]] bool CreateDirectory(core::string_ref path);
 
-// The same for a folder and every folder above it that is missing, outermost first. Recurses once a component: the path
-// must be of a length that an entry can hold.
-bool CreateDirectoryRecursive(core::basic_string_ref<char> path);
+// The same for a folder and its missing parents, outermost first. Recurses once per component, so path must be short
+// enough for an entry (kMaxPathLength).
+[[nodiscard]] bool CreateDirectoryRecursive(core::string_ref path);
 
-// A folder with all that it holds. False for a path longer than an entry can hold, which would be cut.
-bool DeleteFileOrDirectory(core::basic_string_ref<char> path);
+// Deletes a file, or a folder with its contents. False for a path above kMaxPathLength, which would be cut.
+[[nodiscard]] bool DeleteFileOrDirectory(core::string_ref path);
 
-// Whether somebody holds a lock on the file, or on one in the folder. The path is taken as given.
-bool IsFileOrDirectoryInUse(core::basic_string_ref<char> path);
+// Whether the file, or one directly in the folder, is locked or can't be opened. path is not made absolute.
+bool IsFileOrDirectoryInUse(core::string_ref path);
 
-// Adds what the folder holds to out. Always true: what can't be listed is just missing. base matters to
-// kFolderContentsRelativeToBase alone.
-bool GetFolderContentsAtPath(core::basic_string_ref<char> path, FileEnumerationFlag flags, FolderContents& out,
-                             FolderContentsPathMode mode, const core::basic_string<char>& base, bool recursive);
-bool GetFolderContentsAtPath(core::basic_string_ref<char> path, FolderContents& out, FolderContentsPathMode mode,
-                             const core::basic_string<char>& base, bool recursive);
+// Adds the paths of the folder's contents to out. Always true: what can't be listed is missing from out. Only
+// kFolderContentsRelativeToBase uses base.
+bool GetFolderContentsAtPath(core::string_ref path, FileEnumerationFlag flags, FolderContents& out,
+                             FolderContentsPathMode mode, const core::string& base, bool recursive);
+bool GetFolderContentsAtPath(core::string_ref path, FolderContents& out, FolderContentsPathMode mode,
+                             const core::string& base, bool recursive);

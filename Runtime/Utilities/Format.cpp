@@ -4,14 +4,14 @@
 #include <cstdarg>
 #include <cstdio>
 
-core::basic_string<char> Format(const char* format, ...) {
+core::string Format(const char* format, ...) {
     char buffer[10'240];
     va_list arguments;
     va_start(arguments, format);
     const int wanted = vsnprintf(buffer, sizeof(buffer), format, arguments);
     va_end(arguments);
 
-    if (wanted < 0) return core::basic_string<char>(MemLabelId(kMemLabelGeneral));
+    if (wanted < 0) return core::string(kMemLabelGeneral);
     const size_t length = std::min(static_cast<size_t>(wanted), sizeof(buffer) - 1);
-    return core::basic_string<char>(core::string_ref(buffer, length), kMemLabelGeneral);
+    return core::string(core::string_ref(buffer, length), kMemLabelGeneral);
 }

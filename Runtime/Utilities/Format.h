@@ -3,5 +3,5 @@
 
 #include "Runtime/Core/Containers/String.h"
 
-// The result carries kMemLabelGeneral; one longer than 10,239 characters is cut there.
-[[gnu::format(printf, 1, 2)]] core::basic_string<char> Format(const char* format, ...);
+// The result has the label kMemLabelGeneral and is cut after 10,239 characters.
+[[gnu::format(printf, 1, 2)]] core::string Format(const char* format, ...);

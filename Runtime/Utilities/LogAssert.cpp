@@ -5,7 +5,7 @@
 
 #include <cstring>
 
-// Constant-initialised, so that static objects may log before this file's turn has come.
+// Constant-initialised, so that static objects may log before this file's objects are constructed.
 constinit StackTraceLogType gStackTraceLogType[kLogTypeCount] = {
     kStackTracePreprocessed, // error
     kStackTracePreprocessed, // assert
@@ -23,30 +23,43 @@ constinit std::atomic<FILE*> gConsoleFile{nullptr};
 
 namespace {
 
-// What a record is, for the stack-trace table and the handlers; the first row that matches, else a log.
-struct ClassificationRow {
+// The type of a mode that has any of the bits.
+struct ModeRow {
     UInt32 anyOf;
     LogType type;
 };
-constexpr ClassificationRow kClassification[] = {
-    {0x20000, kLogTypeException},
-    {0x951, kLogTypeError},
-    {0x200002, kLogTypeAssert},
-    {0x1280, kLogTypeWarning},
+
+// What a record is, for the stack-trace table and the handlers; a log without a match.
+constexpr ModeRow kClassification[] = {
+    {.anyOf = 0x20000, .type = kLogTypeException},
+    {.anyOf = 0x951, .type = kLogTypeError},
+    {.anyOf = 0x200002, .type = kLogTypeAssert},
+    {.anyOf = 0x1280, .type = kLogTypeWarning},
 };
 
-LogType Classify(UInt32 mode) {
-    for (const ClassificationRow& row : kClassification)
+// The type that a record is printed as, by other masks than it is classified by; an error without a match.
+constexpr ModeRow kConsoleTypes[] = {
+    {.anyOf = 0x404, .type = kLogTypeLog},
+    {.anyOf = 0x280, .type = kLogTypeWarning},
+    {.anyOf = 0x200002, .type = kLogTypeAssert},
+};
+
+// The first row that matches decides.
+template <size_t kCount>
+LogType FindType(const ModeRow (&rows)[kCount], UInt32 mode, LogType withoutMatch) {
+    for (const ModeRow& row : rows)
         if ((mode & row.anyOf) != 0) return row.type;
-    return kLogTypeLog;
+    return withoutMatch;
 }
+
+LogType Classify(UInt32 mode) { return FindType(kClassification, mode, kLogTypeLog); }
 
 StackTraceLogType StackTraceOf(LogType type) { return gStackTraceLogType[type]; }
 
 FILE* ConsoleFile() {
     FILE* file = gConsoleFile.load(std::memory_order_acquire);
     if (file != nullptr || stdout == nullptr) return file;
-    // Two first printers: both set the same, and neither overwrites a stream that was installed meanwhile.
+    // Two threads that print first set the same stream, and neither overwrites one that was installed meanwhile.
     if (gConsoleFile.compare_exchange_strong(file, stdout, std::memory_order_acq_rel, std::memory_order_acquire))
         return stdout;
     return file;
@@ -54,7 +67,7 @@ FILE* ConsoleFile() {
 
 void PrintToConsole(LogType type, const char* format, va_list arguments) {
     if (gCurrentLogEntryHandler != nullptr) {
-        va_list handlerArguments; // reading a list uses it up, and it is needed again below
+        va_list handlerArguments; // reading a list uses it up, and vfprintf reads it again below
         va_copy(handlerArguments, arguments);
         const bool isWanted = gCurrentLogEntryHandler(type, format, handlerArguments);
         va_end(handlerArguments);
@@ -62,46 +75,16 @@ void PrintToConsole(LogType type, const char* format, va_list arguments) {
     }
     FILE* file = ConsoleFile();
     if (file == nullptr) return;
-    (void)vfprintf(file, format, arguments); // a console that takes nothing: there is nobody left to tell
+    (void)vfprintf(file, format, arguments); // a failed print can't be reported anywhere
     (void)fflush(file);
 }
 
-[[gnu::format(printf, 1, 2)]] void InternalLogConsoleWithNewline(const char* format, ...) {
+// The text ends with its own newline.
+[[gnu::format(printf, 2, 3)]] void InternalConsoleWithNewline(LogType type, const char* format, ...) {
     va_list arguments;
     va_start(arguments, format);
-    PrintToConsole(kLogTypeLog, format, arguments);
+    PrintToConsole(type, format, arguments);
     va_end(arguments);
-}
-
-[[gnu::format(printf, 1, 2)]] void InternalWarningConsoleWithNewline(const char* format, ...) {
-    va_list arguments;
-    va_start(arguments, format);
-    PrintToConsole(kLogTypeWarning, format, arguments);
-    va_end(arguments);
-}
-
-[[gnu::format(printf, 1, 2)]] void InternalAssertConsoleWithNewline(const char* format, ...) {
-    va_list arguments;
-    va_start(arguments, format);
-    PrintToConsole(kLogTypeAssert, format, arguments);
-    va_end(arguments);
-}
-
-[[gnu::format(printf, 1, 2)]] void InternalErrorConsoleWithNewline(const char* format, ...) {
-    va_list arguments;
-    va_start(arguments, format);
-    PrintToConsole(kLogTypeError, format, arguments);
-    va_end(arguments);
-}
-
-using ConsoleFunction = void (*)(const char* format, ...);
-
-// How a record is printed; not the masks that classify it.
-ConsoleFunction ChooseConsoleFunction(UInt32 mode) {
-    if ((mode & 0x404) != 0) return InternalLogConsoleWithNewline;
-    if ((mode & 0x280) != 0) return InternalWarningConsoleWithNewline;
-    if ((mode & 0x200002) != 0) return InternalAssertConsoleWithNewline;
-    return InternalErrorConsoleWithNewline;
 }
 
 void TellCleanLogHandlers(LogType type, const DebugStringToFileData& data) {
@@ -117,17 +100,19 @@ void TellCleanLogHandlers(LogType type, const DebugStringToFileData& data) {
     CleanLogHandler(type, "Assertion failed: %s\n\n", text.c_str());
 }
 
-// Borrows text; it is copied only when something must be added.
+// Borrows text; it is copied only when a newline is added.
 core::string ConsoleText(const char* text) {
     core::string result = core::string::wrap(text, kMemLabelGeneral);
     PlatformLogAssert::AvoidDoubleNewlineTranslation(result);
     return result;
 }
 
-// False, and the text is as it was, when memory for the newline is refused.
+// A text is as long as its reporter makes it. False, and the text is unchanged, when memory for the newline is refused.
 bool EndWithNewline(core::string* text) {
-    if (text->empty() || text->back() != '\n') text->push_back('\n');
-    return text->back() == '\n';
+    if (!text->empty() && text->back() == '\n') return true;
+    if (text->grow(text->size() + 1) == nullptr) return false;
+    text->push_back('\n');
+    return true;
 }
 
 bool HasStackTraceForConsole(LogType type, const DebugStringToFileData& data) {
@@ -177,9 +162,9 @@ void ReportError(const char* message, SourceLocation where) {
 void DebugStringToFile(const DebugStringToFileData& data) {
     const LogType type = Classify(data.mode);
     DebugStringToFileData copy = data;
-    core::string file{MemLabelId(kMemLabelGeneral)};
-    core::string shortStackTrace{MemLabelId(kMemLabelGeneral)};
-    core::string stackTrace{MemLabelId(kMemLabelGeneral)};
+    core::string file(kMemLabelGeneral);
+    core::string shortStackTrace(kMemLabelGeneral);
+    core::string stackTrace(kMemLabelGeneral);
 
     if ((data.mode & kLogModeNoStackTrace) == 0) {
         const StackTraceLogType wanted = StackTraceOf(type);
@@ -208,22 +193,23 @@ void DebugStringToFilePostprocessedStacktrace(const DebugStringToFileData& data)
     const LogType type = Classify(data.mode);
     TellCleanLogHandlers(type, data);
 
-    const ConsoleFunction print = ChooseConsoleFunction(data.mode);
+    const LogType console = FindType(kConsoleTypes, data.mode, kLogTypeError);
     core::string message = ConsoleText(data.message);
     if (!EndWithNewline(&message)) {
         // The next report must not land on this line.
-        print("%s\n", message.c_str());
+        InternalConsoleWithNewline(console, "%s\n", message.c_str());
         message.clear();
     }
     if (HasStackTraceForConsole(type, data)) {
         core::string stackTrace = ConsoleText(data.stackTrace[0] == '\n' ? data.stackTrace + 1 : data.stackTrace);
         (void)EndWithNewline(&stackTrace); // without it a blank line is missing
         if (HasSourcePositionForConsole(data))
-            print("%s%s\n(Filename: %s Line: %i)\n\n", message.c_str(), stackTrace.c_str(), data.file, data.line);
+            InternalConsoleWithNewline(console, "%s%s\n(Filename: %s Line: %i)\n\n", message.c_str(),
+                                       stackTrace.c_str(), data.file, data.line);
         else
-            print("%s%s\n", message.c_str(), stackTrace.c_str());
+            InternalConsoleWithNewline(console, "%s%s\n", message.c_str(), stackTrace.c_str());
     } else if (!message.empty()) {
-        print("%s", message.c_str());
+        InternalConsoleWithNewline(console, "%s", message.c_str());
     }
 
     if (gLogToConsoleFunc != nullptr) gLogToConsoleFunc(data);
@@ -236,7 +222,7 @@ void CleanLogHandler(LogType type, const char* format, ...) {
     const CleanLogEntryHandlerNode* anchor = gCleanLogEntryHandlers;
     if (anchor == nullptr) return;
     for (const CleanLogEntryHandlerNode* node = anchor->next; node != anchor; node = node->next) {
-        va_list arguments; // anew for each: reading a list uses it up
+        va_list arguments; // one per handler: reading a list uses it up
         va_start(arguments, format);
         node->function(type, format, arguments);
         va_end(arguments);

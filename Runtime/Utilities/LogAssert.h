@@ -1,12 +1,12 @@
-// The log sink: console output, reported errors and failed checks. Nothing here stops the program (but a record that
-// carries the fatal bit does), and nothing here fails: without a standard output the texts are dropped.
+// The log sink: console output, reported errors and failed checks. No function reports failure: without a standard
+// output the texts are dropped. The program goes on after a report, unless the record has the fatal bit.
 //
 //   printf_console("  data size: %llu bytes\n", size);      // text as it is
 //   ReportError(Format("Unable to open ...: %s", path).c_str());
 //   if (!Check(type < kCompressionCount, "Assertion failed on expression: 't < kCompressionCount'")) return nullptr;
 //
 // Every function may be called from any thread. The hooks at the end are installed before other threads start.
-// Only plain C types are used, so that the containers, which the sink itself is built on, can report through it.
+// This header uses only plain C types, so that the containers, which the sink is built on, can report through it.
 #pragma once
 
 #include "Runtime/Core/SourceLocation.h"
@@ -24,13 +24,13 @@ enum LogType : SInt32 {
 };
 constexpr int kLogTypeCount = 6;
 
-// Bits of DebugStringToFileData::mode. The sink tests groups of them; these are the ones with a meaning of their own.
+// Bits of DebugStringToFileData::mode that have a meaning on their own. The sink also tests groups of bits.
 enum LogMode : UInt32 {
     kLogModeError = 0x1,
     kLogModeAssert = 0x2,
-    kLogModeFatal = 0x10,                  // the process is stopped once the record is out
+    kLogModeFatal = 0x10,                  // the process is stopped after the record is printed
     kLogModeForceStackTrace = 0x300,       // the trace goes to the console even where the table says none
-    kLogModeNoStackTrace = 0x40000,        // both traces are emptied
+    kLogModeNoStackTrace = 0x40000,        // both traces are empty
     kLogModeKeepStackTrace = 0x400000,     // the caller's traces are kept
     kLogModeShowSourcePosition = 0x800000, // file and line follow the trace
 };
@@ -38,7 +38,7 @@ enum LogMode : UInt32 {
 // One report. Texts are the caller's, never null, and must outlive the call.
 struct DebugStringToFileData {
     const char* message = "";
-    const char* auxiliaryText = "";   // carried along
+    const char* auxiliaryText = "";   // for the embedding application; the sink does not read it
     const char* shortStackTrace = ""; // added to assertion texts for the clean log handlers
     const char* stackTrace = "";      // printed after the message
     const char* file = "";
@@ -47,7 +47,7 @@ struct DebugStringToFileData {
     UInt32 mode = 0;
     SInt32 identifier = 0;
 
-    // Carried for the embedding application; the sink does not read them.
+    // For the embedding application; the sink does not read these.
     SInt32 reserved0 = 0;
     UInt64 reserved1 = 0;
     bool reserved2 = true;
@@ -62,10 +62,11 @@ struct DebugStringToFileData {
 
 void DebugStringToFile(const DebugStringToFileData& data);
 
-// The sink's second stage: the stack traces of data are final.
+// The sink's second stage: prints data with the stack traces that it has.
 void DebugStringToFilePostprocessedStacktrace(const DebugStringToFileData& data);
 
-// Reports a failed check with its complete text; always 1. The caller goes on, so this is never the guard itself.
+// Reports a failed check with its complete text and returns 1. The program goes on, so the caller still has to handle
+// the case.
 int AssertImplementation(int identifier, const char* file, int line, int column, const char* message);
 
 // Reports message as a failed check at the caller's position.
@@ -73,7 +74,7 @@ inline void ReportFailedCheck(const char* message, SourceLocation where = Source
     AssertImplementation(0, where.file, where.line, -1, message);
 }
 
-// The answer is condition; when it is false, message is reported as a failed check at the caller's position.
+// Returns condition. If it is false, reports message as a failed check at the caller's position.
 inline bool Check(bool condition, const char* message, SourceLocation where = SourceLocation::current()) {
     if (!condition) [[unlikely]]
         ReportFailedCheck(message, where);
@@ -83,14 +84,14 @@ inline bool Check(bool condition, const char* message, SourceLocation where = So
 // Reports message as an error at the caller's position.
 void ReportError(const char* message, SourceLocation where = SourceLocation::current());
 
-// Tells the clean log handlers, in list order, under g_LogHandlerListMutex.
+// Calls the clean log handlers in list order, under g_LogHandlerListMutex.
 [[gnu::format(printf, 2, 3)]] void CleanLogHandler(LogType type, const char* format, ...);
 
 // Which stack trace accompanies a type of record.
 enum StackTraceLogType : SInt32 {
     kStackTraceNone = 0,
     kStackTracePreprocessed = 1, // what gPreprocessor makes, or none
-    kStackTraceNative = 2,       // not to be had on this platform, and said so
+    kStackTraceNative = 2,       // a text that says that this platform can't make one
 };
 extern StackTraceLogType gStackTraceLogType[kLogTypeCount];
 

@@ -1,4 +1,4 @@
-// The log sink's parts for an embedding application that need more than plain C types; the rest is in LogAssert.h.
+// The hooks of the log sink that need more than plain C types; the others are in LogAssert.h.
 //
 //   Mutex::AutoLock lock(g_LogHandlerListMutex);
 //   node.next = gCleanLogEntryHandlers->next;   // the anchor is the application's
@@ -13,31 +13,31 @@
 #include <atomic>
 #include <cstdio>
 
-// Held while the clean log handlers are called; it is recursive, so that a handler may log. Constructed before any
-// static object of a program and destroyed after them.
+// Held while the clean log handlers are called. It is recursive, so that a handler may log. It is constructed before
+// the static objects of any program and destroyed after them.
 extern Mutex g_LogHandlerListMutex;
 
-// A node of the circular list of clean log handlers. A handler does not change the list.
+// A node of the circular list of clean log handlers. A handler must not change the list.
 struct CleanLogEntryHandlerNode {
     CleanLogEntryHandlerNode* next;
-    void (*function)(LogType type, const char* format, va_list arguments); // of the anchor: not called
+    void (*function)(LogType type, const char* format, va_list arguments); // the anchor's is not called
 };
 
 // The list's anchor; null when there is no list.
 extern CleanLogEntryHandlerNode* gCleanLogEntryHandlers VARNEX_GUARDED_BY(g_LogHandlerListMutex);
 
-// Makes the two stack traces of a record whose type asks for kStackTracePreprocessed; all three texts come empty. A
-// file text that is not empty afterwards takes the place of the record's; *line comes as the record's and may be
-// changed. Any thread; installed before other threads start.
+// Writes the two stack traces of a record whose type has kStackTracePreprocessed. The three texts are empty at the
+// call. A *file that is not empty afterwards replaces the record's file; *line is the record's line and may be changed.
+// Called on any thread; installed before other threads start.
 using StackTracePreprocessor = void (*)(const DebugStringToFileData& data, core::string* shortStackTrace,
                                         core::string* stackTrace, core::string* file, SInt32* line);
 extern StackTracePreprocessor gPreprocessor;
 
-// Where the console functions print. Null until the first print sets it to standard output; may be set at any time to
-// a stream that outlives all prints.
+// The stream that the console functions print to. Null until the first print sets it to standard output. May be set at
+// any time to a stream that outlives all prints.
 extern std::atomic<FILE*> gConsoleFile;
 
 namespace PlatformLogAssert {
-// Takes back the doubling of newlines that some consoles cause; on this platform the text stays as it is.
+// Undoes the doubling of newlines on platforms whose consoles double them; here the text is left unchanged.
 void AvoidDoubleNewlineTranslation(core::string& text);
 } // namespace PlatformLogAssert

@@ -5,7 +5,7 @@
 using core::string_ref;
 
 void AppendPathNameImpl(string_ref base, string_ref tail, char separator, core::string& out) {
-    // Half a path would name something else.
+    // Reserved at once: a path cut short would name something else.
     if (out.grow(base.size() + tail.size() + 1) == nullptr) return;
     out += base;
     if (!base.empty() && !tail.empty()) {

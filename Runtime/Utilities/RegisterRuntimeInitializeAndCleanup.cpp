@@ -31,14 +31,9 @@ bool Registration::Sort(const Registration* a, const Registration* b) {
     return std::less<const Registration*>()(a, b); // < itself is not defined between unrelated objects
 }
 
-// In the order of start-up; empty when memory is refused.
+// In the order of start-up.
 dynamic_array<Registration*> Registration::Collect(MemLabelId label) {
     dynamic_array<Registration*> registrations(label);
-    size_t count = 0;
-    for (const Registration* each = s_LastRegistered; each != nullptr; each = each->older)
-        ++count;
-    registrations.reserve(count);
-    if (registrations.capacity() < count) return registrations;
     for (Registration* each = s_LastRegistered; each != nullptr; each = each->older)
         registrations.push_back(each);
     std::sort(registrations.begin(), registrations.end(), Sort);

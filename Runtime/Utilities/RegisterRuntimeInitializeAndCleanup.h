@@ -1,5 +1,5 @@
-// The registry of what runs first and last in main. A registration is a static object; it is linked in from its
-// construction to its destruction.
+// Callbacks that main runs first and last. A registration is a static object that is in the list from its construction
+// to its destruction.
 //
 //   static RegisterRuntimeInitializeAndCleanup gFontsInitAndCleanup(InitFonts, CleanupFonts, 10);
 //   ...
@@ -17,20 +17,19 @@ class RegisterRuntimeInitializeAndCleanup : private NonCopyable {
 public:
     using CallbackFunction = void (*)(void* userData);
 
-    // Lower orders start earlier and are cleaned up later. Either callback may be null. callbackData is passed to
-    // both.
+    // Registrations with lower orders are initialized earlier and cleaned up later. Either callback may be null.
+    // callbackData is passed to both.
     RegisterRuntimeInitializeAndCleanup(CallbackFunction initCallback, CallbackFunction cleanupCallback,
                                         SInt32 sortOrder = 0, void* callbackData = nullptr);
     ~RegisterRuntimeInitializeAndCleanup();
 
-    // Whether a runs before b at start-up: by order, then by the objects' addresses.
+    // Whether a is initialized before b: the lower order first, then the lower address.
     static bool Sort(const RegisterRuntimeInitializeAndCleanup* a, const RegisterRuntimeInitializeAndCleanup* b);
 
-    // Runs the init callbacks of those that are not initialized, so that a second call has no effect. When memory is
-    // refused, nothing runs, nor does it at the end.
+    // Runs the init callbacks of the registrations that are not initialized; a second call therefore has no effect.
     static void ExecuteInitializations();
 
-    // Runs the cleanup callbacks of those that are initialized, in the reverse order. A second call has no effect.
+    // Runs the cleanup callbacks of the initialized ones in reverse order. A second call has no effect.
     static void ExecuteCleanup();
 
 private:
@@ -42,7 +41,7 @@ private:
     void* const userData;
     const CallbackFunction init;
     const CallbackFunction cleanup;
-    bool initialized; // the start-up callback has run, or would have if there were one
+    bool initialized; // also without an init callback
     RegisterRuntimeInitializeAndCleanup* older;
     RegisterRuntimeInitializeAndCleanup* newer;
 };

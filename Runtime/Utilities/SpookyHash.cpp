@@ -1,5 +1,5 @@
-// The algorithm is Bob Jenkins' SpookyHash V2, which he gave to the public domain; the rotations and the order of steps
-// are his, as published. Here its unrolled rounds are loops over their rotation counts.
+// Bob Jenkins' SpookyHash V2, which is in the public domain: the rotations and the order of steps are as published. His
+// unrolled rounds are loops over the rotation counts here.
 #include "Runtime/Utilities/SpookyHash.h"
 
 #include <bit>
@@ -7,7 +7,7 @@
 
 namespace {
 
-// Odd, not a regular mix of bits, and never 0: what the state starts with besides the seeds.
+// Fills the words of the initial state that hold no seed. Odd, irregular in its bits, and not 0.
 constexpr UInt64 kFiller = 0xDEADBEEFDEADBEEF;
 
 constexpr size_t kLongVariables = 12;
@@ -16,7 +16,7 @@ constexpr size_t kShortLimit = 2 * kLongBlockSize; // shorter messages take the 
 constexpr size_t kShortBlockSize = 4 * sizeof(UInt64);
 static_assert(kShortLimit == 192);
 
-// The words of a message, which need not be aligned.
+// The index-th word of a message, which need not be aligned.
 UInt64 WordAt(const UInt8* bytes, size_t index) {
     static_assert(std::endian::native == std::endian::little, "words of a message are little-endian");
     UInt64 word;

@@ -5,7 +5,7 @@
 
 class SpookyHash {
 public:
-    // *hash1 and *hash2 are the seeds on entry and the two halves of the hash on return. message may be null when
-    // length is 0.
+    // *hash1 and *hash2 hold the two seeds at the call and the two halves of the hash afterwards. message may be null
+    // when length is 0.
     static void Hash128(const void* message, size_t length, UInt64* hash1, UInt64* hash2);
 };

@@ -1,8 +1,8 @@
 // The handler interface: what a back end of the virtual file system supplies. FileAccessorHandler reads and writes
-// the contents of an opened entry; FileSystemHandler adds everything else that can be asked of a path.
+// the contents of an open entry; FileSystemHandler adds every other operation on a path.
 //
 // Every operation receives an entry whose handler (for the content operations, accessorHandler) is the object itself.
-// Failure is a false, empty or zero result; operations that say so leave a code in the entry's lastError. The order of
+// On failure the result is false, empty or zero, and some handlers leave a code in the entry's lastError. The order of
 // the virtual operations is fixed.
 #pragma once
 
@@ -21,12 +21,12 @@ public:
 
     virtual bool Open(FileEntryData& entry, FilePermission permission, FileAutoBehavior behavior) = 0;
 
-    // Both Reads store the count delivered in *actual; a count below size is a success.
+    // Both Reads store the bytes read in *actual; fewer than size are a success.
     virtual bool Read(FileEntryData& entry, VFS::FileSize position, UInt64 size, void* buffer, UInt64* actual,
                       FileReadFlags flags) = 0;
     virtual bool Read(FileEntryData& entry, UInt64 size, void* buffer, UInt64* actual, FileReadFlags flags) = 0;
 
-    // Both Writes store the count taken in *written; a count below size is a success.
+    // Both Writes store the bytes taken in *written; fewer than size are a success.
     virtual bool Write(FileEntryData& entry, VFS::FileSize position, UInt64 size, const void* buffer,
                        UInt64* written) = 0;
     virtual bool Write(FileEntryData& entry, UInt64 size, const void* buffer, UInt64* written) = 0;
@@ -38,7 +38,7 @@ public:
     virtual VFS::FileSize Size(const FileEntryData& entry) const = 0;
 };
 
-// A 16-byte identifier of an asset; all zero where a handler knows none.
+// A 16-byte identifier of an asset; all zero means none.
 struct AssetGUID {
     UInt8 bytes[16] = {};
 
@@ -48,18 +48,18 @@ struct AssetGUID {
 class FileSystemHandler : public FileAccessorHandler {
 public:
     // Whether this handler serves path; asked from the last registered handler to the first.
-    virtual bool CanHandle(core::basic_string_ref<char> path) const = 0;
-    virtual core::basic_string<char> ToAbsolute(core::basic_string_ref<char> path) const = 0;
-    virtual bool IsAbsoluteFilePath(core::basic_string_ref<char> path) const = 0;
+    virtual bool CanHandle(core::string_ref path) const = 0;
+    virtual core::string ToAbsolute(core::string_ref path) const = 0;
+    virtual bool IsAbsoluteFilePath(core::string_ref path) const = 0;
 
-    // Binds an entry to this handler, and lets go of one.
+    // Bind an entry to this handler, and undo that.
     virtual void InitializeFileEntry(FileEntryData& entry) = 0;
     virtual void DestroyFileEntry(FileEntryData& entry) = 0;
 
     virtual const char* Name() = 0;
 
     // The folder part of the entry's path; false (parent unchanged) when it has none.
-    virtual bool Parent(const FileEntryData& entry, core::basic_string<char>& parent) const = 0;
+    virtual bool Parent(const FileEntryData& entry, core::string& parent) const = 0;
     // The last component: a pointer into the entry's path.
     virtual const char* Filename(const FileEntryData& entry) const = 0;
 
@@ -71,18 +71,18 @@ public:
     virtual DateTime LastModified(const FileEntryData& entry) const = 0;
     virtual bool IsLocked(const FileEntryData& entry) = 0;
 
-    // A hash of the contents that costs less than reading them; false when there is none.
+    // A hash of the contents that is cheaper than reading them; false when the handler has none.
     virtual bool HasFastHash(const FileEntryData&, Hash128&) { return false; }
 
-    // Sets the FileEntryFlags in mask to those in flags, as far as the platform keeps them.
+    // Sets the FileEntryFlags that mask names to their values in flags, as far as the platform stores them.
     virtual bool SetFlags(FileEntryData& entry, UInt32 mask, UInt32 flags) = 0;
     virtual bool CreateAsFile(FileEntryData& entry) = 0;
     virtual bool CreateAsDir(FileEntryData& entry) = 0;
     virtual bool Delete(FileEntryData& entry, bool recursive) = 0;
 
-    // Without a trash to move to, the entry is deleted, and the answer is true whatever became of that.
+    // By default there is no trash: the entry is deleted, and the answer is true even if that fails.
     virtual bool MoveToTrash(FileEntryData& entry) {
-        (void)Delete(entry, true); // the answer does not depend on it
+        (void)Delete(entry, true);
         return true;
     }
 
@@ -94,16 +94,16 @@ public:
     virtual AssetGUID GetAssetGUID(const FileEntryData&) const { return {}; }
     virtual bool MakeLocal(FileEntryData& entry, bool flag) = 0;
 
-    // Where on the local disk the entry's contents lie: a file and a range of it.
-    virtual bool ToLocal(const FileEntryData& entry, core::basic_string<char>& path, VFS::FileSize& offset,
+    // The file on the local disk that holds the entry's contents, and the range of it; false when there is none.
+    virtual bool ToLocal(const FileEntryData& entry, core::string& path, VFS::FileSize& offset,
                          VFS::FileSize& size) const = 0;
 
-    // Appends what the folder holds to *out, or, with kFileEnumerationSumSizes, adds the files' sizes to the counter
-    // that *handlerData points to.
+    // Appends the entries of the folder to *out. With kFileEnumerationSumSizes it adds the sizes of the files to the
+    // UInt64 that *handlerData points to instead.
     virtual bool Enumerate(const char* path, dynamic_block_array<FileEntryInfo, 32>* out, bool recursive,
                            void** handlerData, FileEnumerationFlag flags) const = 0;
 
-    // Fills the fields of info that query names; the answer says which were filled.
+    // Fills the fields of info that query names, and returns which ones were filled.
     virtual FileEntryInfoQueryFlags GetFileEntryInfo(const FileEntryData& entry, FileEntryInfo& info,
                                                      FileEntryInfoQueryFlags query) const = 0;
 
@@ -111,10 +111,10 @@ public:
     virtual bool SetFileTimeStamp(FileEntryData& entry, const DateTime& time) = 0;
     virtual bool Exists(const FileEntryData& entry) const = 0;
 
-    // Not to be had here: reported, lastError kFileSystemErrorNotSupported, false.
+    // Not implemented: reports that, leaves kFileSystemErrorNotSupported in lastError and returns false.
     virtual bool CreateFileWithContentAtomically(const FileEntryData& entry, const void* data, UInt64 size) const;
 
-    virtual bool CanConvertToAbsolutePath(core::basic_string_ref<char> path) const = 0;
-    virtual core::basic_string<char> ToPhysicalPath(const core::basic_string<char>&) const { return {}; }
-    virtual core::basic_string<char> ToLogicalPath(const core::basic_string<char>&) const { return {}; }
+    virtual bool CanConvertToAbsolutePath(core::string_ref path) const = 0;
+    virtual core::string ToPhysicalPath(const core::string&) const { return {}; }
+    virtual core::string ToLogicalPath(const core::string&) const { return {}; }
 };

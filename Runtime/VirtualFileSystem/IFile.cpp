@@ -7,14 +7,14 @@ static IFile* GetOpenFile(const FileEntryData& entry) { return static_cast<IFile
 IFileAdapter::IFileAdapter(IFile* servedFile, MemLabelId memLabel, bool owns)
     : file(servedFile), label(memLabel), ownsFile(owns) {}
 
-// The file keeps the permission that it was made with.
+// The permission is ignored: the file keeps the one that it was made with.
 bool IFileAdapter::Open(FileEntryData& entry, FilePermission, FileAutoBehavior) {
     if (!file->IsOpen()) return false;
     entry.handlerState = file;
     return true;
 }
 
-// Code that goes on after a failed open (FileAccessor does) finds no file here.
+// After a failed Open, FileAccessor still forwards calls: handlerState is null then.
 bool IFileAdapter::Read(FileEntryData& entry, VFS::FileSize position, UInt64 size, void* buffer, UInt64* actual,
                         FileReadFlags flags) {
     IFile* const opened = GetOpenFile(entry);

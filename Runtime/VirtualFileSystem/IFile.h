@@ -1,5 +1,5 @@
-// An open file that is not reached through a handler, such as a memory file, and the adapter that lets code written
-// against FileAccessor work on one.
+// IFile, an open file that no handler serves, such as a memory file, and the adapter that lets FileAccessor work on
+// one.
 #pragma once
 
 #include "Runtime/Allocator/MemLabel.h"
@@ -14,7 +14,7 @@ public:
     virtual bool IsOpen() const = 0;
     virtual bool Close() = 0;
 
-    // actual may be null. Whether a read at the very end is a success is for the file to say.
+    // actual may be null. Each class decides whether a read at the very end succeeds.
     virtual bool Read(VFS::FileSize position, UInt64 size, void* buffer, UInt64* actual, FileReadFlags flags) = 0;
     virtual bool Read(UInt64 size, void* buffer, UInt64* actual, FileReadFlags flags) = 0;
 
@@ -22,18 +22,18 @@ public:
     virtual bool Write(VFS::FileSize position, UInt64 size, const void* buffer, UInt64* written) = 0;
     virtual bool Write(UInt64 size, const void* buffer, UInt64* written) = 0;
 
-    // How kFileOriginEnd counts, and whether a target past the end is refused, is for the file to say.
+    // Each class decides how kFileOriginEnd counts and whether a position past the end is refused.
     virtual bool Seek(VFS::FileOffset offset, FileOrigin origin) = 0;
     virtual VFS::FileSize Position() const = 0;
     virtual bool SetLength(VFS::FileSize length) = 0;
     virtual VFS::FileSize Size() const = 0;
 };
 
-// Serves one IFile to the one FileAccessor that opens the entry whose accessorHandler it is. The close that ends the
-// use destroys the adapter (and, when it owns it, the file): nothing may touch either afterwards.
+// Lets one FileAccessor work on an IFile: make it the accessorHandler of the entry that the accessor opens. Close
+// destroys the adapter, and the file too if the adapter owns it; nothing may touch either afterwards.
 class IFileAdapter : public FileAccessorHandler {
 public:
-    // The adapter itself must have been allocated under the given label, and the file too if it is owned.
+    // The adapter must have been made by New under memLabel, and so must an owned file.
     IFileAdapter(IFile* servedFile, MemLabelId memLabel, bool owns);
 
     bool Open(FileEntryData& entry, FilePermission permission, FileAutoBehavior behavior) override;

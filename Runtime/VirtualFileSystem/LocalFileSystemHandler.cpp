@@ -1,5 +1,9 @@
 #include "Runtime/VirtualFileSystem/LocalFileSystemHandler.h"
 
+#include "Runtime/Allocator/Allocator.h"
+
+#include <cstring>
+
 using core::string_ref;
 
 constinit char LocalFileSystemHandler::currentDirectory[kPathBufferSize] = {};
@@ -23,10 +27,11 @@ bool LocalFileSystemHandler::MakeLocal(FileEntryData& entry, bool flag) { return
 bool LocalFileSystemHandler::ToLocal(const FileEntryData& entry, core::string& path, VFS::FileSize& offset,
                                      VFS::FileSize& size) const {
     if (!Exists(entry)) return false;
+    RequireMemory(path.grow(strlen(entry.path)));
     path = entry.path;
     offset = 0;
     size = Size(entry);
-    return path == entry.path; // not when memory was refused
+    return true;
 }
 
 core::string LocalFileSystemHandler::GetExecutablePath() const { return GetApplicationPath(); }

@@ -1,17 +1,12 @@
-// The POSIX back end's content operations, and what they need to know of a path.
+// The POSIX back end's contents: opening, reading, writing and seeking.
 #include "Runtime/VirtualFileSystem/LocalFileSystemPosix.h"
 
 #include "PlatformDependent/Linux/FileDescriptor.h"
 #include "Runtime/Allocator/Allocator.h"
 #include "Runtime/VirtualFileSystem/LocalFileSystemPosixCalls.h"
 
-#include <new>
 #include <sys/stat.h>
 #include <unistd.h>
-
-constexpr int kNoDescriptor = -1;
-constexpr mode_t kNewFileMode = 0666; // before the umask
-constexpr mode_t kNewFolderMode = 0755;
 
 FileSystemError FileSystemErrorFromErrno(int error) {
     switch (error) {
@@ -27,7 +22,7 @@ FileSystemError FileSystemErrorFromErrno(int error) {
 
 int GetDescriptor(const FileEntryData& entry) {
     const int* const cell = static_cast<const int*>(entry.handlerState);
-    return cell != nullptr ? *cell : kNoDescriptor;
+    return cell != nullptr ? *cell : FileDescriptor::kNone;
 }
 
 static int GetOpenFlags(FilePermission permission) {
@@ -40,27 +35,17 @@ static int GetOpenFlags(FilePermission permission) {
 }
 
 bool LocalFileSystemPosix::Open(FileEntryData& entry, FilePermission permission, FileAutoBehavior) {
-    int descriptor = PlatformOpen(entry.path, GetOpenFlags(permission), kNewFileMode);
-    if (descriptor == kNoDescriptor && permission == kFilePermissionReadWrite)
-        descriptor = PlatformOpen(entry.path, O_RDWR | O_CREAT | O_TRUNC, kNewFileMode);
-    const int error = descriptor == kNoDescriptor ? errno : 0;
-    // What is appended goes to the end wherever the position is.
-    if (descriptor != kNoDescriptor && permission == kFilePermissionAppend)
-        (void)RepeatOnInterrupt([&] { return lseek(descriptor, 0, SEEK_END); });
-
-    void* cell =
-        malloc_internal(sizeof(int), alignof(int), kMemLabelFileSystem, kAllocateOptionNone, __FILE__, __LINE__);
     entry.handler = this;
     entry.accessorHandler = this;
-    entry.handlerState = cell;
-    if (cell == nullptr) {
-        if (descriptor != kNoDescriptor) (void)PlatformClose(descriptor); // nothing was written to it
-        entry.lastError = kFileSystemErrorUnknown;
-        return false;
-    }
-    new (cell) int(descriptor);
-    entry.lastError = FileSystemErrorFromErrno(error);
-    return descriptor != kNoDescriptor;
+    int opened = PlatformOpen(entry.path, GetOpenFlags(permission), kNewFileMode);
+    if (opened == FileDescriptor::kNone && permission == kFilePermissionReadWrite)
+        opened = PlatformOpen(entry.path, O_RDWR | O_CREAT | O_TRUNC, kNewFileMode);
+    entry.lastError = FileSystemErrorFromErrno(opened == FileDescriptor::kNone ? errno : 0);
+    // Appending writes at the end wherever the position is; the seek is for Position.
+    if (opened != FileDescriptor::kNone && permission == kFilePermissionAppend)
+        (void)RepeatOnInterrupt([&] { return lseek(opened, 0, SEEK_END); });
+    entry.handlerState = RequireMemory(New<int>(kMemLabelFileSystem, opened));
+    return opened != FileDescriptor::kNone;
 }
 
 bool LocalFileSystemPosix::Read(FileEntryData& entry, VFS::FileSize position, UInt64 size, void* buffer, UInt64* actual,
@@ -70,7 +55,7 @@ bool LocalFileSystemPosix::Read(FileEntryData& entry, VFS::FileSize position, UI
 
 bool LocalFileSystemPosix::Read(FileEntryData& entry, UInt64 size, void* buffer, UInt64* actual, FileReadFlags) {
     const int descriptor = GetDescriptor(entry);
-    if (descriptor == kNoDescriptor) return false;
+    if (descriptor == FileDescriptor::kNone) return false;
     const ssize_t count = RepeatOnInterrupt([&] { return read(descriptor, buffer, size); });
     *actual = count > 0 ? static_cast<UInt64>(count) : 0;
     if (count < 0) entry.lastError = FileSystemErrorFromErrno(errno);
@@ -85,7 +70,7 @@ bool LocalFileSystemPosix::Write(FileEntryData& entry, VFS::FileSize position, U
 bool LocalFileSystemPosix::Write(FileEntryData& entry, UInt64 size, const void* buffer, UInt64* written) {
     constexpr UInt64 kMaxPieceSize = 0x7FFFFFFF; // one call takes no more
     const int descriptor = GetDescriptor(entry);
-    if (descriptor == kNoDescriptor) return false;
+    if (descriptor == FileDescriptor::kNone) return false;
     const char* from = static_cast<const char*>(buffer);
     UInt64 total = 0;
     for (bool isLast = false; !isLast;) {
@@ -106,9 +91,9 @@ bool LocalFileSystemPosix::Write(FileEntryData& entry, UInt64 size, const void* 
 bool LocalFileSystemPosix::Close(FileEntryData& entry) {
     if (entry.handlerState == nullptr) return true;
     const int descriptor = GetDescriptor(entry);
-    free_alloc_internal(entry.handlerState, kMemLabelFileSystem, __FILE__, __LINE__);
+    ::Delete(static_cast<int*>(entry.handlerState), kMemLabelFileSystem);
     entry.handlerState = nullptr;
-    if (descriptor == kNoDescriptor) return true;
+    if (descriptor == FileDescriptor::kNone) return true;
     const int result = PlatformClose(descriptor);
     entry.lastError = FileSystemErrorFromErrno(result == 0 ? 0 : errno);
     return entry.lastError == kFileSystemErrorNone;
@@ -126,7 +111,7 @@ static int GetSeekBase(FileOrigin origin) {
 
 bool LocalFileSystemPosix::Seek(FileEntryData& entry, VFS::FileOffset offset, FileOrigin origin) {
     const int descriptor = GetDescriptor(entry);
-    if (descriptor == kNoDescriptor) return false;
+    if (descriptor == FileDescriptor::kNone) return false;
     const int base = GetSeekBase(origin);
     const SInt64 distance = offset.Cast<SInt64>();
     return RepeatOnInterrupt([&] { return lseek(descriptor, distance, base); }) >= 0;
@@ -134,7 +119,7 @@ bool LocalFileSystemPosix::Seek(FileEntryData& entry, VFS::FileOffset offset, Fi
 
 VFS::FileSize LocalFileSystemPosix::Position(const FileEntryData& entry) const {
     const int descriptor = GetDescriptor(entry);
-    if (descriptor == kNoDescriptor) return 0;
+    if (descriptor == FileDescriptor::kNone) return 0;
     return static_cast<UInt64>(RepeatOnInterrupt([&] { return lseek(descriptor, 0, SEEK_CUR); }));
 }
 
@@ -146,32 +131,4 @@ bool LocalFileSystemPosix::SetLength(FileEntryData& entry, VFS::FileSize length)
 VFS::FileSize LocalFileSystemPosix::Size(const FileEntryData& entry) const {
     struct stat status;
     return GetStatus(entry.path, &status) ? static_cast<UInt64>(status.st_size) : 0;
-}
-
-bool LocalFileSystemPosix::Exists(const FileEntryData& entry) const {
-    return RepeatOnInterrupt([&] { return access(entry.path, F_OK); }) == 0;
-}
-
-bool LocalFileSystemPosix::IsDir(const FileEntryData& entry) const {
-    struct stat status;
-    return GetStatus(entry.path, &status) && S_ISDIR(status.st_mode);
-}
-
-bool LocalFileSystemPosix::IsFile(const FileEntryData& entry) const {
-    struct stat status;
-    return GetStatus(entry.path, &status) && !S_ISDIR(status.st_mode);
-}
-
-bool LocalFileSystemPosix::CreateAsDir(FileEntryData& entry) {
-    const int result = RepeatOnInterrupt([&] { return mkdir(entry.path, kNewFolderMode); });
-    entry.lastError = FileSystemErrorFromErrno(result == 0 ? 0 : errno);
-    return result == 0;
-}
-
-bool LocalFileSystemPosix::CreateAsFile(FileEntryData& entry) {
-    if (Exists(entry)) return false;
-    const int descriptor = PlatformOpen(entry.path, GetOpenFlags(kFilePermissionWrite), kNewFileMode);
-    if (descriptor == kNoDescriptor) return false;
-    (void)PlatformClose(descriptor); // nothing was written
-    return true;
 }

@@ -1,4 +1,4 @@
-// How the POSIX back end, and the one that derives from it, make system calls. Private to their files.
+// What the files of the POSIX back end, and of the back end that derives from it, share. Private to them.
 #pragma once
 
 #include "Runtime/VirtualFileSystem/VirtualFileSystemTypes.h"
@@ -6,7 +6,10 @@
 #include <cerrno>
 #include <sys/stat.h>
 
-// Makes a call that answers -1 and EINTR when a signal interrupts it, until it is not interrupted.
+constexpr mode_t kNewFileMode = 0666; // before the umask
+constexpr mode_t kModeBits = 07777;   // the part of st_mode that chmod takes
+
+// Repeats call until it ends without -1 and EINTR, which is how it says that a signal interrupted it.
 template <typename Call>
 auto RepeatOnInterrupt(Call call) {
     auto result = call();
@@ -15,7 +18,7 @@ auto RepeatOnInterrupt(Call call) {
     return result;
 }
 
-// The status of what path leads to, and of path itself.
+// GetStatus follows links; GetLinkStatus describes a link itself. On failure both answer false and set errno.
 inline bool GetStatus(const char* path, struct stat* status) {
     return RepeatOnInterrupt([&] { return stat(path, status); }) == 0;
 }
@@ -23,5 +26,19 @@ inline bool GetLinkStatus(const char* path, struct stat* status) {
     return RepeatOnInterrupt([&] { return lstat(path, status); }) == 0;
 }
 
-// The entry's open descriptor, or -1.
+// The entry's descriptor; -1 when the entry is closed, or its open failed.
 int GetDescriptor(const FileEntryData& entry);
+
+// A folder that a recursive listing is inside, linked to the one it was reached from.
+struct OpenFolder {
+    dev_t device;
+    ino_t inode;
+    const OpenFolder* outer; // null for the first one
+
+    // Whether status is that of this folder or of one outside it. A listing that entered it again would not end.
+    bool IsInside(const struct stat& status) const {
+        for (const OpenFolder* folder = this; folder != nullptr; folder = folder->outer)
+            if (folder->device == status.st_dev && folder->inode == status.st_ino) return true;
+        return false;
+    }
+};

@@ -1,4 +1,5 @@
-// The POSIX back end's operations on whole files and folders: attributes, deletion, locks, moves, copies.
+// The POSIX back end's operations on whole files and folders: creation, deletion, locks, moves and copies.
+#include "PlatformDependent/Linux/FileDescriptor.h"
 #include "Runtime/Core/Containers/DynamicArray.h"
 #include "Runtime/Utilities/FileUtilities.h"
 #include "Runtime/VirtualFileSystem/LocalFileSystemPosix.h"
@@ -11,95 +12,20 @@
 #include <cstring>
 #include <sys/file.h>
 #include <unistd.h>
-#include <utime.h>
 
 using core::string_ref;
 
-constexpr mode_t kAllWriteBits = S_IWUSR | S_IWGRP | S_IWOTH;
-constexpr mode_t kModeBits = 07777;
+constexpr mode_t kNewFolderMode = 0755;
 
-bool LocalFileSystemPosix::IsHidden(const FileEntryData&) const { return false; }
-
-bool LocalFileSystemPosix::IsSymLink(const FileEntryData& entry) const {
-    struct stat status;
-    return GetLinkStatus(entry.path, &status) && S_ISLNK(status.st_mode);
+bool LocalFileSystemPosix::CreateAsDir(FileEntryData& entry) {
+    const int result = RepeatOnInterrupt([&] { return mkdir(entry.path, kNewFolderMode); });
+    entry.lastError = FileSystemErrorFromErrno(result == 0 ? 0 : errno);
+    return result == 0;
 }
 
-bool LocalFileSystemPosix::IsReadOnly(const FileEntryData& entry) const {
-    struct stat status;
-    return GetLinkStatus(entry.path, &status) && (status.st_mode & S_IWUSR) == 0;
-}
-
-DateTime LocalFileSystemPosix::LastModified(const FileEntryData& entry) const {
-    DateTime time;
-    struct stat status;
-    if (GetStatus(entry.path, &status)) UnixTimeToZarvoTime(status.st_mtime, time);
-    return time;
-}
-
-bool LocalFileSystemPosix::SetFlags(FileEntryData&, UInt32, UInt32) { return true; }
-
-bool LocalFileSystemPosix::SetReadOnly(FileEntryData& entry, bool readOnly) {
-    struct stat status;
-    if (!GetLinkStatus(entry.path, &status)) return false;
-    const mode_t old = status.st_mode & kModeBits;
-    const mode_t mode = readOnly ? old & ~kAllWriteBits : old | S_IWUSR;
-    return RepeatOnInterrupt([&] { return chmod(entry.path, mode); }) == 0;
-}
-
-bool LocalFileSystemPosix::Touch(FileEntryData& entry) {
-    return RepeatOnInterrupt([&] { return utime(entry.path, nullptr); }) == 0;
-}
-
-bool LocalFileSystemPosix::SetFileTimeStamp(FileEntryData& entry, const DateTime& time) {
-    long seconds;
-    ZarvoTimeToUnixTime(time, seconds);
-    const utimbuf times{seconds, seconds};
-    return RepeatOnInterrupt([&] { return utime(entry.path, &times); }) == 0;
-}
-
-FileEntryInfoQueryFlags LocalFileSystemPosix::GetFileEntryInfo(const FileEntryData& entry, FileEntryInfo& info,
-                                                               FileEntryInfoQueryFlags query) const {
-    constexpr UInt32 kStatusQueries = kFileEntryQuerySize | kFileEntryQueryDirectory | kFileEntryQuerySymLink |
-                                      kFileEntryQueryLastModified | kFileEntryQueryReadOnly;
-    static_assert(kStatusQueries == 0x334);
-
-    const bool isExistenceAsked = (query & kFileEntryQueryExists) != 0;
-    if (isExistenceAsked && !Exists(entry)) return kFileEntryQueryNone;
-    // No file is hidden here, which is told unasked.
-    info.flags = static_cast<UInt8>(info.flags & ~kFileEntryIsHidden);
-    const FileEntryInfoQueryFlags base =
-        kFileEntryQueryHidden | (isExistenceAsked ? kFileEntryQueryExists : kFileEntryQueryNone);
-    struct stat status;
-    if ((query & kStatusQueries) == 0 || !GetStatus(entry.path, &status)) return base;
-    return base | GetFileEntryInfo(entry, status, info, query);
-}
-
-static void SetFlag(FileEntryInfo& info, FileEntryFlags flag, bool isSet) {
-    info.flags = static_cast<UInt8>(isSet ? info.flags | flag : info.flags & ~flag);
-}
-
-FileEntryInfoQueryFlags LocalFileSystemPosix::GetFileEntryInfo(const FileEntryData& entry, const struct stat& status,
-                                                               FileEntryInfo& info,
-                                                               FileEntryInfoQueryFlags query) const {
-    FileEntryInfoQueryFlags answer = kFileEntryQueryDirectory | kFileEntryQuerySize | kFileEntryQueryLastModified;
-    SetFlag(info, kFileEntryIsDirectory, S_ISDIR(status.st_mode));
-    const bool isLinkAsked = (query & kFileEntryQuerySymLink) != 0;
-    const bool isReadOnlyAsked = (query & kFileEntryQueryReadOnly) != 0;
-    struct stat linkStatus;
-    if ((isLinkAsked || isReadOnlyAsked) && GetLinkStatus(entry.path, &linkStatus)) {
-        if (isLinkAsked) {
-            SetFlag(info, kFileEntryIsSymLink, S_ISLNK(linkStatus.st_mode));
-            answer = answer | kFileEntryQuerySymLink;
-        }
-        if (isReadOnlyAsked) {
-            SetFlag(info, kFileEntryIsReadOnly, (status.st_mode & S_IWUSR) == 0);
-            answer = answer | kFileEntryQueryReadOnly;
-        }
-    }
-    UnixTimeToZarvoTime(status.st_mtime, info.lastModified);
-    info.size = static_cast<UInt64>(status.st_size);
-    return answer;
+bool LocalFileSystemPosix::CreateAsFile(FileEntryData& entry) {
+    if (Exists(entry)) return false;
+    return FileDescriptor(PlatformOpen(entry.path, O_WRONLY | O_CREAT | O_TRUNC, kNewFileMode)).IsOpen();
 }
 
 static bool IsSameFile(const char* a, const char* b) {
@@ -111,20 +37,20 @@ static bool IsSameFile(const char* a, const char* b) {
 
 namespace {
 
-// Tells whether a listed path names something in the folder, also after an entry has taken it over: a listing may write
-// the folder's path in another way or cut it, and an entry takes a backslash for a separator, so that the name "..\x"
-// would lead out.
+// Tells whether an entry made from a listed path still names a child of the folder. It may not: a listing can spell the
+// folder's path differently or cut it, and an entry turns backslashes into separators, so a file named "..\x" would
+// lead out of the folder.
 class ChildTest {
 public:
     explicit ChildTest(const char* folder) : m_Folder(folder) {}
 
-    // path must stay as it is until the next call.
+    // The text of path must stay valid until the next call.
     bool IsChild(string_ref path) {
         const size_t nameStart = path.rfind('/') + 1; // 0 without a "/"
         const string_ref name = path.substr(nameStart);
         const string_ref parent = path.substr(0, nameStart);
         if (name.empty() || name.find('\\') != string_ref::npos) return false;
-        // A listing writes the same parent for all that it lists: the disk is asked once.
+        // All children of a listing have the same parent: ask the disk once.
         if (!m_IsKnown || m_Parent != parent) {
             m_IsKnown = true;
             m_Parent = parent;
@@ -137,7 +63,7 @@ public:
 private:
     const char* m_Folder;
     bool m_IsKnown = false;
-    string_ref m_Parent; // the one that was compared last
+    string_ref m_Parent; // compared last
     bool m_IsParentFolder = false;
 };
 
@@ -145,7 +71,7 @@ private:
 
 bool LocalFileSystemPosix::Delete(FileEntryData& entry, bool recursive) {
     if (!IsDir(entry)) return RepeatOnInterrupt([&] { return unlink(entry.path); }) == 0;
-    // With a slash at its end, the system takes a link to a folder for the folder.
+    // The system follows a link to a folder when the path ends in "/": look at the path without it.
     size_t length = strlen(entry.path);
     while (length > 1 && entry.path[length - 1] == '/')
         --length;
@@ -182,12 +108,12 @@ bool LocalFileSystemPosix::Lock(FileEntryData& entry, FileLockMode mode) {
         return Close(entry);
     }
     if (entry.handlerState == nullptr && !Open(entry, kFilePermissionReadWrite, kFileAutoBehaviorLock)) {
-        // The cell of the failed open would be taken for an open file at the next try.
+        // The next Lock would take the failed open's cell for an open file.
         (void)Close(entry);
         return false;
     }
     if (RepeatOnInterrupt([&] { return flock(GetDescriptor(entry), mode | LOCK_NB); }) == 0) return true;
-    (void)Close(entry); // the lock is not had, whatever this says
+    (void)Close(entry); // the lock failed either way
     return false;
 }
 
@@ -202,11 +128,11 @@ bool LocalFileSystemPosix::IsLocked(const FileEntryData& entry) {
     if (!IsFileCreated(entry.path)) return false;
 
     FileSystemEntry copy(entry);
-    bool isLocked = true; // what can't be opened counts as in use
+    bool isLocked = true; // a file that can't be opened counts as in use
     if (Open(copy, kFilePermissionRead, kFileAutoBehaviorNone)) {
         const int descriptor = GetDescriptor(copy);
         isLocked = RepeatOnInterrupt([&] { return flock(descriptor, LOCK_EX | LOCK_NB); }) != 0;
-        (void)RepeatOnInterrupt([&] { return flock(descriptor, LOCK_UN | LOCK_NB); }); // closing would do it too
+        (void)RepeatOnInterrupt([&] { return flock(descriptor, LOCK_UN | LOCK_NB); }); // Close unlocks too
     }
     (void)Close(copy); // opened for reading: nothing is lost
     return isLocked;
@@ -235,7 +161,7 @@ bool LocalFileSystemPosix::SynchronizeMode(const FileEntryData& from, const File
 
 bool LocalFileSystemPosix::Copy(FileEntryData& from, FileEntryData& to) {
     constexpr UInt64 kTransferSize = 65'536;
-    // Opened to write, the file would be emptied before it is read.
+    // Opening the target empties it: the source must be another file.
     if (IsSameFile(from.path, to.path)) return false;
     FileSystemEntry sourceEntry{string_ref(from.path)};
     FileAccessor source;
@@ -245,7 +171,7 @@ bool LocalFileSystemPosix::Copy(FileEntryData& from, FileEntryData& to) {
 
     const UInt64 size = source.Size().Cast<UInt64>();
     dynamic_array<UInt8> buffer(kMemLabelGeneral);
-    buffer.resize_uninitialized(static_cast<size_t>(std::min(size, kTransferSize)), kResizeExact);
+    if (!buffer.resize_uninitialized(static_cast<size_t>(std::min(size, kTransferSize)), kResizeExact)) return false;
     UInt64 total = 0;
     while (total < size) {
         UInt64 count = 0;
@@ -254,5 +180,5 @@ bool LocalFileSystemPosix::Copy(FileEntryData& from, FileEntryData& to) {
         if (!target.Write(count, buffer.data(), &written) || written != count) return false;
         total += written;
     }
-    return total == size && SynchronizeMode(from, to); // not if it grew meanwhile
+    return total == size && SynchronizeMode(from, to); // more than size: the source grew meanwhile
 }

@@ -31,12 +31,6 @@ FileSystemHandler* FileSystem::GetHandlerForPath(string_ref path) const {
 }
 
 core::string FileSystem::ToAbsolute(string_ref path) const {
-    bool isLocal;
-    return ToAbsolute(path, &isLocal);
-}
-
-core::string FileSystem::ToAbsolute(string_ref path, bool* isLocal) const {
-    *isLocal = false;
     {
         ReadWriteLock::AutoShared lock(*handlersLock);
         for (size_t index = handlers.size(); index != 0; --index) {
@@ -45,7 +39,6 @@ core::string FileSystem::ToAbsolute(string_ref path, bool* isLocal) const {
             if (handler.CanConvertToAbsolutePath(path)) return handler.ToAbsolute(path);
         }
     }
-    *isLocal = true;
     return localHandler->ToAbsolute(path);
 }
 
@@ -64,7 +57,7 @@ bool FileSystem::Delete(string_ref path, bool recursive) const {
 
 bool FileSystem::Enumerate(const char* path, dynamic_block_array<FileEntryInfo, 32>* out, bool recursive,
                            FileEnumerationFlag flags) const {
-    FileEntryData entry; // unbound again when it is destroyed
+    FileEntryData entry; // its destructor undoes the binding
     strcpy_truncate(entry.path, path, sizeof(entry.path), strlen(path));
     GetHandlerForPath(path)->InitializeFileEntry(entry);
     void* handlerData = nullptr;
@@ -83,20 +76,19 @@ void FileSystem::UnregisterHandler(FileSystemHandler* handler) {
     size_t kept = 0;
     for (FileSystemHandler* registered : handlers)
         if (registered != handler) handlers[kept++] = registered;
-    handlers.resize_initialized(kept);
+    handlers.truncate(kept);
 }
 
-// Lets go of what the entry is bound to.
+// Undoes a binding. The path is left for the caller to overwrite.
 static void Unbind(FileEntryData& entry) {
     if (entry.handler != nullptr) entry.handler->DestroyFileEntry(entry);
-    entry.path[0] = '\0';
     entry.handler = nullptr;
     entry.accessorHandler = nullptr;
     entry.handlerState = nullptr;
     entry.lastError = kFileSystemErrorNone;
 }
 
-// Binds an unbound entry to what another one names; only the binding is copied, never an open file.
+// Binds an unbound entry to the path and handlers of another. An open file is not copied.
 static void CopyBinding(FileEntryData& entry, const FileEntryData& other) {
     strcpy_truncate(entry.path, other.path, sizeof(entry.path), strlen(other.path));
     entry.handler = other.handler;
@@ -116,14 +108,12 @@ FileSystemEntry& FileSystemEntry::operator=(const FileSystemEntry& other) {
 }
 
 void FileSystemEntry::Set(string_ref newPath) {
-    // The path may be this entry's own, which is emptied first; a longer one can't be.
-    char copy[kPathBufferSize];
-    if (newPath.size() <= kMaxPathLength)
-        newPath = string_ref(copy, strcpy_truncate(copy, newPath.data(), sizeof(copy), newPath.size()));
+    // Asked before the path is overwritten: newPath may be part of it.
+    FileSystemHandler* const newHandler = GetFileSystem()->GetHandlerForPath(newPath);
     Unbind(*this);
     strcpy_truncate(path, newPath.data(), sizeof(path), newPath.size());
     ConvertSeparatorsToZarvo(path);
-    GetFileSystem()->GetHandlerForPath(newPath)->InitializeFileEntry(*this);
+    newHandler->InitializeFileEntry(*this);
 }
 
 bool FileSystemEntry::Exists() const { return handler != nullptr && handler->Exists(*this); }
@@ -143,12 +133,12 @@ DateTime FileSystemEntry::LastModified() const {
 
 bool FileSystemEntry::FolderExists() const {
     FileEntryInfo info;
-    GetFileEntryInfo(info, kFileEntryQueryExists | kFileEntryQueryDirectory);
+    (void)GetFileEntryInfo(info, kFileEntryQueryExists | kFileEntryQueryDirectory); // unfilled, the flags are 0
     return (info.flags & kFileEntryIsDirectory) != 0;
 }
 
 FileAccessor::~FileAccessor() {
-    (void)Close(); // who needs the answer has closed it before
+    (void)Close(); // a caller that needs the answer closes before
 }
 
 bool FileAccessor::Open(FileSystemEntry& target, FilePermission permission, FileAutoBehavior behavior) {

@@ -4,10 +4,10 @@
 //   FileAccessor file;
 //   if (!file.Open("archive.zarvo", kFilePermissionRead)) return;
 //   UInt64 count = 0;
-//   if (!file.Read(sizeof(buffer), buffer, &count)) return;   // false: failed, or nothing left
+//   if (!file.Read(sizeof(buffer), buffer, &count)) return;   // false: failed, or at the end of the file
 //
-// The registry may be used from any thread once it exists (make the first call of GetFileSystem before a second thread
-// starts); the current directory is set before that too. An entry or accessor belongs to one thread at a time.
+// Call GetFileSystem once, and set the current directory, before a second thread starts: from then on any thread may
+// use the registry. An entry or accessor belongs to one thread at a time.
 #pragma once
 
 #include "Runtime/Allocator/MemLabel.h"
@@ -25,27 +25,24 @@ public:
     ~FileSystem() = delete; // lives until the process ends
 
     // Never null.
-    FileSystemHandler* GetHandlerForPath(core::basic_string_ref<char> path) const;
+    FileSystemHandler* GetHandlerForPath(core::string_ref path) const;
 
-    // The path from the root; "." and ".." are not resolved. Empty when a handler makes nothing of the path, and when
-    // memory is refused.
-    core::basic_string<char> ToAbsolute(core::basic_string_ref<char> path) const;
-    // The same, and whether the local back end has answered, because no registered handler did.
-    core::basic_string<char> ToAbsolute(core::basic_string_ref<char> path, bool* isLocal) const;
+    // The path from the root; "." and ".." are not resolved. Empty when the handler that is asked returns that.
+    core::string ToAbsolute(core::string_ref path) const;
 
-    // The directory that ToAbsolute puts before relative paths (cut at kMaxPathLength); returns the one before it.
-    // The process's working directory is not changed.
-    core::basic_string<char> SetCurrentDirectory(core::basic_string_ref<char> path);
-    core::basic_string<char> CurrentDirectory() const;
+    // Sets the directory that ToAbsolute puts before relative paths, cut at kMaxPathLength, and returns the previous
+    // one. The process's working directory does not change.
+    core::string SetCurrentDirectory(core::string_ref path);
+    core::string CurrentDirectory() const;
 
-    bool Delete(core::basic_string_ref<char> path, bool recursive) const;
-    bool Enumerate(const char* path, dynamic_block_array<FileEntryInfo, 32>* out, bool recursive,
-                   FileEnumerationFlag flags) const;
-    core::basic_string<char> LastErrorMessage() const;
+    [[nodiscard]] bool Delete(core::string_ref path, bool recursive) const;
+    [[nodiscard]] bool Enumerate(const char* path, dynamic_block_array<FileEntryInfo, 32>* out, bool recursive,
+                                 FileEnumerationFlag flags) const;
+    core::string LastErrorMessage() const;
 
-    // Puts a handler before those there are, and takes one out. The handler stays the caller's, and must outlive its
-    // registration and every entry bound to it. What it answers about paths (CanHandle, IsAbsoluteFilePath,
-    // CanConvertToAbsolutePath, ToAbsolute) is asked under the registry's lock: there it must not use the registry.
+    // A registered handler is asked before all registered earlier. It stays the caller's, and must outlive its
+    // registration and every entry bound to it. The registry calls its CanHandle, IsAbsoluteFilePath,
+    // CanConvertToAbsolutePath and ToAbsolute under a lock: these four must not use the registry.
     void RegisterHandler(FileSystemHandler* handler);
     void UnregisterHandler(FileSystemHandler* handler);
 
@@ -60,28 +57,29 @@ private:
 FileSystem* GetFileSystem();
 extern FileSystem* gFileSystem; // null until then
 
-// A path bound to its handler. Copies are bound anew and never open.
+// A path bound to its handler. A copy is bound to the same path and handler, but never open.
 class FileSystemEntry : public FileEntryData {
 public:
     FileSystemEntry() = default;
-    explicit FileSystemEntry(core::basic_string_ref<char> path);
+    explicit FileSystemEntry(core::string_ref path);
     FileSystemEntry(const FileEntryData& other);
     FileSystemEntry(const FileSystemEntry& other);
     FileSystemEntry& operator=(const FileSystemEntry& other);
 
-    // Binds the entry to another path: cut at kMaxPathLength, every backslash turned into "/".
-    void Set(core::basic_string_ref<char> path);
+    // Binds the entry to another path, cut at kMaxPathLength, with every backslash turned into "/". The text may be
+    // part of the entry's own path. The handler is chosen by the path as given.
+    void Set(core::string_ref path);
     const char* Path() const { return path; }
 
-    // Without a handler, all of these answer false (or 0, or a default DateTime).
+    // Without a handler all of these answer false, 0 or a default DateTime.
     bool Exists() const;
     bool IsDir() const;
     bool IsFile() const;
     bool IsLocked();
-    bool CreateAsDir();
-    bool SetFlags(UInt32 mask, UInt32 flags);
-    FileEntryInfoQueryFlags GetFileEntryInfo(FileEntryInfo& info, FileEntryInfoQueryFlags query) const;
-    DateTime LastModified() const; // 0 when it can't be told; a handler may say why in lastError
+    [[nodiscard]] bool CreateAsDir();
+    [[nodiscard]] bool SetFlags(UInt32 mask, UInt32 flags);
+    [[nodiscard]] FileEntryInfoQueryFlags GetFileEntryInfo(FileEntryInfo& info, FileEntryInfoQueryFlags query) const;
+    DateTime LastModified() const; // 0 when unknown; a handler may say why in lastError
     bool FolderExists() const;
 };
 
@@ -91,25 +89,27 @@ public:
     FileAccessor() = default;
     virtual ~FileAccessor();
 
-    // The entry must have an accessor handler.
-    bool Open(FileSystemEntry& target, FilePermission permission, FileAutoBehavior behavior = kFileAutoBehaviorNone);
-    bool Open(const char* path, FilePermission permission, FileAutoBehavior behavior = kFileAutoBehaviorNone);
+    // False for an entry without an accessor handler.
+    [[nodiscard]] bool Open(FileSystemEntry& target, FilePermission permission,
+                            FileAutoBehavior behavior = kFileAutoBehaviorNone);
+    [[nodiscard]] bool Open(const char* path, FilePermission permission,
+                            FileAutoBehavior behavior = kFileAutoBehaviorNone);
 
-    // False: nothing could be read, and *actual is 0 or as it was; a count below size is a success. Files on
-    // disk answer false at their end, memory files true with 0 bytes.
-    bool Read(UInt64 size, void* buffer, UInt64* actual, FileReadFlags flags = kFileReadFlagsNone);
-    bool Read(VFS::FileSize position, UInt64 size, void* buffer, UInt64* actual,
-              FileReadFlags flags = kFileReadFlagsNone);
+    // True with *actual bytes in buffer; fewer than size are a success too. False when nothing could be read, with
+    // *actual 0 or unchanged. At their end, files on disk answer false, memory files true with 0 bytes.
+    [[nodiscard]] bool Read(UInt64 size, void* buffer, UInt64* actual, FileReadFlags flags = kFileReadFlagsNone);
+    [[nodiscard]] bool Read(VFS::FileSize position, UInt64 size, void* buffer, UInt64* actual,
+                            FileReadFlags flags = kFileReadFlagsNone);
 
-    // A count in *written below size is a success.
-    bool Write(UInt64 size, const void* data, UInt64* written);
+    // True when *written bytes were taken; fewer than size are a success too.
+    [[nodiscard]] bool Write(UInt64 size, const void* data, UInt64* written);
 
-    bool Seek(VFS::FileOffset offset, FileOrigin origin);
+    [[nodiscard]] bool Seek(VFS::FileOffset offset, FileOrigin origin);
     VFS::FileSize Position() const;
     VFS::FileSize Size() const;
 
-    // True when nothing was open.
-    bool Close();
+    // True when nothing was open. Data can turn out to be unwritten only here: ask after writing.
+    [[nodiscard]] bool Close();
 
 private:
     FileEntryData entry;

@@ -15,11 +15,11 @@ class FileSystemHandler;
 
 namespace VFS {
 
-// Report a conversion that loses its value: too large for the target, or a negative value for an unsigned one.
+// Report a conversion that changes the value: one too large for its target, and a negative one to an unsigned type.
 void ReportValueTooLarge();
 void ReportNegativeValue();
 
-// value as a Target. What Target can't hold is reported and converted all the same, keeping the low bits.
+// Converts value to Target. A value that Target can't hold is reported, then converted by keeping its low bits.
 template <typename Target, typename Source>
 constexpr Target CheckedCast(Source value) {
     if constexpr (std::is_signed_v<Source> && std::is_unsigned_v<Target>) {
@@ -40,7 +40,7 @@ public:
     constexpr FileSize() = default;
     constexpr FileSize(UInt64 value) : m_Value(value) {}
 
-    // The value as another integer type; one that does not fit is reported and cut.
+    // See CheckedCast.
     template <typename Target>
     constexpr Target Cast() const {
         return CheckedCast<Target>(m_Value);
@@ -57,7 +57,7 @@ class FileOffset {
 public:
     constexpr FileOffset() = default;
     constexpr FileOffset(SInt64 value) : m_Value(value) {}
-    // A size above 2^63 - 1 is reported and then taken as signed.
+    // A size above 2^63 - 1 is reported and becomes negative.
     explicit constexpr FileOffset(FileSize size) : m_Value(size.Cast<SInt64>()) {}
 
     template <typename Target>
@@ -83,13 +83,13 @@ enum FilePermission : SInt32 {
     kFilePermissionAppend = 3,    // write only at the end; created if missing
 };
 
-// A hint that Open passes to the handler; no handler here gives it a meaning.
+// A hint that Open passes to the handler. The handlers here ignore it.
 enum FileAutoBehavior : SInt32 {
     kFileAutoBehaviorNone = 0,
-    kFileAutoBehaviorLock = 1, // passed when a file is opened to be locked
+    kFileAutoBehaviorLock = 1, // the file is opened to be locked
 };
 
-// A bit set passed with every read. Only the archive reader gives a bit a meaning.
+// A bit set passed with every read. Only the archive reader uses it.
 enum FileReadFlags : UInt32 {
     kFileReadFlagsNone = 0,
     kFileReadFlagsThroughCache = 1, // whole archive blocks go through the block cache too
@@ -109,7 +109,7 @@ enum FileLockMode : SInt32 {
     kFileLockUnlock = 8,
 };
 
-// What an operation that records errors leaves in its entry.
+// The code that an operation leaves in an entry's lastError.
 enum FileSystemError : UInt32 {
     kFileSystemErrorNone = 0,
     kFileSystemErrorNotFound = 1,      // ENOENT
@@ -120,7 +120,7 @@ enum FileSystemError : UInt32 {
     kFileSystemErrorNotSupported = 15, // the handler has no such operation
 };
 
-// A path in an entry holds at most kMaxPathLength characters and its NUL; a longer one is cut.
+// An entry holds paths of up to kMaxPathLength characters and a NUL; longer ones are cut.
 constexpr size_t kPathBufferSize = 1040;
 constexpr size_t kMaxPathLength = kPathBufferSize - 1;
 
@@ -134,20 +134,20 @@ enum FileEntryFlags : UInt8 {
 
 // What GetFileEntryInfo and Enumerate report about one file or folder.
 struct FileEntryInfo {
-    UInt64 size = 0; // bytes; of a folder, what the platform reports
+    UInt64 size = 0; // bytes; for a folder, what the platform reports
     DateTime lastModified;
     UInt8 flags = 0; // FileEntryFlags
     char path[kPathBufferSize] = {};
 };
 
-// Which fields GetFileEntryInfo should fill; returned, which it has filled.
+// The fields that GetFileEntryInfo is asked to fill, and in its result those that it filled.
 enum FileEntryInfoQueryFlags : UInt32 {
     kFileEntryQueryNone = 0,
-    kFileEntryQuerySize = 0x004, // always filled and reported together with the modification time
+    kFileEntryQuerySize = 0x004, // always filled together with the modification time
     kFileEntryQueryDirectory = 0x010,
     kFileEntryQuerySymLink = 0x020,
     kFileEntryQueryHidden = 0x040,
-    kFileEntryQueryExists = 0x080, // answered only when the entry exists
+    kFileEntryQueryExists = 0x080, // returned only when the entry exists
     kFileEntryQueryLastModified = 0x100,
     kFileEntryQueryReadOnly = 0x200,
 };
@@ -155,23 +155,23 @@ constexpr FileEntryInfoQueryFlags operator|(FileEntryInfoQueryFlags a, FileEntry
     return static_cast<FileEntryInfoQueryFlags>(static_cast<UInt32>(a) | static_cast<UInt32>(b));
 }
 
-// What an enumeration leaves out. A name is hidden when it starts with "." (on macOS, when it carries the hidden flag).
+// What an enumeration skips. A name is hidden when it starts with "." (on macOS, when it carries the hidden flag).
 enum FileEnumerationFlag : UInt32 {
     kFileEnumerationAll = 0,
     kFileEnumerationSkipHiddenFiles = 0x02,
     kFileEnumerationSkipHiddenFolders = 0x04,
-    kFileEnumerationSkipFiles = 0x08,     // those that are not hidden
-    kFileEnumerationSkipFolders = 0x10,   // those that are not hidden
+    kFileEnumerationSkipFiles = 0x08,     // visible ones
+    kFileEnumerationSkipFolders = 0x10,   // visible ones
     kFileEnumerationSkipByName = 0x20,    // names that start with ".", equal "cvs" or end with "~"
     kFileEnumerationSkipTemporary = 0x40, // files that end with .tmp in any case
-    kFileEnumerationSumSizes = 0x80,      // no filter: sizes are summed instead of entries listed
+    kFileEnumerationSumSizes = 0x80,      // no filter: sums sizes instead of listing entries
 };
 constexpr FileEnumerationFlag operator|(FileEnumerationFlag a, FileEnumerationFlag b) {
     return static_cast<FileEnumerationFlag>(static_cast<UInt32>(a) | static_cast<UInt32>(b));
 }
 
-// A path bound to the handlers that serve it. An empty one has an empty path and null pointers. Destroying one calls
-// DestroyFileEntry of its handler, if it has one.
+// A path bound to the handlers that serve it. A new one is empty: no path, null pointers. The destructor calls
+// DestroyFileEntry of the handler, if there is one.
 struct FileEntryData : private NonCopyable {
     FileEntryData() { path[0] = '\0'; }
     ~FileEntryData();
@@ -179,7 +179,7 @@ struct FileEntryData : private NonCopyable {
     char path[kPathBufferSize];
     FileSystemHandler* handler = nullptr;                     // answers questions about the entry
     FileAccessorHandler* accessorHandler = nullptr;           // reads and writes its contents; normally the same object
-    void* handlerState = nullptr;                             // the accessor handler's own, between Open and Close
+    void* handlerState = nullptr;                             // the accessor handler's, between Open and Close
     mutable FileSystemError lastError = kFileSystemErrorNone; // by the last operation that records errors
 };
 

@@ -1,5 +1,6 @@
-// The messages in the sources, the manual page and the README. Counted are the texts that puts, printf, printf_console
-// and ReportError are given: a user meets them. Failed checks speak to developers; the manual page names some of them.
+// The messages in the sources are those that the manual page and the README explain. A message is a text that is given
+// to puts, printf, printf_console or ReportError, because users see it. Failed checks are for developers; the manual
+// page explains some of them.
 #include "Tests/Support/TemporaryFolder.h"
 
 #include <filesystem>
@@ -21,7 +22,7 @@ std::vector<std::string> FindAll(const std::string& text, const char* pattern) {
     return {std::sregex_token_iterator(text.begin(), text.end(), regex, 1), std::sregex_token_iterator()};
 }
 
-// All that the command is made of, without comments. A literal is in one piece and without its last newline.
+// All sources of the command, without comments. Adjacent literals are joined, and lose their last newline.
 std::string ReadSources() {
     std::string code;
     for (const char* const folder : {"Tools/Extractor", "Runtime", "Footing"})
@@ -46,19 +47,19 @@ TEST(Messages, AreThoseOfTheManualPageAndTheReadme) {
              code,
              "\\b(?:puts|printf|printf_console|ReportError)\\((?!const char)\\s*(?:Format\\(\\s*)?(?:\"([^\"]*)\")?"))
         printed.insert(literal);
-    EXPECT_EQ(0u, printed.count("")) << "a message is not written where it is printed";
-    // Of operations that the command never asks for.
+    EXPECT_EQ(0u, printed.count("")) << "a message whose text does not stand where it is printed";
+    // The command never asks for the operations that print these.
     EXPECT_EQ(1u, printed.erase("Creating user config folder: %"));
     EXPECT_EQ(1u, printed.erase("statvfs failed with errno=%; path was %"));
     EXPECT_LT(15u, printed.size());
 
     for (const std::string& line : FindAll(ReadSection("man/Varnex.1", ".SH MESSAGES", ".SH"), "\n\\.BI ([^\n]*)")) {
-        std::string text; // literals and placeholders take turns
+        std::string text; // of literals and placeholders in turn
         for (const std::string& argument : FindAll(line, "(\"[^\"]*\"|\\S+)"))
             text += argument[0] == '"' ? argument.substr(1, argument.size() - 2) : "%";
         text = Replace(text, "\\\\\\(aq", "'");
-        EXPECT_NE(std::string::npos, code.find('"' + text + '"')) << text;
-        EXPECT_TRUE((printed.count(text) != 0 ? explained : checks).insert(text).second) << text;
+        EXPECT_NE(std::string::npos, code.find('"' + text + '"')) << "not in the sources: " << text;
+        EXPECT_TRUE((printed.count(text) != 0 ? explained : checks).insert(text).second) << "twice: " << text;
     }
     for (const std::string& text : FindAll(ReadSection("README.md", "## Messages", "## "), "\n\\| `([^`]*)`"))
         listed.insert(Replace(text, "%(s|d|i|llu)", "%"));

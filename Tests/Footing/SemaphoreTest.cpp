@@ -9,21 +9,38 @@ using namespace ZarvoClassic;
 static Footing_Semaphore gSemaphore;
 static std::atomic<int> gInterruptions;
 
-TEST(Semaphore, WakesNobodyForAnInterruptionAndAsksTheSystemOnlyForThreadsThatWait) {
-    Footing_Semaphore_CreateInplace(&gSemaphore);
-    struct sigaction action = {}; // without SA_RESTART: a signal interrupts the wait
-    action.sa_handler = [](int) {
-        if (++gInterruptions == 3) Footing_Semaphore_Release(&gSemaphore, 2);
-    };
-    sigaction(SIGALRM, &action, nullptr);
-    const itimerval everyMillisecond = {{0, 1'000}, {0, 1'000}}, never = {};
-    setitimer(ITIMER_REAL, &everyMillisecond, nullptr);
+// Signals interrupt the wait every millisecond; the third of them releases.
+class InterruptedSemaphore : public testing::Test {
+protected:
+    InterruptedSemaphore() {
+        gInterruptions = 0;
+        Footing_Semaphore_CreateInplace(&gSemaphore);
+        struct sigaction action = {}; // without SA_RESTART, which would hide the interruption
+        action.sa_handler = [](int) {
+            if (++gInterruptions == 3) Footing_Semaphore_Release(&gSemaphore, 2);
+        };
+        sigaction(SIGALRM, &action, nullptr);
+        const itimerval everyMillisecond = {.it_interval = {0, 1'000}, .it_value = {0, 1'000}};
+        setitimer(ITIMER_REAL, &everyMillisecond, nullptr);
+    }
+    ~InterruptedSemaphore() override {
+        const itimerval never = {};
+        setitimer(ITIMER_REAL, &never, nullptr);
+        Footing_Semaphore_FreeInplace(&gSemaphore);
+    }
+};
+
+TEST_F(InterruptedSemaphore, WaitsOnUntilTheRelease) {
     Footing_Semaphore_Acquire(&gSemaphore);
-    setitimer(ITIMER_REAL, &never, nullptr);
-    ASSERT_GE(gInterruptions, 3);
-    Footing_Semaphore_Acquire(&gSemaphore); // asks the system for nothing
-    EXPECT_TRUE(gSemaphore.count == 0 && gSemaphore.storage.count == 0);
-    Footing_Semaphore_FreeInplace(&gSemaphore);
+    EXPECT_GE(gInterruptions, 3);
+}
+
+TEST_F(InterruptedSemaphore, AsksTheSystemForOneWaiterOnly) {
+    Footing_Semaphore_Acquire(&gSemaphore); // takes one of the two releases from the system
+    EXPECT_EQ(0, gSemaphore.storage.count);
+    EXPECT_EQ(1, gSemaphore.count);
+    Footing_Semaphore_Acquire(&gSemaphore);
+    EXPECT_EQ(0, gSemaphore.count);
 }
 
 TEST(SystemSemaphore, ReleasesBeyondTheMostAreDropped) {

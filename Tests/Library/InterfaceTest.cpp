@@ -10,7 +10,8 @@
 namespace {
 
 // What the library asks for; the request that requestsLeft counts down to is refused.
-int s_RequestsLeft = -1; // none
+int s_RequestsLeft = -1;         // none
+bool s_IsRefusalLasting = false; // those after it, too
 
 std::set<std::string> NamesIn(const std::string& text, const char* pattern) {
     const std::regex names(pattern);
@@ -32,7 +33,10 @@ std::string OutputOf(const std::string& command) {
 } // namespace
 
 extern "C" int posix_memalign(void** pointer, size_t align, size_t size) {
-    if (s_RequestsLeft > 0 && --s_RequestsLeft == 0) return ENOMEM;
+    if (s_RequestsLeft > 0 && --s_RequestsLeft == 0) {
+        if (s_IsRefusalLasting) s_RequestsLeft = 1;
+        return ENOMEM;
+    }
     *pointer = memalign(align, size);
     return *pointer != nullptr ? 0 : ENOMEM;
 }
@@ -125,6 +129,20 @@ TEST(Interface, NullAndPastTheEndAreArgumentErrors) {
     EXPECT_EQ(std::string(""), zarvo_error_text(nullptr));
 }
 
+// A program may look at the count without looking at the code.
+TEST(Interface, RefusedReadsDeliverNothing) {
+    const std::string bytes = BuildArchive({.entries = {{.path = "a", .bytes = "text"}}}).bytes;
+    const zarvo::archive archive = OpenBytes(bytes);
+    char buffer[4];
+    size_t count = 77;
+    EXPECT_EQ(ZARVO_ERROR_ARGUMENT, zarvo_read(archive.get(), 1, 0, buffer, 4, &count, nullptr));
+    EXPECT_EQ(0u, std::exchange(count, 77));
+    EXPECT_EQ(ZARVO_ERROR_ARGUMENT, zarvo_stream_read(nullptr, buffer, 4, &count, nullptr));
+    EXPECT_EQ(0u, std::exchange(count, 77));
+    EXPECT_EQ(ZARVO_ERROR_ARGUMENT, zarvo_read_block(archive.get(), 1, buffer, &count, nullptr));
+    EXPECT_EQ(0u, count);
+}
+
 // Each request of the library is refused once: an error that says so, or right bytes, and no crash.
 TEST(Interface, EachRefusedRequestForMemoryIsAnError) {
     const std::string text = SampleText(30'000);
@@ -156,6 +174,31 @@ TEST(Interface, EachRefusedRequestForMemoryIsAnError) {
             zarvo_error_free(error);
             zarvo_close(archive);
         }
+    }
+}
+
+// A tree whose building found no memory is built from the start by the next call that needs it.
+TEST(Interface, TreeIsRightAfterARefusedRequest) {
+    ArchiveDescription description;
+    for (int number = 0; number < 100; ++number)
+        description.entries.push_back({.path = std::to_string(number) + "/x/y"});
+    const std::string bytes = BuildArchive(description).bytes;
+    bool isRefused = true;
+    for (int refused = 1; isRefused; ++refused) {
+        SCOPED_TRACE(refused);
+        ASSERT_LT(refused, 1'000);
+        const zarvo::archive archive = OpenBytes(bytes);
+        s_IsRefusalLasting = true;
+        s_RequestsLeft = refused;
+        isRefused = zarvo_item_count(archive.get()) == 0;
+        s_RequestsLeft = -1;
+        s_IsRefusalLasting = false;
+        EXPECT_EQ(300u, zarvo_item_count(archive.get()));
+        uint64_t folders = 0;
+        uint64_t folder = archive.item(ZARVO_ROOT)->first_child;
+        for (; folder != ZARVO_NO_ITEM && folders <= 100; folder = archive.item(folder)->next_sibling)
+            ++folders;
+        EXPECT_EQ(100u, folders);
     }
 }
 

@@ -182,6 +182,28 @@ TEST(Opening, LyingSourcesAreAnswered) {
     EXPECT_EQ(ZARVO_ERROR_SYSTEM, zarvo_open_source(&liar, nullptr, &opened, nullptr));
 }
 
+TEST(Opening, WhateverACallbackAnswersIsAnError) {
+    static int s_Answer;
+    zarvo_source source = ZARVO_SOURCE_INIT;
+    source.read_at = [](void*, void*, size_t, uint64_t) { return int64_t{INT64_MIN}; };
+    source.get_size = [](void*, uint64_t* size) {
+        *size = UINT64_MAX;
+        return s_Answer;
+    };
+    const struct {
+        int answer;
+        int systemCode;
+    } cases[] = {{0, EIO}, {-ENOENT, ENOENT}, {1, EIO}, {INT32_MIN, EIO}};
+    for (const auto& row : cases) {
+        s_Answer = row.answer;
+        zarvo_archive* opened = nullptr;
+        zarvo_error* error = nullptr;
+        EXPECT_EQ(ZARVO_ERROR_SYSTEM, zarvo_open_source(&source, nullptr, &opened, &error)) << row.answer;
+        EXPECT_EQ(row.systemCode, zarvo_error_errno(error)) << row.answer;
+        zarvo_error_free(error);
+    }
+}
+
 TEST(Opening, ExceptionOfACallbackComesOutOfTheCall) {
     struct Throwing final : zarvo::source {
         [[noreturn]] int64_t read_at(std::span<std::byte>, uint64_t) override {

@@ -1,5 +1,7 @@
 #include "Tests/Library/LibraryTest.h"
 
+#include <ctime>
+
 namespace {
 
 bool Matches(std::string_view pattern, std::string_view path) {
@@ -121,4 +123,15 @@ TEST(Patterns, FindEachOfManyLiterals) {
         EXPECT_EQ(std::string_view(""), patterns.add("folder/" + std::to_string(number)).text());
     for (int number = 0; number < 20'000; ++number)
         EXPECT_EQ(number < 10'000, patterns.match("folder/" + std::to_string(number) + "/x")) << number;
+}
+
+// A path of many components costs its length, not its length for each folder above it.
+TEST(Patterns, DeepPathIsMatchedInOneGo) {
+    std::string deep = "x";
+    for (int level = 0; level < 300'000; ++level)
+        deep += "/x";
+    const clock_t start = clock();
+    EXPECT_EQ(false, Matches("**/y", deep));
+    EXPECT_EQ(true, Matches("**/y", deep + "/y/z"));
+    EXPECT_LE((clock() - start) / CLOCKS_PER_SEC, 20);
 }

@@ -1,5 +1,6 @@
 #include "Tests/Library/LibraryTest.h"
 
+#include <malloc.h>
 #include <map>
 #include <random>
 #include <thread>
@@ -102,7 +103,7 @@ TEST(Reading, FilesReadInTurnsShareTheCache) {
         zarvo::archive archive = *zarvo::archive::open(std::move(source));
         counts.bytesRead = 0;
         for (size_t from = 0; from < text.size(); from += 4'096)
-            for (const uint64_t file : {0, 1})
+            for (const uint64_t file : {uint64_t{0}, uint64_t{1}})
                 ASSERT_EQ(Delivered{text.substr(from, 4'096)}, Read(archive, file, from, 4'096));
         EXPECT_LE(counts.bytesRead.load(), archive.info().stored_size);
     }
@@ -122,6 +123,28 @@ TEST(Reading, OpenStreamsKeepTheirPlaces) {
         for (zarvo::stream& stream : streams)
             ASSERT_EQ(Delivered{text.substr(from, 100'000)}, ReadNext(stream, 100'000));
     EXPECT_LE(counts.bytesRead.load(), streams.size() * archive.info().stored_size);
+}
+
+// Properties that ask for 6 MB of decoder state count as what they cost.
+TEST(Reading, IdleStreamsStayInsideTheCache) {
+    const std::string text = SampleText(3'000'000);
+    constexpr char kLargestTables = 44; // 8 literal context bits, 4 literal position bits
+    const std::string bytes =
+        ArchiveOfOneBlock(text, kCompressionLzma, true, kLargestTables + CompressLzma(text).substr(1));
+    zarvo::archive archive = OpenBytes(bytes, {.cache_bytes = 1'000'000});
+    const auto usedMemory = [] {
+        const struct mallinfo2 info = mallinfo2();
+        return info.uordblks + info.hblkhd;
+    };
+    const size_t before = usedMemory();
+    {
+        std::vector<zarvo::stream> streams;
+        for (int number = 0; number < 10; ++number) {
+            streams.push_back(*archive.open_stream(0));
+            (void)ReadNext(streams.back(), 1); // damaged, but the state has been made
+        }
+    }
+    EXPECT_LE(usedMemory(), before + 10'000'000);
 }
 
 TEST(Reading, ThreadsReadOneArchiveAtOnce) {
@@ -278,7 +301,7 @@ TEST(Reading, BlockAboveTheLimitIsStreamedOrRefused) {
     const std::string bytes = ArchiveOfOneBlock(text, kCompressionLz4, false);
     zarvo::archive archive = OpenBytes(bytes, {.max_block_bytes = 299'999});
     char byte;
-    EXPECT_EQ("block 0 takes 300000 bytes of memory; the limit (max_block_bytes) is 299999",
+    EXPECT_EQ("block 0 takes 300000 bytes of memory, and the limit is 299999",
               archive.read(0, 0, std::as_writable_bytes(std::span(&byte, 1))).error.text());
 }
 
@@ -290,4 +313,5 @@ TEST(Reading, EmptyBlocksCostNothing) {
     const std::string bytes = BuildArchive({.entries = {{.path = "a", .bytes = "0123456789"}}, .blocks = blocks}).bytes;
     zarvo::archive archive = OpenBytes(bytes);
     EXPECT_EQ(Delivered{"23456"}, Read(archive, 0, 2, 5));
+    EXPECT_EQ(ZARVO_OK, archive.read_block(1, {}).error.code());
 }

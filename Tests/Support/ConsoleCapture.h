@@ -1,4 +1,4 @@
-// Takes what the console functions print for as long as it lives. One at a time, on the test's main thread.
+// Captures what the console functions print while it lives. One at a time, on the test's main thread.
 #pragma once
 
 #include "Runtime/Core/NonCopyable.h"

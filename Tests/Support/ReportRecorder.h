@@ -1,5 +1,5 @@
-// Takes the records of the log sink, with their source positions, for as long as it lives, and keeps them off the
-// console. One at a time, on the test's main thread.
+// Records the reports of the log sink with their source positions while it lives, and keeps them off the console. One
+// at a time, on the test's main thread.
 #pragma once
 
 #include "Tests/Support/ConsoleCapture.h"

@@ -1,4 +1,4 @@
-// Runs the command as its users do, in a process of its own, and keeps everything that it says.
+// Runs the command as its users do, in its own process, and returns everything that it prints.
 //
 //   EXPECT_EQ(Transcript(1, "Extracting file 'missing.zarvo'...\n..."), RunVarnex({"missing.zarvo"}, folder));
 //
@@ -13,27 +13,24 @@
 #include <utility>
 #include <vector>
 
-// The exit status, and what was printed to standard output and error together. A program that a signal has ended has
-// 1,000 and the signal as its status, one that can't be started 127. Two minutes are ended by SIGALRM.
+// The exit status, and what was printed to standard output and error together. A process that a signal has ended has
+// kStatusOfSignal plus the signal as its status.
 using Transcript = std::pair<int, std::string>;
 
-// Runs a program in a folder. In the new process, prepare is called before the program; false: it is not run.
-inline Transcript RunProgram(const char* program, const std::vector<std::string>& arguments,
-                             const std::string& folder = ".", const std::function<bool()>& prepare = {}) {
-    constexpr int kStatusNotStarted = 127, kStatusOfSignal = 1'000;
-    std::vector<char*> list = {const_cast<char*>("Varnex")};
-    for (const std::string& argument : arguments)
-        list.push_back(const_cast<char*>(argument.c_str()));
-    list.push_back(nullptr);
+constexpr int kStatusNotStarted = 127;
+constexpr int kStatusOfSignal = 1'000;
 
+// Runs body in a copy of this process, which ends with what body returns. SIGALRM ends it after two minutes.
+inline Transcript RunForked(const std::function<int()>& body) {
     FILE* const output = tmpfile();
+    fflush(stdout); // or the copy prints what is still buffered
     const pid_t process = fork();
     if (process == 0) {
         alarm(120);
-        if (dup2(fileno(output), STDOUT_FILENO) >= 0 && dup2(STDOUT_FILENO, STDERR_FILENO) >= 0 &&
-            chdir(folder.c_str()) == 0 && (prepare == nullptr || prepare()))
-            execv(program, list.data());
-        _exit(kStatusNotStarted);
+        if (dup2(fileno(output), STDOUT_FILENO) < 0 || dup2(STDOUT_FILENO, STDERR_FILENO) < 0) _exit(kStatusNotStarted);
+        const int status = body();
+        fflush(stdout);
+        _exit(status);
     }
     int status = kStatusNotStarted << 8;
     waitpid(process, &status, 0);
@@ -43,6 +40,20 @@ inline Transcript RunProgram(const char* program, const std::vector<std::string>
         transcript.second += static_cast<char>(byte);
     fclose(output);
     return transcript;
+}
+
+// Runs a program in folder. prepare is called in the new process, before the program. When it returns false, or the
+// program can't be started, the status is kStatusNotStarted.
+inline Transcript RunProgram(const char* program, const std::vector<std::string>& arguments,
+                             const std::string& folder = ".", const std::function<bool()>& prepare = {}) {
+    std::vector<char*> list = {const_cast<char*>("Varnex")};
+    for (const std::string& argument : arguments)
+        list.push_back(const_cast<char*>(argument.c_str()));
+    list.push_back(nullptr);
+    return RunForked([&] {
+        if (chdir(folder.c_str()) == 0 && (prepare == nullptr || prepare())) execv(program, list.data());
+        return kStatusNotStarted;
+    });
 }
 
 inline Transcript RunVarnex(const std::vector<std::string>& arguments, const std::string& folder = ".",

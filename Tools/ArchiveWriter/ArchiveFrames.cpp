@@ -15,8 +15,8 @@ UInt64 SumOfStoredSizes(const std::vector<StoredBlock>& blocks) {
     return sum;
 }
 
-// Nodes, as the block-based section and the old archive store them: 8 node[i].offset, 8 node[i].size, 4 node[i].flags,
-// path and NUL.
+// The nodes of the block-based section and of the old archive. Each is: 8 node[i].offset, 8 node[i].size,
+// 4 node[i].flags, path and NUL.
 void PutNodes(FieldWriter& writer, const std::vector<PlacedNode>& nodes) {
     for (size_t index = 0; index < nodes.size(); ++index) {
         writer.Put64(Indexed("node", index, "offset"), nodes[index].offset);
@@ -31,8 +31,8 @@ void PutNodes(FieldWriter& writer, const std::vector<PlacedNode>& nodes) {
 // 8 8  hash.high, hash.low
 // 4    blockCount
 // 10   each: 4 block[i].uncompressedSize, 4 block[i].compressedSize, 2 block[i].flags (kind, 0x40 streamed)
-// 4    nodeCount      (this and the nodes: only with the directory)
-//      nodes
+// 4    nodeCount      (only with the directory)
+//      nodes          (only with the directory)
 FieldWriter MakeSection(const ArchiveDescription& description, GivenFields& given,
                         const std::vector<StoredBlock>& blocks, const std::vector<PlacedNode>& nodes) {
     FieldWriter writer(given);
@@ -60,8 +60,8 @@ FieldWriter MakeSection(const ArchiveDescription& description, GivenFields& give
 // 4    compressedBlocksInfoSize
 // 4    uncompressedBlocksInfoSize
 // 4    flags: 0x3F kind of the section, 0x40 directory, 0x80 at the end, 0x100 web signature, 0x200 padded
-// 1    only with flag 0x100. Without it the ninth byte of "ZarvoWeb" is not counted either, and what follows
-//      stands in the place of the last byte of flags
+// 1    only with flag 0x100. Without it, the NUL of "ZarvoWeb" is not counted either, and what follows overwrites the
+//      last byte of flags
 //      from version 7 on: NULs up to a multiple of 16
 //      the section; with flag 0x200: NULs up to a multiple of 16 from its start
 //      the data
@@ -160,17 +160,17 @@ Frame MakeLegacyFrame(const ArchiveDescription& description, GivenFields& given,
 //
 //      signature and NUL
 // 8    headerPosition
-//      there, before or behind the data:
+//      at headerPosition, before or after the data:
 // 4    version
 //      engineVersion and NUL, engineRevision and NUL
 // 24   16 bytes, unused[0].word, unused[1].word
-// 4    directoryPosition, from headerPosition
+// 4    directoryPosition, counted from headerPosition
 // 4    dataPosition
 // 4    nodeCount
 //      nodes
 // 4    blockCount
-// 8    blockCount + 1 times, when there are blocks: running[i].uncompressed, from any start
-// 16   the same: 8 running[i].stored, 4 running[i].type, 4 running[i].streamed (bit 0)
+// 8    blockCount + 1 times, if there are blocks: running[i].uncompressed, from any start
+// 16   blockCount + 1 times, if there are blocks: 8 running[i].stored, 4 running[i].type, 4 running[i].streamed (bit 0)
 Frame MakeArchiveFrame(const ArchiveDescription& description, GivenFields& given,
                        const std::vector<StoredBlock>& blocks, const std::vector<PlacedNode>& nodes) {
     const std::string signature = description.signature.value_or("ZarvoArchive");
@@ -226,7 +226,7 @@ Frame MakeArchiveFrame(const ArchiveDescription& description, GivenFields& given
 // 4    entryCount
 // each:
 //      path, NUL-terminated
-// 4    node[i].offset, in the stream, which this directory is part of
+// 4    node[i].offset, in the stream that this directory is part of
 // 4    node[i].size
 FieldWriter MakeLegacyDirectory(GivenFields& given, const std::vector<PlacedNode>& nodes) {
     FieldWriter writer(given);

@@ -1,4 +1,5 @@
-// What the archive writer puts around an archive's data: fields by name, and the tables of the layouts. Private to it.
+// What the archive writer puts around an archive's data: named fields, and the tables of the layouts. Private to the
+// writer.
 #pragma once
 
 #include "Tools/ArchiveWriter/ArchiveWriter.h"
@@ -8,14 +9,14 @@
 #include <string>
 #include <vector>
 
-// The values that a description gives to fields, and which of them have been stored.
+// The values that a description gives to fields, and the names of all fields that have been stored.
 struct GivenFields {
     const std::map<std::string, UInt64>& values;
-    bool namesMatter = true; // false: nobody asks for a field by its name, so none is remembered
+    bool namesMatter = true; // false when no field is asked for by name, so that none need be remembered
     std::set<std::string> stored = {};
 };
 
-// Big-endian fields and texts, one after another; a named field may be given another value than the writer's.
+// Big-endian fields and texts, one after another. A value in given replaces the writer's.
 class FieldWriter {
 public:
     explicit FieldWriter(GivenFields& given) : m_Given(given) {}
@@ -27,7 +28,7 @@ public:
     void PutBytes(const std::string& bytes) { m_Bytes += bytes; }
     void ResizeTo(UInt64 size) { m_Bytes.resize(size, '\0'); }
 
-    // Adds the fields of another part, which starts at the end of this one.
+    // Appends another part with its fields.
     void PutPart(const FieldWriter& part) {
         for (const auto& [name, field] : part.m_Fields)
             m_Fields[name] = {m_Bytes.size() + field.position, field.size};
@@ -65,7 +66,7 @@ struct PlacedNode {
     UInt64 size;
 };
 
-// What stands around the data.
+// What comes before and after the data.
 struct Frame {
     FieldWriter head;
     FieldWriter tail;
@@ -74,7 +75,7 @@ struct Frame {
     UInt64 sectionSize = 0;
 };
 
-// The directory that the data stream of the legacy layouts starts with.
+// The directory at the start of the legacy layouts' data stream.
 FieldWriter MakeLegacyDirectory(GivenFields& given, const std::vector<PlacedNode>& nodes);
 
 Frame MakeFrame(const ArchiveDescription& description, GivenFields& given, const std::vector<StoredBlock>& blocks,

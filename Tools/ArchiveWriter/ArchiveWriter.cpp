@@ -8,12 +8,12 @@
 #include <filesystem>
 #include <fstream>
 
-// The archive is made in three parts: what stands before the data (head), the data, what stands behind it (tail). The
-// data is made first, since the sizes of the stored blocks stand in one of the other two.
+// The archive is made in three parts: what comes before the data (head), the data, and what comes after it (tail). The
+// data is made first, because one of the other parts stores the sizes of its blocks.
 
 namespace {
 
-constexpr UInt64 kPieceSize = 1'048'576; // of what need not be in memory whole
+constexpr UInt64 kPieceSize = 1'048'576; // bytes that are copied at once
 
 void Require(bool isTrue, const std::string& message) {
     if (isTrue) return;
@@ -21,14 +21,14 @@ void Require(bool isTrue, const std::string& message) {
     abort();
 }
 
-// The data stream: the entries' bytes one after another, behind the legacy directory where there is one. It is read
-// from its start to its end, once.
+// The data stream: the legacy directory if there is one, then the entries' bytes one after another. It can be read
+// once, from start to end.
 class DataStream {
 public:
     DataStream(const ArchiveDescription& description, GivenFields& given) : m_Description(description) {
         m_Size = Place(0);
         if (!HasLegacyDirectory(description.layout)) return;
-        // Its size does not depend on where the entries lie; its contents do.
+        // The directory's contents depend on where the entries lie, but its size does not.
         m_Size = Place(MakeLegacyDirectory(given, m_Nodes).Size());
         m_Pending = MakeLegacyDirectory(given, m_Nodes).Bytes();
     }
@@ -54,7 +54,7 @@ public:
     }
 
 private:
-    // Places the entries from offset on; the end of the last one.
+    // Places the entries from offset on. Returns the end of the last one.
     UInt64 Place(UInt64 offset) {
         m_Nodes.clear();
         for (const ArchiveEntry& entry : m_Description.entries) {
@@ -97,9 +97,9 @@ private:
     std::vector<PlacedNode> m_Nodes;
     UInt64 m_Size = 0;
     size_t m_NextEntry = 0;
-    std::string m_Pending; // loaded
-    size_t m_Taken = 0;    // of it
-    std::ifstream m_File;  // of the entry before m_NextEntry
+    std::string m_Pending; // bytes that have been loaded
+    size_t m_Taken = 0;    // how many of them Next has returned
+    std::ifstream m_File;  // the source file of the entry before m_NextEntry
 };
 
 CompressionType TypeOf(const ArchiveDescription& description, const ArchiveBlock& block) {
@@ -108,7 +108,7 @@ CompressionType TypeOf(const ArchiveDescription& description, const ArchiveBlock
     return block.type.value_or(description.type);
 }
 
-// Stores the next block of the stream; its stored size.
+// Stores the next block of the stream. Returns its stored size.
 UInt64 StoreBlock(const ArchiveDescription& description, const ArchiveBlock& block, DataStream& stream,
                   const ByteSink& sink) {
     UInt64 storedSize = 0;
@@ -134,7 +134,7 @@ UInt64 StoreBlock(const ArchiveDescription& description, const ArchiveBlock& blo
             store(next(kPieceSize));
         break;
     case kCompressionLzma: {
-        // The legacy stream has the size of its data, least significant byte first, behind the properties.
+        // In the legacy stream, the size of its data follows the properties, least significant byte first.
         std::string sizeField;
         for (int byte = 0; byte < 8 && description.layout == ArchiveLayout::kWeb; ++byte)
             sizeField.push_back(static_cast<char>(block.size >> (8 * byte)));
@@ -219,7 +219,7 @@ BuiltArchive BuildArchive(const ArchiveDescription& description) {
 }
 
 ArchivePlan WriteArchive(const ArchiveDescription& description, const std::string& outputFile) {
-    // The data is written first and its sizes stand before it, so it waits in a file of its own.
+    // The data is made first, but parts that depend on it come before it. It is kept in a temporary file until then.
     const std::string dataFile = outputFile + ".data";
     GivenFields given{description.fields, !description.fields.empty()};
     ArchivePlan plan;

@@ -11,14 +11,14 @@ namespace {
 void* AllocateForEncoder(void*, size_t size) { return malloc(size); }
 void FreeForEncoder(void*, void* address) { free(address); }
 
-// An encoder that fails leaves nothing to test with.
+// No test can go on without its archive.
 void RequireEncoded(bool isEncoded, const char* encoder) {
     if (isEncoded) return;
     fprintf(stderr, "%s could not encode\n", encoder);
     abort();
 }
 
-// The SDK's streams: its functions find the rest of the record behind the pointer to its first member.
+// The SDK's streams. The SDK passes a pointer to the first member, through which the functions below reach the others.
 struct EncoderInput {
     ISeqInStream stream;
     const ByteSource& source;

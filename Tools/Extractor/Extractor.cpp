@@ -1,5 +1,6 @@
 #include "Tools/Extractor/Extractor.h"
 
+#include "Runtime/Allocator/Allocator.h"
 #include "Runtime/Utilities/FileUtilities.h"
 #include "Runtime/Utilities/LogAssert.h"
 #include "Runtime/Utilities/PathNameUtility.h"
@@ -15,41 +16,42 @@ using ArchiveStorageHeader::Node;
 
 constexpr UInt64 kTransferSize = 65'536;
 
-// Where entries go. A stored path decides what is made below the output folder, and never where that folder is.
+// The folder that entries are written to. A stored path decides what is made below it, never where it is.
 class OutputFolder {
 public:
+    // archivePath must have at most kMaxPathLength characters.
     explicit OutputFolder(core::string_ref archivePath) {
         // A leading "~" is part of the name here, not the home folder.
         const core::string_ref start = archivePath.starts_with("~") ? "./" : "", end = "_data";
-        // Without memory there is no folder: half its path would name another one.
-        if (m_Path.grow(start.size() + archivePath.size() + end.size()) == nullptr) return;
+        RequireMemory(m_Path.grow(start.size() + archivePath.size() + end.size()));
         m_Path += start;
         m_Path += archivePath;
         m_Path += end;
-        m_AbsoluteLength = PathToAbsolutePath(m_Path).size(); // 0 without memory
+        m_AbsoluteLength = PathToAbsolutePath(m_Path).size();
     }
 
-    // False when an entry would cut the folder's path, or memory for it was refused. A folder that can't be made is no
-    // failure yet: it may be there already, and if it is not, every entry says so.
+    // False when the path is too long for a file system entry. A folder that can't be made is not a failure yet: it may
+    // exist already, and otherwise every entry reports it.
     bool Create() const {
-        if (m_AbsoluteLength == 0 || m_Path.size() > kMaxPathLength) return false;
+        if (m_Path.size() > kMaxPathLength) return false;
         FileSystemEntry entry(m_Path.c_str());
         (void)entry.CreateAsDir();
         return true;
     }
 
-    // The path of an entry on disk. False for one that would leave the folder, or whose path, as it is or absolute,
-    // would be cut to another one's.
+    // Sets *joined to the path of an entry on disk. False for an entry that would leave the folder, or whose path is
+    // too long for a file system entry, as it is or made absolute: cut, it would name another file.
     bool Resolve(core::string_ref path, core::string* joined) const {
-        if (m_AbsoluteLength == 0 || HasParentComponent(path)) return false;
+        if (path.size() > kMaxPathLength || HasParentComponent(path)) return false;
         joined->clear();
+        RequireMemory(joined->grow(m_Path.size() + 1 + path.size()));
         AppendPathNameImpl(m_Path, path, '/', *joined);
-        if (joined->size() < m_Path.size()) return false; // memory was refused
         const size_t absoluteLength = m_AbsoluteLength + (joined->size() - m_Path.size());
         return std::max(joined->size(), absoluteLength) <= kMaxPathLength;
     }
 
-    // Makes the folder that an entry's path names, and those above it, where they are missing. The path is kept.
+    // Makes the folder that an entry's path names, and the missing ones above it. The text of path must outlive this
+    // object.
     bool CreateFolder(core::string_ref path) {
         core::string joined(kMemLabelGeneral);
         if (!Resolve(path, &joined) || !CreateDirectoryRecursive(joined)) return false;
@@ -57,11 +59,11 @@ public:
         return true;
     }
 
-    // Whether the folder is the one that was made, or found, last.
+    // Whether path is the one that CreateFolder made, or found, last.
     bool IsLastFolder(core::string_ref path) const { return m_LastFolder == path; }
 
 private:
-    // Entries turn backslashes into "/", so they separate components here too.
+    // A file system entry turns backslashes into "/", so they separate components here too.
     static bool HasParentComponent(core::string_ref path) {
         size_t start = 0;
         for (size_t index = 0; index <= path.size(); ++index) {
@@ -73,7 +75,7 @@ private:
     }
 
     core::string m_Path;
-    size_t m_AbsoluteLength = 0; // 0: memory for the path was refused
+    size_t m_AbsoluteLength = 0; // of m_Path made absolute
     std::optional<core::string_ref> m_LastFolder;
 };
 
@@ -89,7 +91,7 @@ bool CopyNode(ArchiveStorageReader& reader, const Node& node, FileAccessor& file
     while (copied < node.size) {
         UInt64 delivered = 0;
         const UInt64 wanted = std::min(node.size - copied, kTransferSize);
-        // An empty buffer: memory for it was refused.
+        // The buffer is empty when memory for it was refused.
         if (buffer.empty() || !reader.Read(node.offset + copied, wanted, buffer.data(), &delivered)) {
             printf_console("ERROR: failed to decompress file %s\n", node.path.c_str());
             return false;
@@ -101,7 +103,7 @@ bool CopyNode(ArchiveStorageReader& reader, const Node& node, FileAccessor& file
         }
         copied += delivered;
     }
-    // Some file systems report only here that the bytes did not fit.
+    // Some file systems report a full disk only when the file is closed.
     if (!file.Close()) {
         printf_console("ERROR: failed to write file %s\n", node.path.c_str());
         return false;
@@ -121,30 +123,23 @@ bool ExtractFile(ArchiveStorageReader& reader, const Node& node, OutputFolder& o
         printf_console("ERROR: failed to create file %s\n", node.path.c_str());
         return false;
     }
-    FileAccessor file;
-    bool isOk = true;
-    // The folder of the file before is there still, or the open fails.
     const core::string_ref parent = DeleteLastPathNameComponent(node.path);
-    bool isOpen = output.IsLastFolder(parent) && file.Open(path.c_str(), kFilePermissionWrite);
-    if (!isOpen) {
-        (void)file.Close(); // nothing is open
-        isOk = output.CreateFolder(parent);
-        if (!isOk)
-            printf_console("ERROR: failed to create directory %s\n", core::string(parent, kMemLabelGeneral).c_str());
-        isOpen = file.Open(path.c_str(), kFilePermissionWrite);
-    }
-    if (!isOpen) {
+    const bool hasFolder = output.IsLastFolder(parent) || output.CreateFolder(parent);
+    if (!hasFolder)
+        printf_console("ERROR: failed to create directory %s\n", core::string(parent, kMemLabelGeneral).c_str());
+    FileAccessor file;
+    if (!file.Open(path.c_str(), kFilePermissionWrite)) {
         printf_console("ERROR: failed to create file %s\n", node.path.c_str());
         return false;
     }
-    return CopyNode(reader, node, file, buffer) && isOk;
+    return CopyNode(reader, node, file, buffer) && hasFolder;
 }
 
 } // namespace
 
 bool ExtractArchive(const char* archivePath) {
     ArchiveStorageReader reader(kMemLabelFileSystem);
-    // An entry would cut a longer path, and another file would be read.
+    // A file system entry would cut a longer path, and another file would be read.
     if (strlen(archivePath) > kMaxPathLength || reader.Initialize(core::string(archivePath), 0) != 0) {
         printf_console("ERROR: can't read or not a zarvo web file\n");
         return false;
@@ -152,7 +147,7 @@ bool ExtractArchive(const char* archivePath) {
     PrintHeader(reader.GetHeader());
 
     dynamic_array<UInt8> buffer(kMemLabelGeneral);
-    (void)buffer.resize_uninitialized(kTransferSize, kResizeExact); // without it the files that have bytes fail
+    (void)buffer.resize_uninitialized(kTransferSize, kResizeExact); // without it, every file that is not empty fails
     if (!reader.FindDirectory(ArchiveStorageReader::kDirectoryPiecesWhole)) {
         printf_console("ERROR: failed to parse files information\n");
         return false;
@@ -161,7 +156,7 @@ bool ExtractArchive(const char* archivePath) {
     printf_console("  creating folder '%s_data'\n", archivePath);
     OutputFolder output(archivePath);
     bool isAllOk = output.Create();
-    // Every entry says so, too; without entries somebody has to.
+    // Every entry reports this too; an archive without entries would fail silently.
     if (!isAllOk && reader.GetDirectoryInfo().nodes.empty())
         printf_console("ERROR: failed to create directory %s_data\n", archivePath);
     for (size_t index = 0; index < reader.GetDirectoryInfo().nodes.size(); ++index) {

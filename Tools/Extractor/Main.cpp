@@ -1,5 +1,5 @@
-// Varnex <zarvowebfile>: the argument, start-up and clean-up around the road, and the exit status: 0 when every entry
-// was written, 1 otherwise.
+// Varnex <zarvowebfile>: takes the argument, runs ExtractArchive between start-up and clean-up, and exits with 0 when
+// every entry was written, with 1 otherwise.
 #include "Footing/Process.h"
 #include "Runtime/Utilities/RegisterRuntimeInitializeAndCleanup.h"
 #include "Runtime/VirtualFileSystem/VirtualFileSystem.h"
@@ -10,10 +10,10 @@
 #include <cstdlib>
 
 int main(int argumentCount, char** arguments) {
-    // First of all, so that no file of ours becomes the standard output.
+    // Comes first: a file that is opened while descriptor 1 is closed would become the standard output.
     ZarvoClassic::Footing_Process_OpenStandardDescriptors();
-    // Who stops listening to our messages does not stop the extraction, and a file that grows past a limit is one that
-    // can't be written.
+    // A closed stdout must not end the extraction (SIGPIPE). A file that hits the size limit fails like one on a full
+    // disk (SIGXFSZ).
     signal(SIGPIPE, SIG_IGN);
     signal(SIGXFSZ, SIG_IGN);
 

@@ -1,5 +1,5 @@
-// getattrlistbulk over this system's own listing of a folder. The position lies in the descriptor, as on the platform:
-// an entry whose record does not fit is returned to by seeking the descriptor back.
+// getattrlistbulk, made from this system's own listing of a folder. As on the platform, the position belongs to the
+// descriptor: when a record does not fit, the descriptor is moved back to its entry.
 #include "PlatformDependent/OSX/Standin/Faults.h"
 #include "PlatformDependent/OSX/Standin/FileFlags.h"
 
@@ -15,7 +15,7 @@
 namespace {
 
 constexpr size_t kListingSize = 32768;
-constexpr size_t kLongestListedName = 512; // room for any one entry of the system's listing
+constexpr size_t kLongestListedName = 512; // room for the longest entry of the system's listing
 constexpr size_t kRecordAlignment = 8;
 
 constexpr uint32_t kKnownCommon =
@@ -75,7 +75,7 @@ std::string MakeRecord(int descriptor, const char* name, const attrlist& request
     if (common & ATTR_CMN_MODTIME) Append(record, status.st_mtim);
     if (common & ATTR_CMN_FLAGS) {
         const std::string path = "/proc/self/fd/" + std::to_string(descriptor) + "/" + name;
-        Append(record, S_ISLNK(status.st_mode) ? 0 : FileFlagsOf(path.c_str())); // links have none of their own
+        Append(record, S_ISLNK(status.st_mode) ? 0 : FileFlagsOf(path.c_str())); // links have no flags
     }
     if (file & ATTR_FILE_TOTALSIZE) Append(record, static_cast<int64_t>(status.st_size));
     if (common & ATTR_CMN_NAME) {
@@ -89,7 +89,7 @@ std::string MakeRecord(int descriptor, const char* name, const attrlist& request
     auto length = static_cast<uint32_t>(record.size());
     if (altered && gStandinFaults.cut) length = gStandinFaults.cutLength;
     Overwrite(record, 0, length);
-    // A record that is cut is followed by the next one; a length that says nothing true leaves the record whole.
+    // A shorter length cuts the record, and the next one follows at once; any other length leaves the record whole.
     if (length >= sizeof(length) && length < record.size()) record.resize(length);
     return record;
 }
@@ -120,13 +120,13 @@ int getattrlistbulk(int descriptor, void* list, void* buffer, size_t size, uint6
 
     int count = 0;
     size_t used = 0;
-    off_t position = lseek(descriptor, 0, SEEK_CUR); // of the next entry; a bad descriptor is found by the listing
+    off_t position = lseek(descriptor, 0, SEEK_CUR); // of the next entry; SYS_getdents64 reports a bad descriptor
     alignas(dirent64) char listing[kListingSize];
     for (;;) {
-        // Not many more entries than there is room for: what is read in vain is read again.
+        // Don't read many more entries than there is room for: the surplus must be read again.
         const size_t listingSize = std::clamp((size - used) / 2, kLongestListedName, sizeof(listing));
         const long length = syscall(SYS_getdents64, descriptor, listing, listingSize);
-        if (length < 0) return count > 0 ? count : -1; // what is packed is delivered; the next call meets it again
+        if (length < 0) return count > 0 ? count : -1; // deliver the packed records; the next call fails again
         if (length == 0) return count;
         for (long at = 0; at < length;) {
             const auto& entry = *reinterpret_cast<const dirent64*>(listing + at);

@@ -1,4 +1,4 @@
-// What the stand-in is told to fail, for tests: set the fields of gStandinFaults, and let a ScopedFaults clear them.
+// The faults that tests inject into the stand-in: set fields of gStandinFaults, and let a ScopedFaults clear them.
 //
 //   ScopedFaults faults;
 //   gStandinFaults.trashRefuses = true;
@@ -12,15 +12,15 @@
 
 struct StandinFaults {
     // getattrlistbulk
-    int recordsBeforeListingError = -1; // records delivered, over all calls, before one call fails; -1: never
+    int recordsBeforeListingError = -1; // one call fails after this many records, over all calls; -1: never
     int listingError = 0;               // with this errno
-    int callsTooSmall = 0;              // this many calls answer ERANGE first
+    int callsTooSmall = 0;              // the first so many calls fail with ERANGE
     std::string entryErrorName = {};    // this entry's record reports an error
     std::string alteredName = {};       // the record of this entry ...
     uint32_t missingCommon = 0;         // ... lacks these attributes
     uint32_t missingFile = 0;           // ... and these
-    int32_t movedName = 0;              // ... has its name so many bytes from where it is
-    bool cut = false;                   // ... says that it ends after cutLength bytes, and does
+    int32_t movedName = 0;              // ... points this many bytes past its name
+    bool cut = false;                   // ... is cut to cutLength bytes
     uint32_t cutLength = 0;
 
     int chflagsError = 0;         // chflags fails with this errno
@@ -37,5 +37,5 @@ public:
     ScopedFaults& operator=(const ScopedFaults&) = delete;
 };
 
-// Objects that are alive in this thread.
+// How many of this thread's objects are alive.
 size_t CountStandinObjects();

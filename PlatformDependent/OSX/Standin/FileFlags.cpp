@@ -1,6 +1,6 @@
-// File flags, which this system's files do not have. A file's flags are an extended attribute of it, as decimal digits.
-// Where that can't be written (pipes, devices, systems without extended attributes, files that even their owner may not
-// write), they are kept in a table for as long as the process lives, and the table is asked first.
+// File flags, which this system does not have. They are stored in an extended attribute of the file, as decimal digits.
+// Where that can't be written (pipes, devices, disks without extended attributes, read-only files), a table holds them
+// until the process ends. The table is looked up first.
 #include "PlatformDependent/OSX/Standin/FileFlags.h"
 
 #include "PlatformDependent/OSX/Standin/Faults.h"
@@ -19,7 +19,7 @@ namespace {
 
 constexpr char kAttribute[] = "user.zarvo.flags";
 
-// Device, inode and time of birth: a file that gets a freed inode is another one.
+// Device, inode and time of birth, which tells apart files that get the same inode one after the other.
 using FileIdentity = std::tuple<uint32_t, uint32_t, uint64_t, int64_t, uint32_t>;
 
 std::mutex gTableLock;
@@ -70,6 +70,6 @@ int chflags(const char* path, uint32_t flags) {
     const std::string digits = std::to_string(flags);
     const bool isStored = flags == 0 ? removexattr(path, kAttribute) == 0 || errno == ENODATA
                                      : setxattr(path, kAttribute, digits.data(), digits.size(), 0) == 0;
-    if (!isStored) gTable[identity] = flags; // 0 too: the attribute that could not be changed says otherwise
+    if (!isStored) gTable[identity] = flags; // even 0: the attribute still holds the old flags
     return 0;
 }

@@ -1,7 +1,7 @@
-// The stand-in's record of file flags, for its other files.
+// File flags, for the other files of the stand-in.
 #pragma once
 
 #include <PlatformSystem.h>
 
-// Follows links; 0 for what is missing. Leaves errno as it is. Any thread.
+// Follows links; 0 for a missing file. Does not change errno. Any thread.
 uint32_t FileFlagsOf(const char* path);

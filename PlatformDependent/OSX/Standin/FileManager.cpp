@@ -1,4 +1,4 @@
-// Files as the platform's file manager and workspace make, copy and throw them away.
+// The platform's file manager and workspace: how they create, copy and trash files.
 #include "PlatformDependent/OSX/Standin/Faults.h"
 #include "PlatformDependent/OSX/Standin/Objects.h"
 
@@ -15,7 +15,7 @@ namespace {
 
 constexpr char kRecycle[] = "recycle";
 constexpr size_t kCopySize = 65536;
-constexpr int kMaxLinks = 40; // followed in one path, as the system does
+constexpr int kMaxLinks = 40; // per path, the system's own limit
 constexpr mode_t kModeBits = 07777;
 
 bool ExistsItself(const std::string& path) {
@@ -29,7 +29,7 @@ std::string ReadLink(const std::string& path) {
     return std::string(buffer, length > 0 ? static_cast<size_t>(length) : 0);
 }
 
-// The names in a folder, "." and ".." left out; false when it can't be read.
+// The names in a folder without "." and ".."; false when it can't be read.
 bool ListNames(const std::string& path, std::vector<std::string>* names) {
     DIR* folder = opendir(path.c_str());
     if (folder == nullptr) return false;
@@ -91,7 +91,7 @@ bool CopyTree(const std::string& source, const std::string& destination) {
     if (!ListNames(source, &names) || mkdir(destination.c_str(), 0700) != 0) return false;
     for (const std::string& name : names)
         if (!CopyTree(source + "/" + name, destination + "/" + name)) return false;
-    return chmod(destination.c_str(), status.st_mode & kModeBits) == 0; // last: it may forbid writing
+    return chmod(destination.c_str(), status.st_mode & kModeBits) == 0; // last, as it may forbid writing
 }
 
 std::string ResolvedWithSlash(const std::string& path) {
@@ -99,12 +99,12 @@ std::string ResolvedWithSlash(const std::string& path) {
     return resolved == "/" ? resolved : resolved + "/";
 }
 
-// Whether path, which may not exist yet, would lie inside folder: a folder can't be copied into itself.
+// Whether path, which need not exist, lies inside folder. A folder can't be copied into itself.
 bool LiesInside(const std::string& path, const std::string& folder) {
     return ResolvedWithSlash(path.substr(0, path.find_last_of('/') + 1) + ".").starts_with(ResolvedWithSlash(folder));
 }
 
-// Moves the file or folder into the trash, under a name that is free there.
+// Moves a file or folder to the trash, with a number after its name if the name is taken.
 bool MoveIntoTrash(const std::string& folder, const std::string& name) {
     const std::string trash = Platform_HomeDirectory()->text + "/.Trash";
     if (mkdir(trash.c_str(), 0700) != 0 && errno != EEXIST) return false;
@@ -116,8 +116,7 @@ bool MoveIntoTrash(const std::string& folder, const std::string& name) {
 
 } // namespace
 
-// Two things that the platform does besides are left out, as they have no meaning here: a leading "~" is not expanded,
-// and a leading "/private" is not taken away.
+// Unlike the platform, this does not expand a leading "~" or drop a leading "/private", which mean nothing here.
 std::string ResolveLinks(const std::string& path) {
     const bool absolute = !path.empty() && path[0] == '/';
     std::string resolved = absolute ? "/" : "";
@@ -135,7 +134,7 @@ std::string ResolveLinks(const std::string& path) {
         const std::string last = resolved.substr(slash == std::string::npos ? 0 : slash + 1);
         if (component == ".." && resolved == "/") continue;
         if (component == ".." && !last.empty() && last != "..") {
-            resolved.erase(slash == std::string::npos ? 0 : slash == 0 ? 1 : slash); // no link is left in it
+            resolved.erase(slash == std::string::npos ? 0 : slash == 0 ? 1 : slash); // its links are resolved already
             continue;
         }
         const std::string target = ReadLink(candidate);

@@ -13,7 +13,7 @@ StandinFaults gStandinFaults;
 
 namespace {
 
-// The objects of all pools of a thread, the innermost pool's last: a pool is the height at which it began.
+// The objects of all pools of a thread, the innermost pool's last. A pool remembers how many there were at its start.
 class ThreadPools {
 public:
     ~ThreadPools() { FreeDownTo(0); }
@@ -30,18 +30,18 @@ thread_local ThreadPools tPools;
 
 bool IsContinuation(unsigned char byte) { return (byte & 0xC0) == 0x80; }
 
-// The length of the valid UTF-8 sequence that the text starts with; 0 when it starts with none.
+// The length of the UTF-8 sequence at the start of text; 0 when it is not valid.
 size_t SequenceLength(const unsigned char* text, size_t length) {
     const unsigned char lead = text[0];
     if (lead < 0x80) return 1;
     const size_t count = lead >= 0xF0 ? 4 : lead >= 0xE0 ? 3 : 2;
-    if (lead < 0xC2 || lead > 0xF4 || length < count) return 0; // C0 and C1 lead only longer forms than needed
+    if (lead < 0xC2 || lead > 0xF4 || length < count) return 0; // C0 and C1 start only overlong forms
     for (size_t i = 1; i < count; ++i)
         if (!IsContinuation(text[i])) return 0;
     const unsigned char second = text[1];
-    if (lead == 0xE0 && second < 0xA0) return 0; // longer than needed
+    if (lead == 0xE0 && second < 0xA0) return 0; // overlong
     if (lead == 0xED && second > 0x9F) return 0; // surrogates
-    if (lead == 0xF0 && second < 0x90) return 0; // longer than needed
+    if (lead == 0xF0 && second < 0x90) return 0; // overlong
     if (lead == 0xF4 && second > 0x8F) return 0; // above the last code point
     return count;
 }
@@ -99,11 +99,11 @@ NSURL* NSURL_fileURLWithPath(NSString* path) {
     if (path == nullptr) return nullptr;
     std::string absolute = path->text;
     if (!absolute.empty() && absolute[0] != '/') {
-        // Against the working directory the path's own leading "." says nothing.
+        // A leading "." adds nothing to the working directory.
         while (absolute == "." || absolute.compare(0, 2, "./") == 0)
             absolute.erase(0, std::min(absolute.find_first_not_of('/', 1), absolute.size()));
         const std::string folder = WorkingDirectory();
-        if (folder.empty()) return MakeAutoreleased<NSURL>(folder); // deleted: the path leads nowhere
+        if (folder.empty()) return MakeAutoreleased<NSURL>(folder); // it was deleted
         absolute.insert(0, folder == "/" ? folder : folder + "/");
     }
     while (absolute.size() > 1 && absolute.back() == '/')
@@ -125,7 +125,7 @@ NSString* NSArray_firstObject(NSArray* array) {
 
 NSString* NSBundle_executablePath() { return MakeAutoreleased<NSString>(PathOfExecutable()); }
 
-// A program that is no application bundle has the folder that it lies in for one.
+// The bundle of a program that is not in one is its folder.
 NSString* NSBundle_bundlePath() {
     const std::string path = gStandinFaults.emptyBundlePath ? "" : PathOfExecutable();
     return MakeAutoreleased<NSString>(path.substr(0, path.find_last_of('/')));

@@ -1,4 +1,4 @@
-// The stand-in's objects: each holds its value, and is owned by the autorelease pool that it was made in.
+// The stand-in's objects. Each holds its value and is owned by the autorelease pool that it was made in.
 #pragma once
 
 #include "PlatformDependent/OSX/Platform.h"
@@ -26,10 +26,10 @@ public:
 class NSArray : public StandinObject {
 public:
     explicit NSArray(std::vector<NSString*> value) : objects(std::move(value)) {}
-    const std::vector<NSString*> objects; // made in the same pool or one around it
+    const std::vector<NSString*> objects; // made in the same pool or an outer one
 };
 
-// Hands object, made with plain new, to the current pool; null stays null.
+// Gives object, made with plain new, to the current pool. Null is allowed.
 void AddToAutoreleasePool(StandinObject* object);
 
 template <typename T, typename Value>
@@ -39,5 +39,5 @@ T* MakeAutoreleased(Value value) {
     return object;
 }
 
-// path without links, "//", "." and trailing "/", as far as it exists.
+// See NSString_stringByResolvingSymlinksInPath.
 std::string ResolveLinks(const std::string& path);

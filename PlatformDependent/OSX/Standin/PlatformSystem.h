@@ -1,5 +1,5 @@
-// The system calls of the platform that this system lacks, under their own names: file status with file flags, chflags
-// and getattrlistbulk. See Platform.h for what stands here on a Mac. Any thread.
+// The platform's system calls that this system lacks, under their own names: file status with file flags, chflags and
+// getattrlistbulk. Platform.h says what this header is on a Mac. Any thread.
 #pragma once
 
 #include <cstddef>
@@ -7,8 +7,8 @@
 #include <ctime>
 #include <sys/stat.h>
 
-// File flags. They are kept with the file, in an extended attribute, or where that can't be written, in this process.
-constexpr int UF_HIDDEN = 0x8000; // of this type on a Mac too
+// File flags. They are stored in an extended attribute of the file or, where that can't be written, in this process.
+constexpr int UF_HIDDEN = 0x8000; // an int on a Mac too
 
 struct PlatformStatus : stat {
     uint32_t st_flags;
@@ -57,17 +57,18 @@ struct attrreference_t {
     uint32_t attr_length;    // the terminating NUL included
 };
 
-// Fills buffer with records of the next entries of the folder that descriptor is open on, without "." and "..", as many
-// as fit; the position is the descriptor's. Returns their number, 0 when there are no more, or -1 with errno: ERANGE
-// when not even one fits (the position stays), EBADF, ENOTDIR, EINVAL for a request that is not understood. The list
-// has to ask for the returned set and the name. A record holds, packed to 4 bytes and without what it lacks:
+// Fills buffer with as many records as fit of the next entries, without "." and "..", of the folder that descriptor is
+// open on. The position belongs to the descriptor. Returns the number of records, 0 at the end, or -1 with errno:
+// ERANGE when not even one fits (the position stays), EBADF, ENOTDIR, EINVAL for a request that is not supported. list
+// must ask for the returned set and the name. A record holds these fields, packed to 4 bytes; a missing field takes no
+// room:
 //
 //   0   length of the record, a multiple of 8   uint32_t
 //   4   returned set                            attribute_set_t
-//   24  error, only in records that report one  uint32_t: such a record has error and name alone
+//   24  error, only in records that report one  uint32_t: such a record has only error and name
 //   24  name                                    attrreference_t; the text follows the fixed part
 //   32  object type                             uint32_t: a vtype
 //   36  modification time                       timespec
 //   52  flags                                   uint32_t
-//   56  total size, of all but folders          int64_t
+//   56  total size, not of folders              int64_t
 int getattrlistbulk(int descriptor, void* list, void* buffer, size_t size, uint64_t options);

@@ -5,7 +5,7 @@
 
 namespace dynamic_array_detail {
 
-// A product that does not fit becomes a size that every allocation refuses, not a small one.
+// A product that overflows becomes a size that every allocation refuses; wrapped around, it would be a small one.
 static size_t GetByteCount(size_t capacity, size_t elementSize) {
     size_t bytes = 0;
     return __builtin_mul_overflow(capacity, elementSize, &bytes) ? ~size_t{0} : bytes;
@@ -32,7 +32,7 @@ void* dynamic_array_data::reserve(size_t capacity, size_t elementSize, size_t al
         }
         buffer = realloc_internal(data, byteCount, alignment, label, kAllocateOptionNone, __FILE__, __LINE__);
     }
-    // Refused: the old buffer is still there, and stays.
+    // Memory was refused: the old buffer stays in use.
     if (buffer == nullptr && byteCount != 0) return data;
     data = buffer;
     capacityWord = capacity * 2;

@@ -1,22 +1,21 @@
 // dynamic_array: a growable array with a memory label that it keeps for life. It may also wrap memory that it does not
-// own, which it reads and writes but never frees; its first growth copies the elements into a buffer of its own.
+// own: it reads and writes that memory but never frees it, and its first growth copies the elements into its own
+// buffer.
 //
 //   dynamic_array<UInt8> stored(kMemLabelReadBatch);
-//   stored.resize_uninitialized(size);   // bytes that are about to be overwritten are not cleared
+//   if (!stored.resize_uninitialized(size)) return false;   // the bytes are not cleared first
 //   auto window = dynamic_array<UInt8>::wrap(destination, 0, room, kMemLabelFileSystem);
 //
-// Growth moves elements byte by byte without calling anything of theirs, so an element must hold no pointer to itself
-// (core::string does not). Elements that the array constructs get its label if they can be constructed from a
-// MemLabelId; those of a buffer that it takes over keep theirs.
-// When memory is refused, resizing and reserving leave the array as it was, and a copy is empty: whoever sizes one by a
-// number from outside looks at the answer. Adding single elements has no answer: without the memory the process ends.
+// Growth moves elements byte by byte and calls none of their functions, so an element must hold no pointer to itself
+// (core::string holds none).
+// When memory is refused, the operations that take a size or a capacity answer false and leave the array as it was.
+// Copying and adding an element have no answer: they end the process.
 // An array belongs to one thread at a time.
 #pragma once
 
-#include "Footing/Process.h"
 #include "Runtime/Allocator/Allocator.h"
 #include "Runtime/Core/Types.h"
-#include "Runtime/Utilities/LogAssert.h"
+#include "Runtime/Utilities/FixedReports.h"
 
 #include <cstring>
 #include <new>
@@ -30,8 +29,8 @@ enum ResizePolicy : SInt32 {
 
 namespace dynamic_array_detail {
 
-// An array without its element type, and how it grows. What changes the capacity returns the buffer, which is the old
-// one when memory is refused.
+// An array without its element type, and how it grows. The functions that change the capacity return the buffer. When
+// memory is refused, that is the old one, and nothing has changed.
 struct dynamic_array_data {
     static constexpr size_t kMaxSize = ~size_t{0} >> 1;
     static constexpr size_t kNotOwned = 1;
@@ -39,7 +38,7 @@ struct dynamic_array_data {
     void* data = nullptr;
     MemLabelId label;
     size_t size = 0;
-    size_t capacityWord = kNotOwned; // 2 x capacity, + 1 when the buffer is not owned. Empty counts as not owned
+    size_t capacityWord = kNotOwned; // 2 x capacity, + 1 when the buffer is not owned or there is none
 
     size_t capacity() const { return capacityWord >> 1; }
     bool owns_data() const { return (capacityWord & kNotOwned) == 0; }
@@ -50,12 +49,11 @@ struct dynamic_array_data {
     // Twice the capacity, or 1.
     void* grow(size_t elementSize, size_t alignment);
 
-    // Grows when one more element does not fit. Memory that is refused ends the process: the element would be written
-    // past the buffer.
+    // Grows when one more element does not fit.
     void make_room_for_one(size_t elementSize, size_t alignment) {
-        Check(size + 1 > size, "Assertion failed on expression: 'newSize > m_size'");
+        Check(size + 1 > size, FixedReports::kArraySizeWraps);
         if (size + 1 > capacity()) grow(elementSize, alignment);
-        if (size + 1 > capacity()) C99Api::Footing_Process_Abort(ZarvoClassic::Footing_ErrorCode_OutOfMemory);
+        RequireMemory(size + 1 <= capacity());
     }
 
     // Frees the buffer, which must be owned; neither the elements nor the fields are touched.
@@ -68,26 +66,25 @@ static_assert(sizeof(dynamic_array_data) == 32 && offsetof(dynamic_array_data, d
               offsetof(dynamic_array_data, label) == 8 && offsetof(dynamic_array_data, size) == 16 &&
               offsetof(dynamic_array_data, capacityWord) == 24);
 
-// Whether elements take the label of their array.
+// Whether elements have a memory label, which they then take from their array.
 template <typename T>
 constexpr bool kCarriesLabel =
     std::is_class_v<T> && !std::is_same_v<T, MemLabelId> && std::is_constructible_v<T, MemLabelId>;
 
 } // namespace dynamic_array_detail
 
-// Align 0 is the element type's own alignment.
+// Align is the buffer's alignment; 0 stands for the element type's own.
 template <typename T, size_t Align = 0>
 class dynamic_array {
 public:
-    // No buffer.
+    // Without a buffer.
     dynamic_array() : dynamic_array(kMemLabelGeneral) {}
     explicit dynamic_array(MemLabelId label) : m_Array{.label = label} {}
 
     // Has the source's label, and its size as capacity.
     dynamic_array(const dynamic_array& other) : dynamic_array(other.m_Array.label) {
         if (other.size() == 0) return;
-        resize_buffer_nocheck(other.size(), kResizeExact);
-        if (capacity() < other.size()) return; // refused: the copy stays empty
+        RequireMemory(resize_buffer_nocheck(other.size(), kResizeExact));
         if constexpr (std::is_trivially_copyable_v<T>) {
             memcpy(m_Array.data, other.m_Array.data, other.size() * sizeof(T));
         } else {
@@ -107,12 +104,12 @@ public:
         m_Array.data = nullptr;
     }
 
-    // Uses memory of somebody else, which must outlive the array.
+    // Uses the caller's memory, which must outlive the array.
     static dynamic_array wrap(T* data, size_t size, size_t capacity, MemLabelId label) {
         static_assert(std::is_trivially_copyable_v<T>, "growth copies wrapped elements byte by byte");
         return dynamic_array(data, size, capacity * 2 + Untyped::kNotOwned, label);
     }
-    // Takes over a buffer of malloc_internal.
+    // Takes over a buffer that malloc_internal returned.
     static dynamic_array adopt(T* data, size_t size, size_t capacity, MemLabelId label) {
         return dynamic_array(data, size, capacity * 2, label);
     }
@@ -152,11 +149,10 @@ public:
         --m_Array.size;
     }
 
-    // Added elements are value-initialised. False, and nothing has changed, when memory is refused.
-    bool resize_initialized(size_t size, ResizePolicy policy = kResizeDouble) {
+    // Added elements are value-initialised. False when memory is refused; nothing has changed then.
+    [[nodiscard]] bool resize_initialized(size_t size, ResizePolicy policy = kResizeDouble) {
         const size_t oldSize = m_Array.size;
-        if (size > capacity()) resize_buffer_nocheck(size, policy);
-        if (size > capacity()) return false;
+        if (size > capacity() && !resize_buffer_nocheck(size, policy)) return false;
         m_Array.size = size;
         destroy(size, oldSize);
         for (size_t i = oldSize; i < size; ++i)
@@ -165,32 +161,38 @@ public:
     }
 
     // The same, but added elements hold whatever the memory held.
-    bool resize_uninitialized(size_t size, ResizePolicy policy = kResizeDouble) {
+    [[nodiscard]] bool resize_uninitialized(size_t size, ResizePolicy policy = kResizeDouble) {
         static_assert(std::is_trivially_copyable_v<T> && std::is_trivially_destructible_v<T>);
-        if (size > capacity()) resize_buffer_nocheck(size, policy);
-        if (size > capacity()) return false;
+        if (size > capacity() && !resize_buffer_nocheck(size, policy)) return false;
         m_Array.size = size;
         return true;
     }
 
-    // Changes the capacity whatever the size is; a capacity below the size is the caller's fault.
-    void resize_buffer_nocheck(size_t capacity, ResizePolicy policy) {
+    // Changes the capacity, which must not be below the size. Whether there is room for that many elements now.
+    [[nodiscard]] bool resize_buffer_nocheck(size_t capacity, ResizePolicy policy) {
         m_Array.resize_buffer(capacity, policy, sizeof(T), kAlignment);
+        return capacity <= m_Array.capacity();
     }
 
-    // At least that capacity, and exactly it if the buffer has to change.
-    void reserve(size_t capacity) {
+    // Makes room for that many elements, and for no more if the buffer has to change. False when memory is refused.
+    [[nodiscard]] bool reserve(size_t capacity) {
         if (capacity > m_Array.capacity()) m_Array.reserve(capacity, sizeof(T), kAlignment);
+        return capacity <= m_Array.capacity();
     }
 
-    // Twice the capacity, or 1.
-    void grow() { m_Array.grow(sizeof(T), kAlignment); }
-
-    // Keeps the buffer.
-    void clear() {
-        destroy(0, m_Array.size);
-        m_Array.size = 0;
+    // Doubles the capacity, from 0 to 1. False when memory is refused.
+    [[nodiscard]] bool grow() {
+        const size_t oldCapacity = capacity();
+        m_Array.grow(sizeof(T), kAlignment);
+        return capacity() > oldCapacity;
     }
+
+    // Cuts the array to its first size elements, of which there must be that many. Keeps the buffer.
+    void truncate(size_t size) {
+        destroy(size, m_Array.size);
+        m_Array.size = size;
+    }
+    void clear() { truncate(0); }
 
 private:
     using Untyped = dynamic_array_detail::dynamic_array_data;
@@ -199,6 +201,14 @@ private:
     dynamic_array(T* data, size_t size, size_t capacityWord, MemLabelId label)
         : m_Array{.data = data, .label = label, .size = size, .capacityWord = capacityWord} {}
 
+    // Constructs an element from arguments; its label is
+    //
+    //   element has no label                                             none
+    //   copied or moved from an element                                  the array's; the value is assigned
+    //   constructible from the arguments and a label after them          the array's
+    //   constructible from the arguments alone                           what its constructor takes from them
+    //
+    // The elements of a buffer that the array takes over keep their labels.
     template <typename... Arguments>
     T* construct(T* where, Arguments&&... arguments) {
         constexpr bool isFromElement =
@@ -217,7 +227,7 @@ private:
         }
     }
 
-    // Elements in memory that is not owned are not destroyed; nor are there any when memory was refused.
+    // Elements in memory that is not owned are not destroyed.
     void destroy([[maybe_unused]] size_t from, [[maybe_unused]] size_t to) {
         if constexpr (!std::is_trivially_destructible_v<T>) {
             if (!owns_data()) return;
@@ -240,7 +250,7 @@ dynamic_array<T, Align>& dynamic_array<T, Align>::operator=(dynamic_array&& othe
     if (this == &other) return *this;
     if (!other.owns_data()) {
         release();
-        Check(other.size() < Untyped::kMaxSize, "Assertion failed on expression: 'm_size < max_size()'");
+        Check(other.size() < Untyped::kMaxSize, FixedReports::kArrayTooLong);
         m_Array.data = other.m_Array.data;
         m_Array.size = other.size();
         m_Array.capacityWord = other.size() * 2 + Untyped::kNotOwned;
@@ -256,7 +266,7 @@ dynamic_array<T, Align>& dynamic_array<T, Align>::operator=(dynamic_array&& othe
             clear();
         else
             m_Array.reset();
-        reserve(other.capacity());
+        RequireMemory(reserve(other.capacity()));
         if (other.size() != 0) memcpy(m_Array.data, other.m_Array.data, other.size() * sizeof(T));
         m_Array.size = other.size();
         other.m_Array.free_buffer();

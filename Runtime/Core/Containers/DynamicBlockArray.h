@@ -1,5 +1,5 @@
 // dynamic_block_array: a sequence in blocks of BlockSize elements. Growing adds blocks and moves no element: each keeps
-// its address for as long as the sequence lives. Memory that is refused ends the process.
+// its address for as long as the sequence lives. The process ends when memory is refused.
 //
 //   dynamic_block_array<FileEntryInfo, 32> files(kMemLabelFileList);
 //   FileEntryInfo& file = files.emplace_back();
@@ -39,8 +39,7 @@ public:
         while (newSize > m_Blocks.size() * BlockSize) {
             Block* block = RequireMemory(New<Block>(m_Label, m_Label));
             m_Blocks.push_back(block);
-            block->reserve(BlockSize);
-            RequireMemory(block->data()); // a block with less room would move its elements when it grows
+            RequireMemory(block->reserve(BlockSize)); // a block with less room would move its elements when it grows
         }
     }
 

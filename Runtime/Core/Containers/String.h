@@ -1,12 +1,13 @@
 // core::string: text that it owns, with a memory label that it keeps for life. Up to 31 characters need no allocation.
 //
-//   core::string path(kMemLabelGeneral);   // the label must be given where the default, kMemLabelPathString, is wrong
+//   core::string path(kMemLabelGeneral);   // without a label it gets kMemLabelPathString
 //   path = folder;
 //   path += "/archive.zarvo";
 //   core::string name = core::string::wrap("borrowed until it is written to");
 //
-// Wherever text is passed, a part of the string's own text is fine. When memory is refused, appending leaves the string
-// as it was, and what assigns, copies or adds up leaves an empty one. A string belongs to one thread at a time.
+// Text that is passed in may be a part of the string's own. When memory is refused, grow answers null and leaves the
+// string as it was; everything else ends the process. Text whose size comes from a file or a caller is therefore
+// written after a grow that has answered. A string belongs to one thread at a time.
 #pragma once
 
 #include "Runtime/Core/Containers/StringRef.h"
@@ -33,7 +34,7 @@ public:
         m_Storage.assign(std::move(other.m_Storage));
     }
 
-    // Reads the text where it lies, which must outlive the string, and copies it when it is first written to.
+    // Reads the text in place and copies it before the first write. The text must outlive the string.
     static basic_string wrap(const T* nulTerminated, MemLabelId label = kMemLabelPathString) {
         basic_string wrapped(label);
         wrapped.m_Storage.borrow(nulTerminated);
@@ -70,13 +71,12 @@ public:
     const T& back() const { return data()[size() - 1]; }
     const T& operator[](size_t index) const { return data()[index]; }
     // May be written through: borrowed text is copied first.
-    T& operator[](size_t index) { return grow(size())[index]; }
+    T& operator[](size_t index) { return RequireMemory(grow(size()))[index]; }
     operator ref() const { return ref(data(), size()); }
 
-    // Room for count characters, exactly that if the buffer has to change; returns where the text is written.
-    // Null, and nothing has changed, when memory is refused.
-    T* grow(size_t count) { return m_Storage.grow(count); }
-    void reserve(size_t count) { m_Storage.grow(count); }
+    // Makes room for count characters, and for no more if the buffer has to change. Returns the writable text. Null
+    // when memory is refused; nothing has changed then.
+    [[nodiscard]] T* grow(size_t count) { return m_Storage.grow(count); }
 
     // Appending doubles the capacity when it has to grow.
     basic_string& append(ref text) { return append(text.data(), text.size()); }
@@ -88,9 +88,9 @@ public:
     basic_string& operator+=(T character) { return append(&character, 1); }
     void push_back(T character) { append(&character, 1); }
 
-    // Cuts the text, or adds NULs to it.
-    void resize(size_t count) { m_Storage.resize(count); }
-    void clear() { m_Storage.resize(0); }
+    // Cuts the text to its first count characters, of which there must be that many.
+    void truncate(size_t count) { m_Storage.truncate(count); }
+    void clear() { truncate(0); }
 
     // See basic_string_ref.
     int compare(const T* nulTerminated, ComparisonType type = kCaseSensitive) const {
@@ -120,7 +120,7 @@ basic_string<T, Storage> operator+(const basic_string<T, Storage>& lhs, const T*
     const basic_string_ref<T> right(rhs);
     basic_string<T, Storage> sum(lhs.get_memory_label());
     const size_t total = lhs.size() + right.size();
-    if (total >= Storage::kInlineCapacity && sum.grow(total) == nullptr) return sum; // half of it would be another text
+    if (total >= Storage::kInlineCapacity) RequireMemory(sum.grow(total)); // one allocation
     sum.assign(lhs);
     sum.append(right);
     return sum;

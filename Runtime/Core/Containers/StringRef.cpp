@@ -5,7 +5,7 @@
 
 namespace core {
 
-// tolower takes the values of unsigned char; of what it returns only the low 8 bits are compared.
+// tolower takes the values of unsigned char; only the low 8 bits of its result are compared.
 template <typename T>
 static int FoldedByte(T character, bool foldCase) {
     const auto byte = static_cast<UInt8>(character);
@@ -36,7 +36,7 @@ int basic_string_ref<T>::compare(const basic_string_ref& other) const {
     if (const size_t common = std::min(m_Size, other.m_Size); common != 0)
         if (const int difference = memcmp(m_Data, other.m_Data, common); difference != 0) return difference;
 
-    // Clamped rather than cut to 32 bits, so that the shorter comes first however much longer the other is.
+    // Clamped, not cut to 32 bits, so that the shorter comes first whatever the difference is.
     constexpr size_t kMost = std::numeric_limits<int>::max();
     if (m_Size < other.m_Size) return -static_cast<int>(std::min(other.m_Size - m_Size, kMost));
     return static_cast<int>(std::min(m_Size - other.m_Size, kMost));

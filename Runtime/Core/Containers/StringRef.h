@@ -1,9 +1,9 @@
-// core::string_ref: a view of text that somebody else owns. It is passed by value, does not end in a NUL, and is good
-// for as long as the text is; core::string and NUL-terminated text convert to it.
+// core::string_ref: a view of text that it does not own, which must outlive it. It is passed by value and does not end
+// in a NUL. core::string and NUL-terminated text convert to it.
 //
 //   bool IsHidden(core::string_ref name) { return name.starts_with("."); }
 //
-// Views share nothing: a thread may use one while its text is not changed.
+// Any thread may use a view as long as nobody changes the text.
 #pragma once
 
 #include "Runtime/Core/Types.h"
@@ -12,7 +12,7 @@
 #include <cstring>
 
 enum ComparisonType : SInt32 {
-    kCaseSensitive = 0,   // bytes as unsigned values; so is any value but the next
+    kCaseSensitive = 0,   // bytes as unsigned values; any other value but 1 means the same
     kCaseInsensitive = 1, // the ASCII letters A to Z count as a to z
 };
 
@@ -48,15 +48,15 @@ public:
 
     bool starts_with(const basic_string_ref& prefix, ComparisonType type = kCaseSensitive) const;
 
-    // Where the count characters at text occur first at or after pos, in any case; npos when they don't. An empty text
-    // is found at pos, wherever that is.
+    // The first position from pos on where the count characters at text occur in any case, or npos. An empty text is
+    // found at pos, even after the view's end.
     size_t find_case_insensitive(const T* text, size_t pos, size_t count) const;
 
     size_t find(T character, size_t pos = 0) const;
     size_t find(const basic_string_ref& text, size_t pos = 0) const;
     size_t rfind(T character) const;
 
-    // Both are cut to what the view has.
+    // pos and count are limited to the view's size.
     constexpr basic_string_ref substr(size_t pos, size_t count = npos) const {
         pos = std::min(pos, m_Size);
         return {m_Data + pos, std::min(count, m_Size - pos)};
@@ -80,6 +80,6 @@ extern template class basic_string_ref<char>;
 
 } // namespace core
 
-// Copies what fits of the srcLen characters at src, which may be a part of dst, writes a NUL behind them and returns
-// how many were copied. A dstSize of 0 writes nothing at all.
+// Copies as many of the srcLen characters at src as fit before a NUL in dstSize bytes, writes the NUL after them and
+// returns how many it has copied. src may be a part of dst. With a dstSize of 0 nothing is written.
 size_t strcpy_truncate(char* dst, const char* src, size_t dstSize, size_t srcLen);

@@ -46,8 +46,7 @@ void StringStorageDefault<T>::append(const T* text, size_t count) {
     if (newSize > capacity()) {
         const bool isOwnText = is_own_text(text);
         const size_t offset = isOwnText ? static_cast<size_t>(text - data()) : 0;
-        buffer = grow(std::max(newSize, is_inline() ? kFirstSpillCapacity : 2 * capacity()));
-        if (buffer == nullptr) return;
+        buffer = RequireMemory(grow(std::max(newSize, is_inline() ? kFirstSpillCapacity : 2 * capacity())));
         if (isOwnText) text = buffer + offset;
     }
     memmove(buffer + oldSize, text, count);
@@ -63,10 +62,9 @@ void StringStorageDefault<T>::assign(const T* text, size_t count) {
         set_size_and_terminate(count);
         return;
     } else {
-        set_size_and_terminate(0); // what is left when memory is refused
+        set_size_and_terminate(0); // nothing of the old text is copied when the buffer changes
     }
-    T* buffer = grow(count);
-    if (buffer == nullptr) return;
+    T* buffer = RequireMemory(grow(count));
     if (count != 0) memcpy(buffer, text, count);
     set_size_and_terminate(count);
 }
@@ -95,17 +93,12 @@ void StringStorageDefault<T>::assign(StringStorageDefault&& other) {
 }
 
 template <typename T>
-void StringStorageDefault<T>::resize(size_t count) {
-    const size_t oldSize = size();
-    if (count == oldSize) return;
-    if (is_external() && count < oldSize) {
+void StringStorageDefault<T>::truncate(size_t count) {
+    if (count == size()) return;
+    if (is_external())
         assign(data(), count);
-        return;
-    }
-    T* buffer = grow(count);
-    if (buffer == nullptr) return;
-    if (count > oldSize) memset(buffer + oldSize, 0, count - oldSize);
-    set_size_and_terminate(count);
+    else
+        set_size_and_terminate(count);
 }
 
 template <typename T>

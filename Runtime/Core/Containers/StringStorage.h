@@ -1,18 +1,18 @@
 // core::StringStorageDefault: the characters of a core::string, and the engine of everything that changes them.
-// Texts of up to 31 characters lie in the object; longer ones in a buffer under the label; borrowed text is read where
-// it lies until the first operation that writes. Not synchronised: a string belongs to one thread at a time.
+// Texts of up to 31 characters lie in the object, longer ones in a buffer under the label. Borrowed text is read in
+// place until the first operation that writes. Not synchronised: a string belongs to one thread at a time.
 //
 // The object is a 32-byte area and the label. The area's last byte tells how the rest is read:
 //
 //   byte 31     mode       bytes 0-30
 //   31 - size   inline     the characters. A text of 31 has the mode byte 0, which is its terminating NUL too
 //   01xxxxxx    heap       pointer at 0, capacity at 8, size at 16; the buffer is ours: capacity + 1 bytes
-//   10xxxxxx    external   the same with capacity 0; the text is somebody else's, never written or freed
+//   10xxxxxx    external   the same with capacity 0; the text is borrowed, never written or freed
 //   11xxxxxx    never
 //
-// The x mean nothing: growing leaves them as they were, moving and borrowing set them. Inline and heap text ends in a
+// The x mean nothing: growing leaves them as they were; moving and borrowing set them. Inline and heap text ends in a
 // NUL at [size]. Nothing in the area points into the object, so a string may be moved byte by byte. A buffer never
-// shrinks, and stays until the string is moved from or to.
+// shrinks; it stays until the string is moved from or to.
 #pragma once
 
 #include "Runtime/Allocator/Allocator.h"
@@ -42,11 +42,11 @@ public:
     MemLabelId get_memory_label() const { return m_Label; }
     bool is_external() const { return (mode() & kModeMask) == kModeExternal; }
 
-    // Makes room for count characters and returns where they are written. Borrowed text is copied on the way when
-    // count is not 0.
-    T* grow(size_t count);
+    // Makes room for count characters and returns where they are written. Copies borrowed text unless count is 0. Null
+    // when memory is refused; nothing has changed then.
+    [[nodiscard]] T* grow(size_t count);
 
-    // The text may be a part of the string's own.
+    // The text may be a part of the string's own. Here and below the process ends when memory is refused.
     void append(const T* text, size_t count);
     void assign(const T* text, size_t count);
 
@@ -55,11 +55,10 @@ public:
     // Leaves other empty. A buffer changes hands only between equal labels; otherwise its text is copied.
     void assign(StringStorageDefault&& other);
 
-    // The first count characters, followed by NULs where there were fewer.
-    void resize(size_t count);
+    // Keeps the first count characters, of which there must be that many.
+    void truncate(size_t count);
 
-    // Makes an empty inline string read a text that stays somebody else's and must outlive it. An empty text is not
-    // borrowed.
+    // Makes an empty inline string read a text in place; the text must outlive it. An empty text is not borrowed.
     void borrow(const T* nulTerminated);
 
 private:
@@ -95,7 +94,7 @@ private:
     void store_words(const T* pointer, size_t capacity, size_t size);
     void free_buffer() { free_alloc_internal(load<T*>(kPointerOffset), m_Label, __FILE__, __LINE__); }
 
-    // Where the members must lie; inside, as offsetof needs the class.
+    // The layout, checked inside the class because offsetof needs access to the members.
     static void check_layout() {
         static_assert(sizeof(StringStorageDefault) == 40 && offsetof(StringStorageDefault, m_Area) == 0 &&
                       sizeof(m_Area) == 32 && offsetof(StringStorageDefault, m_Label) == 32);

@@ -4,9 +4,8 @@
 constinit Rand* gScriptingRand = nullptr;
 
 void InitScriptingRand(void*) {
-    Rand* random = New<Rand>(kMemLabelRandom);
-    if (random != nullptr) random->RandomizeState();
-    gScriptingRand = random;
+    gScriptingRand = RequireMemory(New<Rand>(kMemLabelRandom));
+    gScriptingRand->RandomizeState();
 }
 
 void CleanupScriptingRand(void*) {

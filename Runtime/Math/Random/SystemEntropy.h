@@ -3,8 +3,5 @@
 
 #include "Runtime/Core/Types.h"
 
-// Whether all length bytes of buffer were filled; when not, some may have been.
+// Fills length bytes of buffer. False when fewer came; the buffer's contents are undefined then.
 bool GetSystemEntropy(UInt8* buffer, size_t length);
-
-// The same from two device files: the second is tried when the first can't be opened, and never made to wait.
-bool ReadEntropyDevice(const char* first, const char* second, UInt8* buffer, size_t length);

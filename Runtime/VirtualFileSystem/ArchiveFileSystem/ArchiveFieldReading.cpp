@@ -39,8 +39,9 @@ bool ReadString(FileAccessor& file, core::string* out, size_t maxSize) {
 
 bool ReadPath(FileAccessor& file, core::string* scratch, core::string* path) {
     if (!ReadString(file, scratch)) return false;
+    if (path->grow(scratch->size()) == nullptr) return false;
     *path = *scratch;
-    return path->size() == scratch->size();
+    return true;
 }
 
 bool SkipBytes(FileAccessor& file, size_t size) {

@@ -235,7 +235,7 @@ void ArchiveStorageReader::EmptyCache() {
         DeinitCachedBlock(block);
         Delete(block, m_Label);
     }
-    m_CachedBlocks.resize_initialized(kept);
+    m_CachedBlocks.truncate(kept);
 }
 
 // Remembers until the file is closed that a block is damaged, and from where on. Call it only for a failure that would
@@ -297,7 +297,7 @@ ArchiveStorageReader::CacheResult ArchiveStorageReader::FillStreamCachedBlock(Ca
             produced += room;
         }
     }
-    block->buffer.resize_uninitialized(produced);
+    block->buffer.truncate(produced);
     return result;
 }
 
@@ -319,7 +319,7 @@ ArchiveStorageReader::CacheResult ArchiveStorageReader::LoadStreamInput(CachedBl
         if (m_Storage.EndsBy(position)) NoteBrokenStream(*block, brokenFrom);
         return kCacheResultReadError;
     }
-    block->compressedBuffer.resize_uninitialized(static_cast<size_t>(delivered));
+    block->compressedBuffer.truncate(static_cast<size_t>(delivered));
     block->compressedLoaded += static_cast<UInt32>(delivered);
     return delivered != 0 ? kCacheResultOk : kCacheResultIncomplete;
 }

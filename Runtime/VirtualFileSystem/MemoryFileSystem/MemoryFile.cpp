@@ -1,17 +1,16 @@
 #include "Runtime/VirtualFileSystem/MemoryFileSystem/MemoryFile.h"
 
-#include "Runtime/Utilities/LogAssert.h"
+#include "Runtime/Utilities/FixedReports.h"
 #include "Runtime/VirtualFileSystem/MemoryFileSystem/MultiBlocksMemoryFileData.h"
 #include "Runtime/VirtualFileSystem/MemoryFileSystem/SingleBlockMemoryFileData.h"
-
-static constexpr char kSourceName[] = "./Runtime/VirtualFileSystem/MemoryFileSystem/MemoryFile";
 
 MemoryFile::MemoryFile(MemLabelId memLabel, MemoryFileData* contents, FilePermission filePermission)
     : data(contents), permission(filePermission), label(memLabel) {
     if (data != nullptr)
         data->AddRef();
     else
-        data = New<MultiBlocksMemoryFileData>(label, label, MultiBlocksMemoryFileData::kDefaultBlockSize);
+        data =
+            RequireMemory(New<MultiBlocksMemoryFileData>(label, label, MultiBlocksMemoryFileData::kDefaultBlockSize));
 }
 
 MemoryFile::~MemoryFile() {
@@ -20,16 +19,12 @@ MemoryFile::~MemoryFile() {
 
 FileSystemEntry MemoryFile::CreateFileSystemEntry(MemLabelId memLabel, FilePermission filePermission, void* data,
                                                   size_t size, bool takeOwnership) {
+    MemoryFileData* const contents =
+        RequireMemory(New<SingleBlockMemoryFileData>(memLabel, memLabel, data, size, takeOwnership));
+    auto* const file = RequireMemory(New<MemoryFile>(memLabel, memLabel, contents, filePermission));
+    contents->Release(); // the file holds the other reference
     FileEntryData entry;
-    MemoryFileData* const contents = New<SingleBlockMemoryFileData>(memLabel, memLabel, data, size, takeOwnership);
-    if (contents != nullptr) {
-        auto* const file = New<MemoryFile>(memLabel, memLabel, contents, filePermission);
-        contents->Release();
-        if (file != nullptr) entry.accessorHandler = New<IFileAdapter>(memLabel, file, memLabel, true);
-        if (entry.accessorHandler == nullptr) Delete(file, memLabel);
-    } else if (takeOwnership && size != 0) {
-        free_alloc_internal(data, memLabel, __FILE__, __LINE__);
-    }
+    entry.accessorHandler = RequireMemory(New<IFileAdapter>(memLabel, file, memLabel, true));
     return FileSystemEntry(entry);
 }
 
@@ -42,7 +37,7 @@ bool MemoryFile::Close() {
 }
 
 bool MemoryFile::Read(VFS::FileSize from, UInt64 size, void* out, UInt64* actual, FileReadFlags) {
-    if (!IsReadable()) AssertImplementation(0, kSourceName, 37, -1, "Assertion failed on expression: 'IsReadable()'");
+    if (!IsReadable()) Report(FixedReports::kMemoryFileRead);
     if (data == nullptr || !IsReadable()) return false;
     const UInt64 count = data->Read(from, size, out);
     if (actual != nullptr) *actual = count;
@@ -56,7 +51,7 @@ bool MemoryFile::Read(UInt64 size, void* out, UInt64* actual, FileReadFlags flag
 }
 
 bool MemoryFile::Write(VFS::FileSize from, UInt64 size, const void* in, UInt64* written) {
-    if (!IsWritable()) AssertImplementation(0, kSourceName, 64, -1, "Assertion failed on expression: 'IsWritable()'");
+    if (!IsWritable()) Report(FixedReports::kMemoryFileWrite);
     if (data == nullptr || !IsWritable()) return false;
     const UInt64 count = data->Write(from, size, in);
     position = from.Cast<UInt64>() + count;
@@ -72,7 +67,7 @@ bool MemoryFile::Seek(VFS::FileOffset offset, FileOrigin origin) {
     if (data == nullptr) return false;
     const UInt64 end = data->Size().Cast<UInt64>();
     UInt64 target = 0;
-    bool isPosition = false; // a sum that wraps is none
+    bool isPosition = false; // stays false when the sum wraps
     if (origin == kFileOriginBegin) {
         target = offset.Cast<UInt64>();
         isPosition = true;
@@ -89,7 +84,7 @@ bool MemoryFile::Seek(VFS::FileOffset offset, FileOrigin origin) {
 VFS::FileSize MemoryFile::Position() const { return position; }
 
 bool MemoryFile::SetLength(VFS::FileSize length) {
-    if (!IsWritable()) AssertImplementation(0, kSourceName, 109, -1, "Assertion failed on expression: 'IsWritable()'");
+    if (!IsWritable()) Report(FixedReports::kMemoryFileSetLength);
     if (data == nullptr || !IsWritable()) return false;
     data->SetLength(length);
     return true;

@@ -1,5 +1,5 @@
-// An open file whose contents live in memory. Several files may share one MemoryFileData; each has a position of its
-// own and sees what the others write.
+// An open file whose contents live in memory. Several files may share one MemoryFileData; each has its own position and
+// sees what the others write.
 //
 //   MemoryFile file(label, nullptr, kFilePermissionReadWrite);   // contents of its own, which grow
 //   FileSystemEntry entry = MemoryFile::CreateFileSystemEntry(label, kFilePermissionRead, data, size, false);
@@ -15,38 +15,37 @@ class MemoryFileData;
 
 class MemoryFile : public IFile {
 public:
-    // Takes a reference to contents. Without contents (null) it makes its own, a MultiBlocksMemoryFileData.
-    // The file is open until it is closed; a read that filePermission forbids (or a write, or a change of the length)
-    // answers false and is reported as a failed check.
+    // Takes a reference to contents; for null it makes a MultiBlocksMemoryFileData of its own. The file is open from
+    // the start. A read, write or change of length that filePermission forbids is reported as a failed check and
+    // answers false.
     MemoryFile(MemLabelId memLabel, MemoryFileData* contents, FilePermission filePermission);
     ~MemoryFile() override;
 
-    // An entry through which one FileAccessor opens a memory file over data (see SingleBlockMemoryFileData for data,
-    // size and takeOwnership). It serves one open: the close that ends it frees the file, and data if it was taken
-    // over; neither the entry nor a copy of it may be opened again. Copies share the file, so destroying an entry
-    // frees nothing: one that is never opened and closed leaks its file. When memory is refused the entry can't be
-    // opened, and data that was to be taken over is freed.
+    // An entry through which one FileAccessor opens a memory file over data. See SingleBlockMemoryFileData for data,
+    // size and takeOwnership. The entry can be opened once: the Close that follows frees the file, and data too if it
+    // was taken over, so neither the entry nor a copy may be opened again. Destroying an entry frees nothing: if it was
+    // never opened and closed, its file leaks.
     static FileSystemEntry CreateFileSystemEntry(MemLabelId memLabel, FilePermission filePermission, void* data,
                                                  size_t size, bool takeOwnership);
 
     bool IsOpen() const override;
 
-    // Always true. A closed file answers false, and 0 for its size.
+    // Always true. A closed file fails every read, write and seek, and has size 0.
     bool Close() override;
 
-    // A read at the very end delivers 0 bytes and answers true; one beyond it answers false.
+    // Reading at the end answers true with 0 bytes, reading past it false.
     bool Read(VFS::FileSize from, UInt64 size, void* out, UInt64* actual, FileReadFlags flags) override;
     bool Read(UInt64 size, void* out, UInt64* actual, FileReadFlags flags) override;
 
-    // True also when less than size was stored, down to nothing at all: compare *written.
+    // True even if fewer bytes than size were stored, or none: compare *written.
     bool Write(VFS::FileSize from, UInt64 size, const void* in, UInt64* written) override;
     bool Write(UInt64 size, const void* in, UInt64* written) override;
 
-    // kFileOriginEnd counts backwards: 10 is 10 bytes before the end. A target past the end is refused.
+    // kFileOriginEnd counts backwards: an offset of 10 is 10 bytes before the end. A position past the end is refused.
     bool Seek(VFS::FileOffset offset, FileOrigin origin) override;
     VFS::FileSize Position() const override;
 
-    // The position stays, even past the new end.
+    // Leaves the position alone, even past the new end.
     bool SetLength(VFS::FileSize length) override;
     VFS::FileSize Size() const override;
 
@@ -58,6 +57,6 @@ private:
 
     MemoryFileData* data; // one reference; null once closed
     FilePermission permission;
-    MemLabelId label; // of the contents that it makes itself
+    MemLabelId label; // of contents made by the file itself
     UInt64 position = 0;
 };

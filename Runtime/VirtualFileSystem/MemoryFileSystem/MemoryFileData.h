@@ -2,12 +2,12 @@
 // SingleBlockMemoryFileData (one buffer, which may be the caller's) and MultiBlocksMemoryFileData (a chain of blocks
 // that grows without copying).
 //
-// Reference counted: made with one reference, which is the maker's. Any thread; every operation holds the object's
-// lock. Lock keeps it until Unlock, so that one thread can work on the whole contents while the others wait:
+// Reference counted: a new object has one reference, its maker's. Any thread; every operation holds the object's lock.
+// Lock keeps it until Unlock, so that one thread can work on the whole contents while the others wait:
 //
-//                          operation or Lock by the keeper    by another thread    Unlock by the keeper
-//   nobody keeps it        (no keeper)                        goes on              (not allowed)
-//   kept n times over      goes on; Lock: n + 1               waits                n - 1; at 0 the next one goes on
+//                       operation or Lock by the holder    by another thread    Unlock by the holder
+//   not locked          (no holder)                        proceeds             (not allowed)
+//   locked n times      proceeds; Lock: n + 1              waits                n - 1; at 0 a waiting thread proceeds
 #pragma once
 
 #include "Runtime/Core/SharedObject.h"
@@ -20,21 +20,20 @@ public:
     explicit MemoryFileData(MemLabelId objectLabel) : ThreadSharedObject(objectLabel) {}
     virtual ~MemoryFileData() = default;
 
-    // *contents becomes the address of the whole contents, null when there are none. Always true. To be paired with
-    // one Unlock of that address on the same thread; until then the other threads' operations wait, while this
-    // thread's own go on.
+    // Stores the address of the whole contents in *contents, null when they are empty. Always true. Each Lock is paired
+    // with one Unlock of that address on the same thread.
     virtual bool Lock(void** contents) = 0;
     virtual void Unlock(void* contents) = 0;
 
-    // Copies the bytes from position on, as far as there are any, and returns their count. What is read into, or
-    // written from, is no part of the contents that Lock hands out.
+    // Copies up to size bytes from position on to out, and returns how many there were. Neither out, nor in of Write,
+    // may overlap the contents that Lock returns.
     virtual UInt64 Read(VFS::FileSize position, UInt64 size, void* out) const = 0;
 
-    // Stores bytes at position, which may lie past the end; returns the count stored, which is less than size when
-    // room or memory is refused.
+    // Stores bytes at position, which may lie past the end. Returns how many: fewer than size when there is no room, or
+    // memory is refused.
     virtual UInt64 Write(VFS::FileSize position, UInt64 size, const void* in) = 0;
 
-    // When memory is refused the length stays as it is.
+    // When memory is refused, the length does not change.
     virtual void SetLength(VFS::FileSize length) = 0;
     virtual VFS::FileSize Size() const = 0;
 

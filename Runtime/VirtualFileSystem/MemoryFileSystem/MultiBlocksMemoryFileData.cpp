@@ -1,6 +1,6 @@
 #include "Runtime/VirtualFileSystem/MemoryFileSystem/MultiBlocksMemoryFileData.h"
 
-#include "Runtime/Utilities/LogAssert.h"
+#include "Runtime/Utilities/FixedReports.h"
 
 #include <algorithm>
 #include <cstring>
@@ -14,7 +14,7 @@ MultiBlocksMemoryFileData::MultiBlocksMemoryFileData(MemLabelId memLabel, size_t
 MultiBlocksMemoryFileData::MultiBlocksMemoryFileData(MemLabelId objectLabel, MemLabelId contentsLabel,
                                                      size_t sizeOfBlock)
     : MemoryFileData(objectLabel), label(contentsLabel), blockSize(sizeOfBlock), blocks(contentsLabel) {
-    blocks.reserve(kReservedSlots); // refused: the first write asks again
+    (void)blocks.reserve(kReservedSlots); // if memory is refused, the first write asks again
 }
 
 MultiBlocksMemoryFileData::~MultiBlocksMemoryFileData() {
@@ -22,7 +22,7 @@ MultiBlocksMemoryFileData::~MultiBlocksMemoryFileData() {
         free_alloc_internal(block, label, __FILE__, __LINE__);
 }
 
-// A slot for every block up to lastSlot; false, and nothing changed, when memory is refused.
+// Makes the table hold lastSlot. When memory is refused, returns false and changes nothing.
 bool MultiBlocksMemoryFileData::ReserveSlots(UInt64 lastSlot) {
     if (lastSlot < blocks.size()) return true;
     return lastSlot != ~UInt64{0} && blocks.resize_initialized(lastSlot + 1);
@@ -33,7 +33,7 @@ UInt8* MultiBlocksMemoryFileData::GetOrMakeBlock(UInt64 slot) {
     if (block != nullptr) return block;
     block = static_cast<UInt8*>(
         malloc_internal(blockSize, kBlockAlignment, label, kAllocateOptionNone, __FILE__, __LINE__));
-    // A write may cover a part of it only, and reads hand out all of it: the heap's old bytes must not be seen.
+    // A write may cover only part of a block, but reads deliver all of it: don't leak what the heap held before.
     if (block != nullptr) memset(block, 0, blockSize);
     return block;
 }
@@ -51,8 +51,7 @@ UInt64 MultiBlocksMemoryFileData::Read(VFS::FileSize position, UInt64 size, void
         if (blocks[slot] != nullptr) {
             memcpy(bytes + done, blocks[slot] + offset, count);
         } else {
-            AssertImplementation(0, "./Runtime/VirtualFileSystem/MemoryFileSystem/MultiBlocksMemoryFileData", 80, -1,
-                                 "Assertion failed in MultiBlocksMemoryFileData::Read(): Dirty data read \n");
+            Report(FixedReports::kMemoryFileDirtyRead);
             memset(bytes + done, 0, count);
         }
         done += count;
@@ -86,7 +85,7 @@ void MultiBlocksMemoryFileData::SetLength(VFS::FileSize newLength) {
     if (!ReserveSlots(lastSlot)) return;
     for (UInt64 slot = lastSlot + 1; slot < blocks.size(); ++slot)
         free_alloc_internal(blocks[slot], label, __FILE__, __LINE__);
-    blocks.resize_initialized(lastSlot + 1);
+    blocks.truncate(lastSlot + 1);
     length = newLength.Cast<UInt64>();
 }
 
@@ -103,7 +102,7 @@ bool MultiBlocksMemoryFileData::Lock(void** contents) VARNEX_NO_THREAD_SAFETY_AN
         *contents = GetFirstBlock();
     } else {
         *contents = malloc_internal(length, kBlockAlignment, label, kAllocateOptionNone, __FILE__, __LINE__);
-        if (*contents != nullptr) (void)Read(0, length, *contents); // every byte of the length is delivered
+        if (*contents != nullptr) (void)Read(0, length, *contents); // delivers all bytes
     }
     return true;
 }

@@ -1,5 +1,5 @@
-// A memory file's contents as a chain of blocks of one size: growing adds blocks and copies nothing, a block never
-// moves, and one is only allocated when something is written into it. Byte b lies in block b / blockSize at offset
+// A memory file's contents as a chain of blocks of equal size. Growing adds blocks and copies nothing, blocks never
+// move, and a block is allocated when something is first written to it. Byte b lies in block b / blockSize at offset
 // b % blockSize. Any thread.
 #pragma once
 
@@ -13,17 +13,16 @@ public:
 
     // Starts empty. The object itself must have been allocated under memLabel; sizeOfBlock is not 0.
     MultiBlocksMemoryFileData(MemLabelId memLabel, size_t sizeOfBlock);
-    // The object's label and that of its contents.
+    // The same, with a label of their own for the contents.
     MultiBlocksMemoryFileData(MemLabelId objectLabel, MemLabelId contentsLabel, size_t sizeOfBlock);
     ~MultiBlocksMemoryFileData() override;
 
-    // Contents that fit into one block are handed out in place: the address is the first block (null while nothing
-    // was written into it). Longer ones are copied into a buffer (null when memory is refused), and what is changed
-    // there is lost.
+    // Contents that fit into one block are not copied: the address is the first block, null if nothing was written to
+    // it. Longer contents are copied into a buffer, null when memory is refused; changes made there are lost.
     bool Lock(void** contents) override;
     void Unlock(void* contents) override;
 
-    // A block that nothing was written into reads as zeros, and is reported as a failed check.
+    // A block that nothing was written to reads as zeros and is reported as a failed check.
     UInt64 Read(VFS::FileSize position, UInt64 size, void* out) const override;
 
     // A write of 0 bytes past the end extends the length to position.
@@ -33,7 +32,7 @@ public:
     void SetLength(VFS::FileSize newLength) override;
     VFS::FileSize Size() const override;
 
-    // The copy is made under kMemLabelFileSystem, its blocks under the label of these.
+    // The copy is made under kMemLabelFileSystem, its blocks under the label of the original's blocks.
     MemoryFileData* Clone() const override;
 
 private:
@@ -43,7 +42,7 @@ private:
 
     MemLabelId label; // of the blocks and of their table
     const UInt64 blockSize;
-    dynamic_array<UInt8*> blocks VARNEX_GUARDED_BY(mutex); // in file order; null until something is written into one
+    dynamic_array<UInt8*> blocks VARNEX_GUARDED_BY(mutex); // in file order; null until written to
     UInt64 length VARNEX_GUARDED_BY(mutex) = 0;            // of the file
     mutable Mutex mutex;
 };

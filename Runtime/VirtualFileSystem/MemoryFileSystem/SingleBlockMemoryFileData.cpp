@@ -11,7 +11,7 @@ dynamic_array<UInt8> SingleBlockMemoryFileData::MakeBuffer(MemLabelId memLabel, 
                              : dynamic_array<UInt8>::wrap(bytes, size, size, memLabel);
     }
     dynamic_array<UInt8> empty(memLabel);
-    empty.reserve(size); // refused: the first write asks again
+    (void)empty.reserve(size); // if memory is refused, the first write asks again
     return empty;
 }
 
@@ -39,7 +39,7 @@ UInt64 SingleBlockMemoryFileData::Write(VFS::FileSize position, UInt64 size, con
     Mutex::AutoLock lock(mutex);
     const UInt64 from = position.Cast<UInt64>();
     UInt64 count = size;
-    // An array without a buffer counts as not owning one, but wraps nothing.
+    // An array without a buffer does not own its data either, but wraps nothing.
     const bool isWrapped = buffer.data() != nullptr && !buffer.owns_data();
     if (isWrapped) count = from < buffer.capacity() ? std::min<UInt64>(size, buffer.capacity() - from) : 0;
     if (count == 0 || count > ~UInt64{0} - from) return 0;
@@ -51,7 +51,7 @@ UInt64 SingleBlockMemoryFileData::Write(VFS::FileSize position, UInt64 size, con
 void SingleBlockMemoryFileData::SetLength(VFS::FileSize newLength) {
     Mutex::AutoLock lock(mutex);
     const UInt64 length = newLength.Cast<UInt64>();
-    (void)buffer.resize_uninitialized(length, kResizeExact); // refused: nothing has changed
+    (void)buffer.resize_uninitialized(length, kResizeExact); // when refused, nothing changes
 }
 
 VFS::FileSize SingleBlockMemoryFileData::Size() const {

@@ -2,7 +2,7 @@
 //
 //   auto* contents = New<SingleBlockMemoryFileData>(label, label, data, size, false);  // data stays the caller's
 //
-// Contents that wrap the caller's memory do not grow by writing: what does not fit is not stored. Any thread.
+// Contents that wrap the caller's memory do not grow by writing: bytes that don't fit are not stored. Any thread.
 #pragma once
 
 #include "Runtime/Core/Containers/DynamicArray.h"
@@ -11,9 +11,10 @@
 
 class SingleBlockMemoryFileData : public MemoryFileData {
 public:
-    // The object itself must have been allocated under memLabel. With memory to wrap (data and size not 0) it starts
-    // with these bytes: with takeOwnership it frees data at its end, so data comes from malloc_internal; otherwise
-    // data must outlive it. Without, it starts empty, with room for size bytes, and data is left alone.
+    // The object itself must have been allocated under memLabel. If neither data nor size is 0, the contents are the
+    // size bytes at data, used in place. With takeOwnership the destructor frees data, which must come from
+    // malloc_internal; without it, data must outlive the object. Otherwise the contents start empty, with room for size
+    // bytes.
     SingleBlockMemoryFileData(MemLabelId memLabel, void* data, size_t size, bool takeOwnership);
 
     // The address is the buffer itself, valid until the contents grow.
@@ -25,7 +26,7 @@ public:
     // Bytes between the old end and a position past it are not cleared.
     UInt64 Write(VFS::FileSize position, UInt64 size, const void* in) override;
 
-    // Added bytes are not cleared. A length that wrapped memory can't hold moves the contents to memory of their own.
+    // Added bytes are not cleared. If wrapped memory is too short, the contents move to memory of their own.
     void SetLength(VFS::FileSize newLength) override;
     VFS::FileSize Size() const override;
 

@@ -1,342 +1,614 @@
-// The macOS back end, each test in a fresh folder that it works in and that is HOME too, with a pool, a stand-in that
-// fails nothing unless told, and as many open descriptors at its end as at its start. Files and answers are words.
+// The macOS back end over its stand-in. Each test works in a fresh folder, which is HOME too, and starts without
+// faults.
 #include "PlatformDependent/OSX/Platform.h"
 #include "PlatformDependent/OSX/Standin/Faults.h"
 #include "PlatformDependent/OSX/StringConversions.h"
 #include "Runtime/Utilities/FileUtilities.h"
-#include "Runtime/VirtualFileSystem/LocalFileSystemPosix.h"
-#include "Runtime/VirtualFileSystem/VirtualFileSystem.h"
+#include "Tests/Runtime/VirtualFileSystem/LocalDiskTest.h"
 #include "Tests/Support/ConsoleCapture.h"
-#include "Tests/Support/TemporaryFolder.h"
 
-#include <gtest/gtest.h>
-
+#include <algorithm>
 #include <filesystem>
-#include <numeric>
-#include <set>
-#include <sstream>
 #include <unistd.h>
 
-extern "C" void __tsan_init() __attribute__((weak)); // there under the thread sanitizer alone
-using Text = const std::string&;
+extern "C" void __tsan_init() __attribute__((weak)); // defined only under the thread sanitizer
 
-struct LocalFileSystemOSXTest : testing::Test {
+constexpr int kFolder = kFileEntryIsDirectory;
+constexpr int kLink = kFileEntryIsSymLink;
+constexpr int kHidden = kFileEntryIsHidden;
+
+class LocalFileSystemOSXTest : public LocalDiskTest {
+protected:
     LocalFileSystemOSXTest() {
-        setenv("HOME", m_Folder.Path().c_str(), 1);
-        WorkIn(m_Folder.Path(), m_Folder.Path());
+        setenv("HOME", folder.Path().c_str(), 1);
+        WorkIn(folder.Path(), folder.Path());
     }
     ~LocalFileSystemOSXTest() override {
-        EXPECT_TRUE(seteuid(getuid()) == 0 && chdir("/") == 0);
-        EXPECT_EQ(CountOpenDescriptors(), m_DescriptorsBefore);
+        EXPECT_EQ(0, seteuid(getuid()));
+        EXPECT_EQ(0, chdir("/"));
     }
 
-    // In the process's working directory, and with the file system's current directory.
-    static void WorkIn(Text workingDirectory, Text currentDirectory) {
-        ASSERT_EQ(chdir(workingDirectory.c_str()), 0);
+    static void WorkIn(const std::string& workingDirectory, const std::string& currentDirectory) {
+        ASSERT_EQ(0, chdir(workingDirectory.c_str()));
         GetFileSystem()->SetCurrentDirectory(currentDirectory.c_str());
     }
 
-    // Without the rights of root, for whom modes count nothing, until the test ends.
-    static void WorkAsOther() { ASSERT_TRUE(chmod(".", 0777) == 0 && (geteuid() != 0 || seteuid(65534) == 0)); }
-
-    static FileSystemEntry Entry(Text path) { return FileSystemEntry(path.c_str()); }
-
-    // Makes files that hold their own word, "link>target" and "folder/", with the folders above.
-    static void Make(Text words) {
-        std::istringstream stream(words);
-        for (std::string word; stream >> word;) {
-            const size_t arrow = word.find('>');
-            const std::filesystem::path path = word.substr(0, arrow);
-            std::filesystem::create_directories(("./" / path).parent_path());
-            if (arrow != std::string::npos) std::filesystem::create_symlink(word.substr(arrow + 1), path);
-            if (arrow == std::string::npos && word.back() != '/') WriteFile(path, word);
-        }
+    // Gives up root's rights, which ignore modes, until the test ends.
+    static void WorkAsAnyUser() {
+        ASSERT_EQ(0, chmod(".", 0777));
+        ASSERT_EQ(0, geteuid() == 0 ? seteuid(65534) : 0);
     }
 
-    // Does something with each word, and gives the words back: with "!" for the answer false, and "=path" where the
-    // entry has another path then, or the target's; "/" is the test's folder.
-    std::string Try(Text what, Text words) const {
-        std::istringstream stream(words);
-        std::string text;
-        for (std::string word; stream >> word;) {
-            const size_t arrow = word.find('>'); // of copies
-            FileSystemEntry entry = Entry(word.substr(0, arrow)), to = Entry(word.substr(arrow + 1));
-            const bool answer = what == "create"   ? m_Handler->CreateAsFile(entry)
-                                : what == "trash"  ? m_Handler->MoveToTrash(entry)
-                                : what == "target" ? m_Handler->Target(entry, entry)
-                                                   : m_Handler->Copy(entry, to);
-            const std::string path = entry.path;
-            const size_t top = path.starts_with(m_Folder.Path()) ? m_Folder.Path().size() : 0;
-            text += (answer ? "" : "!") + word + (path == word.substr(0, arrow) ? " " : "=" + path.substr(top) + " ");
-        }
-        return text;
-    }
-
-    // The answer and the sorted entries of a listing, as "path:size:flags", with "!" where the time is not the file's.
-    // A folder's size is 0 or 1, and it has to come before what it holds.
-    std::string List(Text path, bool recursive = false, UInt32 flags = 0) {
+    struct Listing {
+        bool answer;
+        std::vector<Listed> entries; // sorted by path
+        std::string printed;
+    };
+    Listing List(const std::string& path, UInt32 flags = kFileEnumerationAll, bool recursive = true) {
         const ConsoleCapture console;
         dynamic_block_array<FileEntryInfo, 32> out(kMemLabelFileList);
-        const bool answer = m_Handler->Enumerate(path.c_str(), &out, recursive, &m_Counter, FileEnumerationFlag(flags));
-        std::multiset<std::string> sorted;
-        for (size_t i = 0; i < out.size(); ++i) {
-            const FileEntryInfo& info = out[i];
-            const std::string name = info.path, size = std::to_string(info.flags & 1 ? info.size > 0 : info.size);
-            const auto after = sorted.lower_bound(" " + name + "/");
-            EXPECT_TRUE(after == sorted.end() || !after->starts_with(" " + name + "/")) << name << " comes too late";
-            const SInt64 time = m_Handler->LastModified(Entry(name)).ticks;
-            const bool isTimeRight = (info.flags & 2) != 0 || info.lastModified.ticks == time; // links have their own
-            sorted.insert(" " + name + ":" + size + ":" + std::to_string(info.flags) + (isTimeRight ? "" : "!"));
-        }
-        m_Printed = console.Text();
-        return std::accumulate(sorted.begin(), sorted.end(), std::string(answer ? "true" : "false"));
+        Listing listing;
+        listing.answer = mac.Enumerate(path.c_str(), &out, recursive, &m_Counter, FileEnumerationFlag(flags));
+        for (size_t index = 0; index < out.size(); ++index)
+            listing.entries.push_back({out[index].path, out[index].size, out[index].flags});
+        std::sort(listing.entries.begin(), listing.entries.end(),
+                  [](const Listed& a, const Listed& b) { return a.path < b.path; });
+        listing.printed = console.Text();
+        return listing;
     }
-    bool HasPrinted(Text text) const { return m_Printed.find(text) != std::string::npos; }
-    std::string m_Printed;
+
+    LocalFileSystemHandler& mac = *static_cast<LocalFileSystemHandler*>(GetFileSystem()->GetHandlerForPath("/"));
     UInt64 m_Sum = 0;
     void* m_Counter = &m_Sum;
-
-    FileSystemHandler* m_Handler = GetFileSystem()->GetHandlerForPath("/"); // under test: the registry's
-    const size_t m_DescriptorsBefore = CountOpenDescriptors();
-    const TemporaryFolder m_Folder;
     const ScopedFaults m_Faults;
     const AutoreleasePool m_Pool;
 };
 
-TEST_F(LocalFileSystemOSXTest, DiffersFromThePosixOneInTheseAndNoOtherAnswers) {
-    LocalFileSystemPosix posix;
-    const auto compare = [&](Text what, Text words, UInt32 flags, Text posixAnswer, Text macAnswer) {
-        for (const bool isMac : {true, false}) {
-            m_Handler = isMac ? GetFileSystem()->GetHandlerForPath("/") : &posix;
-            Make("d/a d/.dot d/shy d/closed d/sub/ d/link>a d/way>sub d/lost>none");
-            chflags("d/shy", UF_HIDDEN);
-            chmod("d/closed", 0444);
-            FileEntryInfo info;
-            info.flags = 0xF4;
-            const auto query = static_cast<FileEntryInfoQueryFlags>(flags);
-            std::ostringstream text;
-            text << std::hex << m_Handler->GetFileEntryInfo(Entry(words), info, query) << " " << +info.flags;
-            std::string answer = what == "list" ? List(words, true, flags) : text.str();
-            if (what == "target" || what == "copy") answer = Try(what, words);
-            EXPECT_EQ(answer, isMac ? macAnswer : posixAnswer) << what << " " << words << " " << flags;
-            std::filesystem::remove_all("d");
-        }
+TEST_F(LocalFileSystemOSXTest, AQueryFillsWhatItReports) {
+    constexpr UInt32 kStatus = kFileEntryQueryDirectory | kFileEntryQuerySize | kFileEntryQueryLastModified;
+    constexpr UInt32 kAll =
+        kStatus | kFileEntryQuerySymLink | kFileEntryQueryHidden | kFileEntryQueryReadOnly | kFileEntryQueryExists;
+    Run("touch a shy closed; ln -s a link; chmod 444 closed");
+    EXPECT_EQ(0, chflags("shy", UF_HIDDEN));
+    struct {
+        const char* name;
+        UInt32 query, answer;
+        int flags; // of an info that was marked as hidden
+    } const kCases[] = {
+        {".", kFileEntryQueryExists | kFileEntryQueryDirectory, kFileEntryQueryExists | kStatus, kFolder | kHidden},
+        {"none", kFileEntryQueryExists | kFileEntryQueryDirectory, kFileEntryQueryNone, kHidden},
+        {"a", kFileEntryQueryNone, kFileEntryQueryNone, kHidden},
+        {"a", kFileEntryQueryExists, kFileEntryQueryExists, kHidden},
+        {"a", kFileEntryQueryHidden, kFileEntryQueryHidden, 0},
+        {"shy", kFileEntryQueryHidden, kFileEntryQueryHidden, kHidden},
+        {"link", kAll, kAll, kLink},
+        {"closed", kFileEntryQueryReadOnly, kStatus | kFileEntryQueryReadOnly, kFileEntryIsReadOnly | kHidden},
     };
-    compare("info", "d", 0x90, "1d4 f1", "194 f5");
-    compare("info", "none", 0x90, "0 f4", "0 f4");
-    compare("info", "d/a", 0, "40 f0", "0 f4");
-    compare("info", "d/a", 0x80, "c0 f0", "80 f4");
-    compare("info", "d/a", 0x40, "40 f0", "40 f0");
-    compare("info", "d/shy", 0x40, "40 f0", "40 f4");
-    compare("info", "d/link", 0x3F4, "3f4 f2", "3f4 f2");
-    compare("info", "d/closed", 0x200, "354 f8", "314 fc");
-    compare("list", "none", 0, "false", "true");
-    compare("list", "d", 0x12, "true d/a:3:0 d/closed:8:8 d/link:3:2 d/lost:0:2 d/shy:5:0",
-            "true d/.dot:6:4 d/a:3:0 d/closed:8:0 d/link:1:2 d/lost:4:2");
-    compare("list", "d", 0x08, "true d/.dot:6:4 d/sub:1:1 d/way:1:3", "true d/shy:5:4 d/sub:0:1 d/way:0:3");
-    compare("target", "d/link d/lost", 0, "d/link=/d/a !d/lost ", "d/link=d/a d/lost=d/none ");
-    compare("copy", "d/a>d/shy d/sub>d/new", 0, "d/a>d/shy !d/sub>d/new ", "!d/a>d/shy d/sub>d/new ");
-    Make("shut/closed/in");
-    chmod("shut/closed", 0);
-    WorkAsOther();
-    compare("list", "shut", 0, "false shut/closed:1:9", "true shut/closed:0:1");
+    for (const auto& c : kCases) {
+        FileEntryInfo info;
+        info.flags = kHidden;
+        EXPECT_EQ(c.answer, mac.GetFileEntryInfo(Entry(c.name), info, FileEntryInfoQueryFlags(c.query)))
+            << c.name << ", query " << c.query;
+        EXPECT_EQ(c.flags, info.flags) << c.name << ", query " << c.query;
+    }
 }
 
-TEST_F(LocalFileSystemOSXTest, SkippedNamesAreNeitherListedNorSummedNorDescendedInto) {
-    Make("d/a d/back~ d/CVS/in d/shy/in d/sub/in");
-    chflags("d/shy", UF_HIDDEN);
-    EXPECT_EQ(List("d", true, 0x24), "true d/a:3:0 d/sub/in:8:0 d/sub:0:1");
-    EXPECT_EQ(List("d", true, 0x24 | kFileEnumerationSumSizes), "true");
-    EXPECT_TRUE(m_Sum == 11 && !HasPrinted("Assertion failed")) << m_Printed;
-    EXPECT_TRUE(HasPrinted("Filesystem does not support storing size during enumeration outside of Zarvo Editor."));
-    m_Counter = nullptr;
-    EXPECT_EQ(List("d", false, kFileEnumerationSumSizes), "true");
-    EXPECT_TRUE(HasPrinted("Assertion failed on expression: 'handlerData != NULL'"));
-    EXPECT_TRUE(m_Handler->Enumerate("d", nullptr, false, nullptr, kFileEnumerationSumSizes));
-}
-
-TEST_F(LocalFileSystemOSXTest, PathsAreListedAsTheyLead) {
-    const std::string top = m_Folder / "", fromRoot = top.substr(1) + "docs";
-    Make("docs/x do/ \xFF/x \xFF/docs/x gone/");
-    const auto list = [&](Text workingDirectory, Text currentDirectory, Text path) {
-        WorkIn(workingDirectory, currentDirectory);
-        return List(path) + m_Printed;
+TEST_F(LocalFileSystemOSXTest, AListingTellsKindsAndSizes) {
+    Run("mkdir -p d/sub; cd d; printf 123 > a; touch .dot shy closed; chmod 444 closed");
+    Run("cd d; ln -s a link; ln -s sub way; ln -s none lost");
+    EXPECT_EQ(0, chflags("d/shy", UF_HIDDEN));
+    const std::vector<Listed> kExpected = {
+        {.path = "d/.dot", .flags = kHidden},
+        {.path = "d/a", .size = 3},
+        {.path = "d/closed"},
+        {.path = "d/link", .size = 1, .flags = kLink},
+        {.path = "d/lost", .size = 4, .flags = kLink},
+        {.path = "d/shy", .flags = kHidden},
+        {.path = "d/sub", .flags = kFolder},
+        {.path = "d/way", .flags = kFolder | kLink},
     };
-    EXPECT_EQ(list(top, m_Folder.Path(), "docs/"), "true docs/x:6:0");
-    EXPECT_EQ(list(top, top + "do", "docs"), "true " + top + "docs/x:6:0") << "which is another folder";
-    EXPECT_EQ(list(top + "docs", top + "docs", "."), "true ./x:6:0");
-    EXPECT_EQ(list(top, "", "\xFF/docs"), "true \xFF/docs/x:8:0");
-    EXPECT_EQ(list(top + "\xFF", top + "\xFF", "docs"), "true docs/x:8:0");
-    EXPECT_EQ(list("/", "/", fromRoot), "true " + fromRoot + "/x:6:0");
-    EXPECT_EQ(list("/", "", fromRoot), "true " + fromRoot + "/x:6:0");
-    EXPECT_FALSE(m_Handler->Enumerate(nullptr, nullptr, false, nullptr, kFileEnumerationAll));
-    WorkIn(top + "gone", top);
-    std::filesystem::remove(top + "gone");
-    EXPECT_STREQ(NSURL_fileSystemRepresentation(NSURL_fileURLWithPath(NSString_stringWithUTF8String("x"))), "");
+    const Listing listing = List("d");
+    EXPECT_EQ(kExpected, listing.entries);
+    EXPECT_TRUE(listing.answer);
+    EXPECT_EQ("", listing.printed);
 }
 
-TEST_F(LocalFileSystemOSXTest, FaultsAreReportedAndTheRestIsListed) {
-    const std::string name(30, 'z'); // long enough for no record to be reported as too short besides
-    Make("d/a d/sub/in d/" + name);
-    chflags(("d/" + name).c_str(), UF_HIDDEN);
-    const std::string rest = "true d/a:3:0 d/sub/in:8:0 d/sub:0:1", named = rest + " d/" + name, all = named + ":32:4";
-    const std::string end = ") occured whilst enumerating d", lacks = "'entry.returned.commonattr & ATTR_CMN_";
-    const auto expect = [&](const StandinFaults& faults, Text listed, Text printed) {
+TEST_F(LocalFileSystemOSXTest, AListingTellsTimes) {
+    Run("mkdir -p d/sub; touch -d 2001-02-03 d/sub d/file");
+    dynamic_block_array<FileEntryInfo, 32> out(kMemLabelFileList);
+    EXPECT_TRUE(mac.Enumerate("d", &out, false, nullptr, kFileEnumerationAll));
+    EXPECT_EQ(2u, out.size());
+    for (size_t index = 0; index < out.size(); ++index)
+        EXPECT_EQ(mac.LastModified(Entry(out[index].path)).ticks, out[index].lastModified.ticks) << out[index].path;
+}
+
+TEST_F(LocalFileSystemOSXTest, AFolderIsListedBeforeItsContents) {
+    Run("mkdir -p d/d/d");
+    dynamic_block_array<FileEntryInfo, 32> out(kMemLabelFileList);
+    EXPECT_TRUE(mac.Enumerate("d", &out, true, nullptr, kFileEnumerationAll));
+    ASSERT_EQ(2u, out.size());
+    EXPECT_STREQ("d/d", out[0].path);
+    EXPECT_STREQ("d/d/d", out[1].path);
+}
+
+TEST_F(LocalFileSystemOSXTest, FiltersLookAtTheFileFlagAlone) {
+    Run("mkdir -p d/sub; touch d/a d/.dot d/shy");
+    EXPECT_EQ(0, chflags("d/shy", UF_HIDDEN));
+    const std::vector<Listed> kVisibleFiles = {{.path = "d/.dot", .flags = kHidden}, {.path = "d/a"}};
+    EXPECT_EQ(kVisibleFiles, List("d", kFileEnumerationSkipHiddenFiles | kFileEnumerationSkipFolders).entries);
+    const std::vector<Listed> kOthers = {{.path = "d/shy", .flags = kHidden}, {.path = "d/sub", .flags = kFolder}};
+    EXPECT_EQ(kOthers, List("d", kFileEnumerationSkipFiles).entries);
+}
+
+TEST_F(LocalFileSystemOSXTest, ASkippedFolderIsNeitherListedNorSummed) {
+    Run("mkdir -p d/CVS d/shy d/sub; for f in back~ CVS/in shy/in sub/in; do printf 1 > d/$f; done");
+    EXPECT_EQ(0, chflags("d/shy", UF_HIDDEN));
+    constexpr FileEnumerationFlag kSkip = kFileEnumerationSkipHiddenFolders | kFileEnumerationSkipByName;
+    const std::vector<Listed> kExpected = {{.path = "d/sub", .flags = kFolder}, {.path = "d/sub/in", .size = 1}};
+    EXPECT_EQ(kExpected, List("d", kSkip).entries);
+    EXPECT_EQ(std::vector<Listed>(), List("d", kSkip | kFileEnumerationSumSizes).entries);
+    EXPECT_EQ(1u, m_Sum);
+}
+
+TEST_F(LocalFileSystemOSXTest, SummingIsReported) {
+    Run("mkdir d; touch d/a");
+    const std::string printed = List("d", kFileEnumerationSumSizes).printed;
+    EXPECT_NE(std::string::npos, printed.find("Filesystem does not support storing size during enumeration outside "
+                                              "of Zarvo Editor."))
+        << printed;
+}
+
+TEST_F(LocalFileSystemOSXTest, SummingWithoutACounterIsReported) {
+    Run("mkdir d; touch d/a");
+    for (void** const handlerData : {static_cast<void**>(nullptr), &m_Counter}) {
+        m_Counter = nullptr;
+        const ConsoleCapture console;
+        EXPECT_TRUE(mac.Enumerate("d", nullptr, false, handlerData, kFileEnumerationSumSizes));
+        EXPECT_NE(std::string::npos, console.Text().find("Assertion failed on expression: 'handlerData != NULL'"))
+            << console.Text();
+    }
+}
+
+TEST_F(LocalFileSystemOSXTest, AFolderThatCantBeOpenedIsListedAsEmpty) {
+    Run("mkdir -p d/shut/in; chmod 0 d/shut");
+    WorkAsAnyUser();
+    const Listing shut = List("d");
+    EXPECT_TRUE(shut.answer);
+    EXPECT_EQ((std::vector<Listed>{{.path = "d/shut", .flags = kFolder}}), shut.entries);
+    const Listing none = List("none");
+    EXPECT_TRUE(none.answer);
+    EXPECT_EQ(std::vector<Listed>(), none.entries);
+    EXPECT_FALSE(mac.Enumerate(nullptr, nullptr, false, nullptr, kFileEnumerationAll));
+}
+
+TEST_F(LocalFileSystemOSXTest, ARelativeListingIsRelativeAgain) {
+    const std::string top = folder / "", fromRoot = top.substr(1) + "docs";
+    Run("mkdir -p docs do; touch docs/x; mkdir -p \"$(printf '\\377')/docs\"; touch \"$(printf '\\377')/docs/x\"");
+    const struct {
+        std::string workingDirectory, currentDirectory, path, listed;
+    } kCases[] = {
+        {.workingDirectory = top, .currentDirectory = folder.Path(), .path = "docs/", .listed = "docs/x"},
+        {.workingDirectory = top, .currentDirectory = top + "do", .path = "docs", .listed = top + "docs/x"},
+        {.workingDirectory = top + "docs", .currentDirectory = top + "docs", .path = ".", .listed = "./x"},
+        {.workingDirectory = top, .currentDirectory = "", .path = "\xFF/docs", .listed = "\xFF/docs/x"},
+        {.workingDirectory = top + "\xFF", .currentDirectory = top + "\xFF", .path = "docs", .listed = "docs/x"},
+        {.workingDirectory = "/", .currentDirectory = "/", .path = fromRoot, .listed = fromRoot + "/x"},
+        {.workingDirectory = "/", .currentDirectory = "", .path = fromRoot, .listed = fromRoot + "/x"},
+    };
+    for (const auto& c : kCases) {
+        WorkIn(c.workingDirectory, c.currentDirectory);
+        EXPECT_EQ((std::vector<Listed>{{.path = c.listed}}), List(c.path).entries)
+            << c.path << " in " << c.workingDirectory << ", current " << c.currentDirectory;
+    }
+}
+
+TEST_F(LocalFileSystemOSXTest, ARelativeUrlNeedsAWorkingDirectory) {
+    Run("mkdir gone");
+    WorkIn(folder / "gone", folder.Path());
+    Run("rmdir gone");
+    EXPECT_STREQ("", NSURL_fileSystemRepresentation(NSURL_fileURLWithPath(NSString_stringWithUTF8String("x"))));
+}
+
+// A folder of which one entry, with a name that is long enough for its record never to count as too short, is altered.
+class ListingFaultsTest : public LocalFileSystemOSXTest {
+protected:
+    ListingFaultsTest() {
+        Run("mkdir -p d/sub; printf 1 > d/a; printf 12 > d/sub/in; printf 1234 > d/" + altered);
+        EXPECT_EQ(0, chflags(("d/" + altered).c_str(), UF_HIDDEN));
+    }
+
+    std::vector<Listed> Others() const {
+        return {{.path = "d/a", .size = 1}, {.path = "d/sub", .flags = kFolder}, {.path = "d/sub/in", .size = 2}};
+    }
+    std::vector<Listed> OthersAnd(const Listed& entry) const {
+        std::vector<Listed> entries = Others();
+        entries.push_back(entry);
+        return entries;
+    }
+
+    const std::string altered = std::string(30, 'z');
+    const Listed whole = {.path = "d/" + altered, .size = 4, .flags = kHidden};
+};
+
+TEST_F(ListingFaultsTest, AListingErrorIsPrinted) {
+    const struct {
+        int error;
+        std::string printed;
+    } kCases[] = {
+        {.error = EIO, .printed = "Error (Input/output error) occured whilst enumerating d\n"},
+        {.error = EINTR, .printed = "Error (Interrupted system call) occured whilst enumerating d\n"},
+    };
+    for (const auto& c : kCases) {
+        gStandinFaults = {.recordsBeforeListingError = 0, .listingError = c.error};
+        const Listing listing = List("d");
+        EXPECT_FALSE(listing.answer) << c.printed;
+        EXPECT_EQ(std::vector<Listed>(), listing.entries) << c.printed;
+        EXPECT_EQ(c.printed, listing.printed);
+    }
+}
+
+TEST_F(ListingFaultsTest, AnErrorDeeperDownEndsThatFolderAlone) {
+    gStandinFaults = {.recordsBeforeListingError = 4, .listingError = EIO};
+    const Listing listing = List("d");
+    EXPECT_TRUE(listing.answer);
+    EXPECT_EQ(OthersAnd(whole), listing.entries);
+    EXPECT_EQ("Error (Input/output error) occured whilst enumerating d/sub\n", listing.printed);
+}
+
+TEST_F(ListingFaultsTest, TheBufferGrowsUntilARecordFits) {
+    gStandinFaults = {.callsTooSmall = 10};
+    const Listing listing = List("d");
+    EXPECT_EQ(OthersAnd(whole), listing.entries);
+    EXPECT_EQ("", listing.printed);
+}
+
+TEST_F(ListingFaultsTest, TheBufferStopsGrowingAtItsLimit) {
+    if (__tsan_init != nullptr) GTEST_SKIP() << "a gigabyte is too much under the thread sanitizer";
+    gStandinFaults = {.callsTooSmall = 100};
+    const Listing listing = List("d");
+    EXPECT_FALSE(listing.answer);
+    EXPECT_EQ("Error (Numerical result out of range) occured whilst enumerating d\n", listing.printed);
+    EXPECT_EQ(100 - 19, gStandinFaults.callsTooSmall) << "one call with 4,096 bytes, and one per doubling to 2^30";
+}
+
+TEST_F(ListingFaultsTest, AnEntryWithAnErrorIsLeftOut) {
+    gStandinFaults = {.entryErrorName = altered};
+    const Listing listing = List("d");
+    EXPECT_TRUE(listing.answer);
+    EXPECT_EQ(Others(), listing.entries);
+    EXPECT_TRUE(listing.printed.ends_with(") occured whilst enumerating d\n")) << listing.printed;
+}
+
+TEST_F(ListingFaultsTest, AnEntryWithoutANameIsReported) {
+    const StandinFaults kCases[] = {
+        {.alteredName = altered, .missingCommon = ATTR_CMN_NAME},
+        {.alteredName = altered, .movedName = 0x40000000}, // out of the record
+        {.alteredName = altered, .movedName = -0x40000000},
+    };
+    for (const StandinFaults& faults : kCases) {
         gStandinFaults = faults;
-        EXPECT_EQ(List("d", true), listed) << printed;
-        EXPECT_TRUE(HasPrinted(printed) && m_Printed.empty() == printed.empty()) << m_Printed;
+        const Listing listing = List("d");
+        EXPECT_EQ(Others(), listing.entries) << faults.movedName;
+        EXPECT_NE(std::string::npos, listing.printed.find("'entry.returned.commonattr & ATTR_CMN_NAME'"))
+            << faults.movedName << ": " << listing.printed;
+    }
+}
+
+TEST_F(ListingFaultsTest, AMissingAttributeIsReported) {
+    const struct {
+        uint32_t attribute;
+        const char* reported;
+        Listed entry;
+    } kCases[] = {
+        {ATTR_CMN_OBJTYPE, "'entry.returned.commonattr & ATTR_CMN_OBJTYPE'", whole},
+        {ATTR_CMN_MODTIME, "'entry.returned.commonattr & ATTR_CMN_MODTIME'", whole},
+        {ATTR_CMN_FLAGS, "'entry.returned.commonattr & ATTR_CMN_FLAGS'", {.path = whole.path, .size = whole.size}},
     };
-    expect({.recordsBeforeListingError = 0, .listingError = EIO}, "false", "Error (Input/output error" + end + "\n");
-    expect({.recordsBeforeListingError = 0, .listingError = EINTR}, "false", "Error (Interrupted system call" + end);
-    expect({.recordsBeforeListingError = 4, .listingError = EIO}, all, end + "/sub\n");
-    expect({.callsTooSmall = 10}, all, ""); // the buffer grows until a record fits
-    if (__tsan_init == nullptr) {           // which makes much more of it
-        expect({.callsTooSmall = 100}, "false", "Error (Numerical result out of range" + end);
-        EXPECT_EQ(gStandinFaults.callsTooSmall, 100 - 19) << "calls with 4,096 bytes, and 18 times twice as much";
+    for (const auto& c : kCases) {
+        gStandinFaults = {.alteredName = altered, .missingCommon = c.attribute};
+        const Listing listing = List("d");
+        EXPECT_EQ(OthersAnd(c.entry), listing.entries) << c.reported;
+        EXPECT_NE(std::string::npos, listing.printed.find(c.reported)) << listing.printed;
     }
-    expect({.entryErrorName = name}, rest, end + "\n");
-    expect({.alteredName = name, .missingCommon = ATTR_CMN_NAME}, rest, lacks + "NAME'");
-    expect({.alteredName = name, .movedName = 0x40000000}, rest, lacks + "NAME'");
-    expect({.alteredName = name, .movedName = -0x40000000}, rest, lacks + "NAME'");
-    expect({.alteredName = name, .missingCommon = ATTR_CMN_OBJTYPE}, all, lacks + "OBJTYPE'");
-    expect({.alteredName = name, .missingCommon = ATTR_CMN_MODTIME}, all + "!", lacks + "MODTIME'");
-    expect({.alteredName = name, .missingCommon = ATTR_CMN_FLAGS}, named + ":32:0", lacks + "FLAGS'");
-    expect({.alteredName = name, .missingFile = ATTR_FILE_TOTALSIZE}, named + ":0:4", "");
-    List("d", true, kFileEnumerationSumSizes); // the last fault still holds
-    EXPECT_TRUE(m_Sum == 11 && HasPrinted("'entry.returned.fileattr & ATTR_FILE_TOTALSIZE'")) << m_Printed;
 }
 
-// A cut record is used as far as it goes, and the next one is found behind it.
+TEST_F(ListingFaultsTest, AMissingSizeIsReportedWhenSumming) {
+    gStandinFaults = {.alteredName = altered, .missingFile = ATTR_FILE_TOTALSIZE};
+    const Listing listing = List("d");
+    EXPECT_EQ(OthersAnd({.path = whole.path, .flags = kHidden}), listing.entries);
+    EXPECT_EQ("", listing.printed);
+    const Listing summed = List("d", kFileEnumerationSumSizes);
+    EXPECT_EQ(3u, m_Sum);
+    EXPECT_NE(std::string::npos, summed.printed.find("'entry.returned.fileattr & ATTR_FILE_TOTALSIZE'"))
+        << summed.printed;
+}
+
+// A cut record is used as far as it goes. The next one is found after it, unless the length can't be true.
 TEST_F(LocalFileSystemOSXTest, RecordsOfAnyLengthAreHandled) {
-    Make("d/a d/b d/c");
-    for (UInt32 length = 0; length <= 72; ++length) { // of a whole record, whose name is at 64
+    constexpr UInt32 kLengthSize = 4, kFixedSize = 60, kNameAt = 64, kWholeSize = 72;
+    Run("mkdir d; cd d; touch a b c");
+    for (UInt32 length = 0; length <= kWholeSize; ++length) {
+        SCOPED_TRACE(length);
         gStandinFaults = {.alteredName = "b", .cut = true, .cutLength = length};
-        const std::string b = length > 64 ? " d/b:3:0" : "";
-        EXPECT_TRUE(List("d") == "true d/a:3:0" + b + " d/c:3:0" || length < sizeof(length)) << length;
-        EXPECT_EQ(HasPrinted("Trying to copy too much data from getattrlistbulk attribute buffer"), length < 60);
-        EXPECT_EQ(HasPrinted("ATTR_CMN_NAME"), length >= sizeof(length) && length <= 64) << length;
+        const Listing listing = List("d");
+        std::vector<Listed> expected = {{.path = "d/a"}, {.path = "d/c"}};
+        if (length > kNameAt) expected.insert(expected.begin() + 1, {.path = "d/b"});
+        if (length >= kLengthSize) {
+            EXPECT_EQ(expected, listing.entries);
+        }
+        const auto reports = [&](const char* text) { return listing.printed.find(text) != std::string::npos; };
+        EXPECT_EQ(length < kFixedSize, reports("Trying to copy too much data from getattrlistbulk attribute buffer"));
+        EXPECT_EQ(length >= kLengthSize && length <= kNameAt, reports("ATTR_CMN_NAME"));
     }
-    gStandinFaults.cutLength = UINT32_MAX; // leads out of the buffer
-    EXPECT_NE(List("d").find("d/b:3"), std::string::npos);
 }
 
-TEST_F(LocalFileSystemOSXTest, TreesAreListedCopiedAndDeletedWhole) {
-    std::string words = "d/" + std::string(255, 'n') + " d/\xFF\xFE/\xFF d/lost>none d/self>. d";
-    for (int depth = 0; depth < 200; ++depth)
-        words += "/d";
-    for (int file = 0; file < 10'000; ++file)
-        words += " d/many/" + std::to_string(file);
-    Make(words);
-    const std::string listed = List("d", true);
-    EXPECT_EQ(std::count(listed.begin(), listed.end(), ':') / 2, 10'000 + 200 + 6);
-    EXPECT_EQ(Try("copy", "d>e"), "d>e ");
-    EXPECT_TRUE(DeleteFileOrDirectory("d") && rename("e", "d") == 0 && List("d", true) == listed);
-    // Below e/c/a the folder a is listed once more, but not c, which e/c/a lies in.
-    Make("e/a/x e/a/c>../c e/c/a>../a e/loop>loop");
-    EXPECT_EQ(List("e", true),
-              "true e/a/c/a:0:3 e/a/c:0:3 e/a/x:5:0 e/a:0:1 e/c/a/c:0:3 e/c/a/x:5:0 e/c/a:0:3 e/c:0:1 e/loop:4:2");
+TEST_F(LocalFileSystemOSXTest, ARecordThatLeadsOutOfTheBufferIsTheLast) {
+    Run("mkdir d; touch d/b");
+    gStandinFaults = {.alteredName = "b", .cut = true, .cutLength = UINT32_MAX};
+    EXPECT_EQ((std::vector<Listed>{{.path = "d/b"}}), List("d").entries);
 }
 
-TEST_F(LocalFileSystemOSXTest, PathsThatDoNotFitAreCutAndNothingIsDeletedByThem) {
-    const std::string x(200, 'x'), folder = m_Folder / "d/" + x + "/" + x + "/" + x + "/" + x;
-    const std::string whole = folder + "/" + std::string(kMaxPathLength - folder.size(), 'n');
-    const std::string cut = whole.substr(0, kMaxPathLength), shown = cut.substr(m_Folder.Path().size());
-    Make(whole + " " + cut + " way>" + whole);
-    std::string listed = List(folder);
-    std::erase(listed, '!'); // the time of the file whose path is cut is asked of the other one
-    EXPECT_EQ(listed, "true " + cut + ":1039:0 " + cut + ":1040:0");
-    EXPECT_EQ(Try("target", "way"), "way=" + shown + " ");
-    EXPECT_EQ(Try("trash", "way"), "!way=" + shown + " ");
+TEST_F(LocalFileSystemOSXTest, ListsCopiesAndDeletesBigTrees) {
+    Run("mkdir -p d$(printf '/d%.0s' $(seq 199)) d/many d/$(printf '\\377\\376'); cd d/many; seq 10000 | xargs touch");
+    Run("touch d/$(printf %0255d 0); ln -s none d/lost; ln -s . d/self");
+    const std::vector<Listed> entries = List("d").entries;
+    EXPECT_EQ(199u + 2 + 10'000 + 3, entries.size());
+    FileSystemEntry from = Entry("d"), to = Entry("e");
+    EXPECT_TRUE(mac.Copy(from, to));
+    EXPECT_TRUE(DeleteFileOrDirectory("d"));
+    EXPECT_FALSE(IsThere("d"));
+    Run("mv e d");
+    EXPECT_TRUE(List("d").entries == entries) << "the copy differs"; // too many to print
+}
+
+TEST_F(LocalFileSystemOSXTest, AListingEndsInLoopsOfLinks) {
+    Run("mkdir -p e/a e/c; touch e/a/x; ln -s ../c e/a/c; ln -s ../a e/c/a; ln -s loop e/loop");
+    const std::vector<Listed> kExpected = {
+        {.path = "e/a", .flags = kFolder},
+        {.path = "e/a/c", .flags = kFolder | kLink},
+        {.path = "e/a/c/a", .flags = kFolder | kLink}, // is e/a, which this listing is inside
+        {.path = "e/a/x"},
+        {.path = "e/c", .flags = kFolder},
+        {.path = "e/c/a", .flags = kFolder | kLink},
+        {.path = "e/c/a/c", .flags = kFolder | kLink},
+        {.path = "e/c/a/x"},
+        {.path = "e/loop", .size = 4, .flags = kLink},
+    };
+    EXPECT_EQ(kExpected, List("e").entries);
+}
+
+TEST_F(LocalFileSystemOSXTest, APathThatIsCutIsNotDeleted) {
+    const std::string x(200, 'x'), deep = folder / "d/" + x + "/" + x + "/" + x + "/" + x;
+    const std::string tooLong = deep + "/" + std::string(kMaxPathLength - deep.size(), 'n');
+    const std::string cut = tooLong.substr(0, kMaxPathLength);
+    Run("mkdir -p " + deep + "; printf 1 > " + cut + "; printf 12 > " + tooLong + "; ln -s " + tooLong + " way");
+    std::vector<Listed> listed = List(deep).entries;
+    std::sort(listed.begin(), listed.end(), [](const Listed& a, const Listed& b) { return a.size < b.size; });
+    EXPECT_EQ((std::vector<Listed>{{.path = cut, .size = 1}, {.path = cut, .size = 2}}), listed);
+    FileSystemEntry target, way = Entry("way");
+    EXPECT_TRUE(mac.Target(way, target));
+    EXPECT_EQ(cut, target.Path());
+    EXPECT_FALSE(mac.MoveToTrash(way));
+    EXPECT_EQ(cut, way.Path());
+    EXPECT_TRUE(IsThere(cut));
     EXPECT_FALSE(DeleteFileOrDirectory("d"));
+    Run("test -e " + tooLong);
 }
 
-TEST_F(LocalFileSystemOSXTest, HiddenMarkIsAFileFlag) {
-    WorkAsOther();
-    Make("file closed");
-    mkfifo("pipe", 0644); // no attribute for flags can be written, as with what is closed to its owner
-    chflags("closed", UF_HIDDEN);
-    chmod("closed", 0444);
+TEST_F(LocalFileSystemOSXTest, TargetNeedNotExist) {
+    Run("touch a; ln -s a link; ln -s none lost");
+    struct {
+        const char *name, *target;
+    } const kCases[] = {{"link", "a"}, {"lost", "none"}, {"none", "none"}};
+    for (const auto& c : kCases) {
+        FileSystemEntry target;
+        EXPECT_TRUE(mac.Target(FileSystemEntry(c.name), target)) << c.name;
+        EXPECT_STREQ(c.target, target.Path()) << c.name;
+    }
+}
+
+TEST_F(LocalFileSystemOSXTest, TheHiddenMarkIsAFileFlag) {
+    constexpr UInt32 kOtherFlag = 1;
+    // The flags of the last two can't be written to an attribute.
+    Run("touch file closed; mkfifo pipe; chmod 444 closed; test $(id -u) != 0 || chown 65534 file closed pipe");
+    WorkAsAnyUser();
+    struct {
+        UInt32 mask, flags;
+        bool isHidden;
+    } const kSteps[] = {
+        {.mask = 0, .flags = 0, .isHidden = false},       {.mask = kHidden, .flags = kHidden, .isHidden = true},
+        {.mask = 0, .flags = 0, .isHidden = true},        {.mask = 0x0B, .flags = 0x02, .isHidden = true},
+        {.mask = kHidden, .flags = 0, .isHidden = false}, {.mask = 0, .flags = kHidden, .isHidden = true},
+        {.mask = 0xFF, .flags = 0, .isHidden = false},
+    };
     for (const char* name : {"file", "closed", "pipe"}) {
         FileSystemEntry entry = Entry(name);
-        EXPECT_EQ(chflags(name, 1), 0); // a flag that stays
-        const UInt32 kSteps[][3] = {{0, 0, 0}, {4, 4, 1}, {0, 0, 1}, {11, 2, 1}, {4, 0, 0}, {0, 4, 1}, {255, 0, 0}};
-        for (const auto& [mask, flags, isHidden] : kSteps) {
+        EXPECT_EQ(0, chflags(name, kOtherFlag));
+        for (const auto& step : kSteps) {
+            SCOPED_TRACE(testing::Message() << name << ", mask " << step.mask << ", flags " << step.flags);
             PlatformStatus status = {};
-            EXPECT_TRUE(m_Handler->SetFlags(entry, mask, flags) && PlatformStat(name, &status) == 0) << name;
-            EXPECT_EQ(status.st_flags, isHidden * UF_HIDDEN + 1) << name << " " << mask << " " << flags;
-            EXPECT_EQ(m_Handler->IsHidden(entry), isHidden != 0) << name;
+            EXPECT_TRUE(mac.SetFlags(entry, step.mask, step.flags));
+            EXPECT_EQ(0, PlatformStat(name, &status));
+            EXPECT_EQ(step.isHidden ? UF_HIDDEN | kOtherFlag : kOtherFlag, status.st_flags);
+            EXPECT_EQ(step.isHidden, mac.IsHidden(entry));
         }
     }
-    FileSystemEntry file = Entry("file"), none = Entry("none");
-    EXPECT_FALSE(m_Handler->SetFlags(none, 0, 0) || m_Handler->IsHidden(none));
+}
+
+TEST_F(LocalFileSystemOSXTest, AMissingFileHasNoFlags) {
+    FileSystemEntry none = Entry("none");
+    EXPECT_FALSE(mac.SetFlags(none, 0, 0));
+    EXPECT_FALSE(mac.IsHidden(none));
+}
+
+TEST_F(LocalFileSystemOSXTest, FlagsThatCantBeSetAreReported) {
+    Run("touch file");
+    FileSystemEntry file("file");
     gStandinFaults.chflagsError = EPERM;
-    ConsoleCapture console;
-    EXPECT_TRUE(m_Handler->SetFlags(file, 4, 0) && !m_Handler->SetFlags(file, 4, 4)) << "unchanged is not set";
-    EXPECT_NE(console.Text().find("Failed to change file flags for 'file'. errno: 1"), std::string::npos);
+    const ConsoleCapture console;
+    EXPECT_TRUE(mac.SetFlags(file, kHidden, 0)) << "unchanged flags are not set";
+    EXPECT_EQ("", console.Text());
+    EXPECT_FALSE(mac.SetFlags(file, kHidden, kHidden));
+    EXPECT_NE(std::string::npos, console.Text().find("Failed to change file flags for 'file'. errno: 1"))
+        << console.Text();
 }
 
-TEST_F(LocalFileSystemOSXTest, FilesAreMadeWhereThereAreNone) {
-    Make("file lost>none/x");
-    EXPECT_EQ(Try("create", "new file . lost none/x \xFF"), "new !file !. !lost !none/x !\xFF ");
-    EXPECT_EQ(List("."), "true ./file:4:0 ./lost:6:2 ./new:0:0");
-    ConsoleCapture console;
-    EXPECT_FALSE(CreateDirectory("/none/x"));
-    EXPECT_TRUE(console.Text().starts_with("CreateDirectory '/none/x' failed: No such file or directory"));
-}
-
-TEST_F(LocalFileSystemOSXTest, TrashTakesWhatThePathLeadsTo) {
-    Make("a/name b/name folder/sub/file target \xFF x\\y x/y link>target lost>none way>x\\y p/\xFF out>p/\xFF");
-    EXPECT_EQ(
-        Try("trash", "a/name b/name folder link none lost way out \xFF"),
-        "a/name=/a/name b/name=/b/name folder=/folder link=/target !none=/none !lost=/none !way=/x\\y !out=/p/\xFF "
-        "!\xFF= ");
-    EXPECT_EQ(List(".Trash"), "true .Trash/folder:0:1 .Trash/name 2:6:0 .Trash/name:6:0 .Trash/target:6:0");
-    gStandinFaults.trashRefuses = true; // what is still there then is deleted
-    EXPECT_EQ(Try("trash", "b link /proc/version"), "b=/b !link=/target !/proc/version ") << "the last for nobody";
-    EXPECT_EQ(
-        List("."),
-        "true ./.Trash:0:5 ./a:0:1 ./link:6:2 ./lost:4:2 ./out:3:2 ./p:0:1 ./way:3:2 ./x:0:1 ./x\\y:3:0 ./\xFF:1:0");
-}
-
-TEST_F(LocalFileSystemOSXTest, CopyTakesFoldersWholeAndReplacesNothing) {
-    Make("from/file from/\xFF from/sub/in from/link>file from/lost>none pipes/file there way>from");
-    mkfifo("pipes/pipe", 0644); // can't be copied
-    EXPECT_EQ(Try("copy", "way>to"), "way>to ");
-    for (const char* copy : {"from/file>there", "there>there", "there>from/lost", "there>none/x", "none>new",
-                             "from/\xFF>new", "there>\xFF", "pipes>new", "from>from/sub/new", "/>new"})
-        EXPECT_EQ(Try("copy", copy), "!" + std::string(copy) + " ");
-    EXPECT_EQ(List("."), "true ./from:0:1 ./pipes:0:1 ./there:5:0 ./to:0:1 ./way:0:3");
-    EXPECT_EQ(List("to", true), "true to/file:9:0 to/link:4:2 to/lost:4:2 to/sub/in:11:0 to/sub:0:1 to/\xFF:6:0");
-    WorkIn(m_Folder.Path(), m_Folder / "to");
-    EXPECT_EQ(Try("copy", "file>new"), "file>new ") << "relative to the file system's current directory";
-}
-
-// The application path is kept until the process ends: nothing else here may ask for it.
-TEST_F(LocalFileSystemOSXTest, FoldersOfUserAndApplication) {
-    const auto& mac = *static_cast<LocalFileSystemHandler*>(m_Handler);
-    const auto program = std::filesystem::read_symlink("/proc/self/exe"), bundle = program.parent_path();
-    EXPECT_EQ(mac.GetUserAppDataFolder().c_str(), m_Folder / "Library/Zarvo");
-    EXPECT_EQ(mac.GetUserAppCacheFolder().c_str(), m_Folder / "Library/Caches/com.zarvo3d.ZarvoEditor");
-    EXPECT_EQ(mac.GetSharedApplicationDataFolder(), "/Library/Application Support");
-    EXPECT_EQ(List("."), "true") << "not made";
-    EXPECT_EQ(mac.GetExecutablePath().c_str(), program);
-    gStandinFaults.emptyBundlePath = true;
-    EXPECT_EQ(mac.GetApplicationContentsPath(), "Contents");
-    gStandinFaults.emptyBundlePath = false;
-    EXPECT_EQ(mac.GetApplicationPath().c_str(), bundle) << "asked for until it is known";
-    gStandinFaults.emptyBundlePath = true;
-    EXPECT_EQ(mac.GetApplicationManagedPath().c_str(), bundle / "Contents/Managed") << "and kept";
-    EXPECT_EQ(mac.GetApplicationFolder().c_str(), bundle.parent_path());
-}
-
-TEST_F(LocalFileSystemOSXTest, TextsComeBackAsTheyWereOrEmpty) {
-    const char* const kTexts[] = {"a", "\xC3\xA9", "\xF4\x8F\xBF\xBF", "", "\x80", "\xC1\xBF", "\xED\xA0\x80"};
-    for (size_t i = 0; i < std::size(kTexts); ++i) {
-        const std::string longer = kTexts[i] + std::string("x");
-        const core::string_ref view(longer.c_str(), longer.size() - 1);
-        for (NSString* string : {MakeNSString(kTexts[i]), MakeNSString(core::string(kTexts[i])), MakeNSString(view)})
-            EXPECT_STREQ(NSString_UTF8String(string), i < 3 ? kTexts[i] : "") << i;
+TEST_F(LocalFileSystemOSXTest, CreateAsFileLeavesWhatExists) {
+    Run("printf data > file; ln -s none/x lost");
+    struct {
+        const char* name;
+        bool isCreated;
+    } const kCases[] = {{"new", true},   {"file", false},   {".", false},
+                        {"lost", false}, {"none/x", false}, {"\xFF", false}};
+    for (const auto& c : kCases) {
+        FileSystemEntry entry = Entry(c.name);
+        EXPECT_EQ(c.isCreated, mac.CreateAsFile(entry)) << c.name;
     }
-    EXPECT_EQ(MakeString(nullptr).get_memory_label(), kMemLabelPathString);
-    EXPECT_TRUE(MakeString(nullptr).empty() && MakeString(MakeNSString(static_cast<const char*>(nullptr))).empty());
+    EXPECT_EQ("", ReadFile(folder / "new"));
+    EXPECT_EQ("data", ReadFile(folder / "file"));
+}
+
+TEST_F(LocalFileSystemOSXTest, AFailedCreationIsPrintedWithItsReason) {
+    const ConsoleCapture console;
+    EXPECT_FALSE(CreateDirectory("/none/x"));
+    EXPECT_EQ("CreateDirectory '/none/x' failed: No such file or directory (current dir: " + folder.Path() + ")\n",
+              console.Text());
+}
+
+TEST_F(LocalFileSystemOSXTest, TheTrashTakesWhatThePathLeadsTo) {
+    Run("mkdir -p a b folder/sub; touch a/name b/name folder/sub/file target; ln -s target link");
+    struct {
+        const char *name, *resolved;
+    } const kCases[] = {{"a/name", "a/name"}, {"b/name", "b/name"}, {"folder", "folder"}, {"link", "target"}};
+    for (const auto& c : kCases) {
+        FileSystemEntry entry = Entry(c.name);
+        EXPECT_TRUE(mac.MoveToTrash(entry)) << c.name;
+        EXPECT_EQ(folder / c.resolved, entry.Path());
+        EXPECT_FALSE(IsThere(c.resolved));
+    }
+    Run("cd .Trash; test -e name; test -e 'name 2'; test -e target; test -e folder/sub/file");
+    EXPECT_TRUE(IsThere("link"));
+}
+
+TEST_F(LocalFileSystemOSXTest, TheTrashRefusesPathsThatCouldMislead) {
+    Run("mkdir x; touch 'x\\y' x/y; ln -s none lost; ln -s 'x\\y' way");
+    Run("mkdir p; touch p/$(printf '\\377') $(printf '\\377'); ln -s p/$(printf '\\377') out");
+    struct {
+        const char* name;
+        std::string resolved; // also on failure
+    } const kCases[] = {
+        {.name = "none", .resolved = folder / "none"},
+        {.name = "lost", .resolved = folder / "none"},
+        {.name = "way", .resolved = folder / "x\\y"},
+        {.name = "out", .resolved = folder / "p/\xFF"},
+        {.name = "\xFF", .resolved = ""},
+        {.name = "/", .resolved = "/"},
+    };
+    for (const auto& c : kCases) {
+        FileSystemEntry entry = Entry(c.name);
+        EXPECT_FALSE(mac.MoveToTrash(entry)) << c.name;
+        EXPECT_EQ(c.resolved, entry.Path()) << c.name;
+    }
+    EXPECT_FALSE(IsThere(".Trash"));
+    EXPECT_TRUE(IsThere("x/y"));
+    EXPECT_TRUE(IsThere("p/\xFF"));
+}
+
+TEST_F(LocalFileSystemOSXTest, WhatTheTrashRefusesIsDeleted) {
+    Run("mkdir b; touch b/file");
+    gStandinFaults.trashRefuses = true;
+    FileSystemEntry entry = Entry("b"), stays = Entry("/proc/version");
+    EXPECT_TRUE(mac.MoveToTrash(entry));
+    EXPECT_FALSE(IsThere("b"));
+    EXPECT_FALSE(IsThere(".Trash"));
+    EXPECT_FALSE(mac.MoveToTrash(stays)) << "nobody can delete it";
+}
+
+TEST_F(LocalFileSystemOSXTest, ACopyTakesAFolderWhole) {
+    Run("mkdir -p from/sub; cd from; printf 12345 > file; touch sub/in $(printf '\\377'); ln -s file link");
+    Run("ln -s none from/lost; ln -s from way");
+    FileSystemEntry way = Entry("way"), to = Entry("to");
+    EXPECT_TRUE(mac.Copy(way, to));
+    const std::vector<Listed> kExpected = {
+        {.path = "to/file", .size = 5},
+        {.path = "to/link", .size = 4, .flags = kLink},
+        {.path = "to/lost", .size = 4, .flags = kLink},
+        {.path = "to/sub", .flags = kFolder},
+        {.path = "to/sub/in"},
+        {.path = "to/\xFF"},
+    };
+    EXPECT_EQ(kExpected, List("to").entries);
+}
+
+TEST_F(LocalFileSystemOSXTest, ACopyReplacesNothingAndLeavesNoPart) {
+    Run("mkdir from pipes; touch from/file from/$(printf '\\377') pipes/file; printf there > there; mkfifo pipes/pipe");
+    Run("ln -s none from/lost");
+    struct {
+        const char *from, *to;
+    } const kCases[] = {
+        {"from/file", "there"}, {"there", "there"}, {"there", "from/lost"},   {"there", "none/x"},  {"none", "new"},
+        {"/", "new"},           {"pipes", "new"},   {"from", "from/sub/new"}, {"from/\xFF", "new"}, {"there", "\xFF"},
+    };
+    for (const auto& c : kCases) {
+        FileSystemEntry from = Entry(c.from), to = Entry(c.to);
+        EXPECT_FALSE(mac.Copy(from, to)) << c.from << " to " << c.to;
+        EXPECT_FALSE(IsThere("new")) << c.from << " to " << c.to;
+    }
+    EXPECT_EQ("there", ReadFile(folder / "there"));
+}
+
+TEST_F(LocalFileSystemOSXTest, ACopyIsRelativeToTheCurrentDirectory) {
+    Run("mkdir sub; printf data > sub/file");
+    WorkIn(folder.Path(), folder / "sub");
+    FileSystemEntry from("file"), to("new");
+    EXPECT_TRUE(mac.Copy(from, to));
+    EXPECT_EQ("data", ReadFile(folder / "sub/new"));
+}
+
+TEST_F(LocalFileSystemOSXTest, UserFoldersAreNotCreated) {
+    EXPECT_EQ(folder / "Library/Zarvo", mac.GetUserAppDataFolder().c_str());
+    EXPECT_EQ(folder / "Library/Caches/com.zarvo3d.ZarvoEditor", mac.GetUserAppCacheFolder().c_str());
+    EXPECT_STREQ("/Library/Application Support", mac.GetSharedApplicationDataFolder().c_str());
+    EXPECT_EQ(std::vector<Listed>(), List(".").entries);
+}
+
+// The application path is kept until the process ends: no other test may ask for it.
+TEST_F(LocalFileSystemOSXTest, TheBundleIsAskedForUntilItIsKnown) {
+    const std::filesystem::path program = std::filesystem::read_symlink("/proc/self/exe");
+    const std::filesystem::path bundle = program.parent_path();
+    EXPECT_EQ(program, mac.GetExecutablePath().c_str());
+    gStandinFaults.emptyBundlePath = true;
+    EXPECT_STREQ("Contents", mac.GetApplicationContentsPath().c_str());
+    gStandinFaults.emptyBundlePath = false;
+    EXPECT_EQ(bundle, mac.GetApplicationPath().c_str());
+    gStandinFaults.emptyBundlePath = true;
+    EXPECT_EQ(bundle / "Contents/Managed", mac.GetApplicationManagedPath().c_str()) << "from the path that was kept";
+    EXPECT_EQ(bundle.parent_path(), mac.GetApplicationFolder().c_str());
+}
+
+TEST_F(LocalFileSystemOSXTest, TextThatIsNotUtf8BecomesEmpty) {
+    struct {
+        const char *text, *converted;
+    } const kCases[] = {
+        {"a", "a"},
+        {"\xC3\xA9", "\xC3\xA9"},
+        {"\xF4\x8F\xBF\xBF", "\xF4\x8F\xBF\xBF"}, // the last code point
+        {"", ""},
+        {"\x80", ""},         // a continuation alone
+        {"\xC1\xBF", ""},     // overlong
+        {"\xED\xA0\x80", ""}, // a surrogate
+    };
+    for (const auto& c : kCases) {
+        const std::string longer = c.text + std::string("x");
+        const core::string_ref view(longer.c_str(), longer.size() - 1);
+        EXPECT_STREQ(c.converted, NSString_UTF8String(MakeNSString(c.text)));
+        EXPECT_STREQ(c.converted, NSString_UTF8String(MakeNSString(core::string(c.text))));
+        EXPECT_STREQ(c.converted, NSString_UTF8String(MakeNSString(view)));
+    }
+}
+
+TEST_F(LocalFileSystemOSXTest, NilAndNullBecomeEmpty) {
+    EXPECT_STREQ("", MakeString(nullptr).c_str());
+    EXPECT_EQ(MemLabelId(kMemLabelPathString), MakeString(nullptr).get_memory_label());
+    EXPECT_STREQ("", NSString_UTF8String(MakeNSString(static_cast<const char*>(nullptr))));
 }

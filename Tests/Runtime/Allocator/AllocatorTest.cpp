@@ -2,9 +2,11 @@
 
 #include <algorithm>
 #include <array>
+#include <csignal>
 #include <cstring>
 #include <gtest/gtest.h>
 #include <numeric>
+#include <string>
 #include <vector>
 
 // The sanitizers' allocators end the program on an impossible request unless they are told to answer null, as the
@@ -12,24 +14,53 @@
 extern "C" const char* __asan_default_options() { return "allocator_may_return_null=1"; }
 extern "C" const char* __tsan_default_options() { return "allocator_may_return_null=1"; }
 
-using Huge = std::array<char, size_t{1} << 60>; // which New clears, wherever it is
+using Huge = std::array<char, size_t{1} << 60>; // refused; New would clear it
 
-TEST(Allocator, ReallocationMovesAlignsAndKeepsWhatFitsAndARefusedOneTheOldBlock) {
-    for (const size_t align : {1u, 64u, 4096u}) {
-        const auto reallocate = [&](void* pointer, size_t size) {
-            return realloc_internal(pointer, size, align, kMemLabelGeneral, kAllocateOptionNone, "", 0);
-        };
-        void* block = memcpy(reallocate(nullptr, 5), "text", 5);
-        EXPECT_EQ(nullptr, reallocate(block, sizeof(Huge)));
-        for (const size_t size : {5000u, 3u}) {
-            const size_t old = reinterpret_cast<size_t>(block);
-            block = reallocate(block, size);
-            const size_t now = reinterpret_cast<size_t>(block);
-            EXPECT_TRUE(now != old && now % (align < 16 ? 16 : align) == 0 && memcmp(block, "tex", 3) == 0) << align;
+static void* Reallocate(void* pointer, size_t size, size_t align = 1) {
+    return realloc_internal(pointer, size, align, kMemLabelGeneral, kAllocateOptionNone, "", 0);
+}
+
+static void Free(void* pointer) { free_alloc_internal(pointer, kMemLabelGeneral, "", 0); }
+
+TEST(Allocator, BlocksAreAlignedToSixteenAtLeast) {
+    struct Case {
+        size_t asked, given;
+    };
+    constexpr Case kCases[] = {{.asked = 1, .given = 16}, {.asked = 64, .given = 64}, {.asked = 4'096, .given = 4'096}};
+    for (const Case& row : kCases) {
+        void* block = nullptr;
+        for (const size_t size : {5u, 5'000u, 3u}) {
+            block = Reallocate(block, size, row.asked);
+            EXPECT_EQ(0, reinterpret_cast<size_t>(block) % row.given) << row.asked;
         }
-        EXPECT_EQ(nullptr, reallocate(block, 0)); // the platform's answer, which frees
+        Free(block);
     }
-    EXPECT_EQ(nullptr, New<Huge>(kMemLabelGeneral));
+}
+
+TEST(Allocator, ReallocationMovesWhatFits) {
+    void* block = memcpy(Reallocate(nullptr, 5), "text", 5);
+    for (const size_t size : {5'000u, 3u}) {
+        const size_t old = reinterpret_cast<size_t>(block);
+        block = Reallocate(block, size);
+        EXPECT_NE(old, reinterpret_cast<size_t>(block)) << size;
+        EXPECT_EQ("tex", std::string(static_cast<const char*>(block), 3)) << size;
+    }
+    EXPECT_EQ(nullptr, Reallocate(block, 0)); // the platform's answer, which frees
+}
+
+TEST(Allocator, RefusedReallocationKeepsTheOldBlock) {
+    void* const block = memcpy(Reallocate(nullptr, 5), "text", 5);
+    EXPECT_EQ(nullptr, Reallocate(block, sizeof(Huge)));
+    EXPECT_STREQ("text", static_cast<const char*>(block));
+    Free(block);
+}
+
+TEST(Allocator, RefusedNewConstructsNothing) { EXPECT_EQ(nullptr, New<Huge>(kMemLabelGeneral)); }
+
+TEST(Allocator, RequiredMemoryThatIsRefusedEndsTheProcess) {
+    int number = 0;
+    EXPECT_EQ(&number, RequireMemory(&number));
+    EXPECT_EXIT(RequireMemory(New<Huge>(kMemLabelGeneral)), testing::KilledBySignal(SIGABRT), "");
 }
 
 // The address sanitizer ends the program when a block is freed by a form that is not of the set that allocated it.

@@ -12,12 +12,16 @@ struct Parts : ThreadSharedObject<Parts> {
     int parts[3] = {};
 };
 
-TEST(SharedObject, IsDestroyedOnceAndAfterAllThatItsHoldersDid) {
+TEST(SharedObject, IsDestroyedOnceAfterItsHoldersWrote) {
     for (int round = 0; round < 100; ++round) {
         ASSERT_EQ(3 * round, gSum);
         auto* const shared = New<Parts>(kMemLabelGeneral, kMemLabelGeneral);
-        shared->AddRef(), shared->AddRef();
-        const auto hold = [=](int part) { shared->parts[part] = 1, shared->Release(); };
+        shared->AddRef();
+        shared->AddRef();
+        const auto hold = [=](int part) {
+            shared->parts[part] = 1;
+            shared->Release();
+        };
         std::jthread first(hold, 0), second(hold, 1), third(hold, 2);
     }
 }

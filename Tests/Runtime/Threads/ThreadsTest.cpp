@@ -1,60 +1,118 @@
 #include "Runtime/Threads/Mutex.h"
 #include "Runtime/Threads/ReadWriteLock.h"
+#include "Runtime/Threads/SleepInterval.h"
 #include "Runtime/Threads/Thread.h"
-#include "Runtime/Threads/ThreadHelper.h"
 #include "Tests/Support/ConsoleCapture.h"
+#include "Tests/Support/MutexInspector.h"
 
 #include <gtest/gtest.h>
 #include <thread>
 
-struct MutexInspector {
-    static SInt32 Counter(const Mutex& mutex) { return mutex.m_Counter; }
-};
+// Called by their addresses: locking again what is held is what the lock is for, and what the thread-safety analysis
+// takes for a mistake.
+static constexpr auto kLock = &Mutex::Lock;
+static constexpr auto kUnlock = &Mutex::Unlock;
 
-TEST(Mutex, LastUnlockHandsTheLockToAWaiterWithoutFreeingIt) {
-    // Locking again what is held is what the lock is for, and what the thread-safety analysis takes for a mistake.
-    const auto lock = &Mutex::Lock, unlock = &Mutex::Unlock;
+TEST(Mutex, IsFreeAfterAsManyUnlocksAsLocks) {
     Mutex mutex;
-    int count = 0; // guarded by mutex
+    for (int i = 0; i < 3; ++i)
+        (mutex.*kLock)();
+    for (int i = 0; i < 3; ++i) {
+        EXPECT_EQ(0, MutexInspector::Counter(mutex));
+        EXPECT_TRUE(MutexInspector::IsLockedByCurrentThread(mutex));
+        (mutex.*kUnlock)();
+    }
+    EXPECT_EQ(1, MutexInspector::Counter(mutex));
+    EXPECT_FALSE(MutexInspector::IsLockedByCurrentThread(mutex));
+}
+
+TEST(Mutex, UnlockOfAFreeOneDoesNothing) {
+    Mutex mutex;
+    (mutex.*kUnlock)();
+    EXPECT_EQ(1, MutexInspector::Counter(mutex));
+}
+
+TEST(Mutex, LastUnlockHandsTheLockToAWaiter) {
+    Mutex mutex;
     for (int round = 0; round < 100; ++round) {
-        ASSERT_TRUE(MutexInspector::Counter(mutex) == 1 && count == 600 * round) << "round " << round;
-        (mutex.*unlock)(), (mutex.*lock)(), (mutex.*lock)(), (mutex.*lock)(); // the first, of a free one, does nothing
+        SCOPED_TRACE(testing::Message() << "round " << round);
+        (mutex.*kLock)();
+        (mutex.*kLock)();
         std::atomic<bool> mayLeave = false;
-        const auto contend = [&] {
-            for (int i = 0; i < 200; ++i) {
-                Mutex::AutoLock held(mutex);
-                while (!mayLeave)
-                    std::this_thread::yield();
-                ++count;
-            }
+        const auto hold = [&] {
+            Mutex::AutoLock held(mutex);
+            while (!mayLeave)
+                std::this_thread::yield();
         };
-        std::jthread first(contend), second(contend), third(contend);
+        std::jthread first(hold), second(hold), third(hold);
         while (MutexInspector::Counter(mutex) != -3)
             std::this_thread::yield();
-        (mutex.*unlock)(), (mutex.*unlock)();
-        EXPECT_TRUE(MutexInspector::Counter(mutex) == -3 && mutex.IsLockedByCurrentThread());
-        (mutex.*unlock)();
-        EXPECT_TRUE(MutexInspector::Counter(mutex) == -2 && !mutex.IsLockedByCurrentThread());
+        (mutex.*kUnlock)();
+        EXPECT_EQ(-3, MutexInspector::Counter(mutex));
+        EXPECT_TRUE(MutexInspector::IsLockedByCurrentThread(mutex));
+        (mutex.*kUnlock)();
+        EXPECT_EQ(-2, MutexInspector::Counter(mutex)); // never free meanwhile
+        EXPECT_FALSE(MutexInspector::IsLockedByCurrentThread(mutex));
         mayLeave = true;
     }
 }
 
-// Bits 0-20 count active readers, 21-41 waiting ones, 42-63 writers. Woken: a number of readers, or -1 for a writer.
-TEST(ReadWriteLock, EveryStateAndOperationGivesTheNextWordAndWakesWhomItMust) {
+TEST(Mutex, HoldsOneThreadAtATime) {
+    constexpr int kRounds = 20'000;
+    Mutex mutex;
+    int count = 0; // guarded by mutex
+    const auto contend = [&] {
+        for (int i = 0; i < kRounds; ++i) {
+            Mutex::AutoLock held(mutex);
+            ++count;
+        }
+    };
+    { std::jthread first(contend), second(contend), third(contend); }
+    EXPECT_EQ(3 * kRounds, count);
+    EXPECT_EQ(1, MutexInspector::Counter(mutex));
+}
+
+TEST(ReadWriteLock, EachStepGivesTheNextWord) {
     using namespace ReadWriteLockWord;
-    constexpr UInt64 most = 0x1FFFFF, q = UInt64{1} << 21, w = q << 21;
-    using Row = std::tuple<Transition (*)(UInt64), UInt64, Verdict, UInt64, SInt64>;
-    for (const auto& [step, before, verdict, after, woken] :
-         {Row(AcquireShared, 4, kGo, 5, 0), Row(AcquireShared, 1 + w, kWait, 1 + q + w, 0),
-          Row(AcquireShared, most, kFull, most, 0), Row(AcquireShared, most * q + w, kFull, most * q + w, 0),
-          Row(ReleaseShared, 2 + q + w, kGo, 1 + q + w, 0), Row(ReleaseShared, 1 + 2 * w, kGo, 2 * w, -1),
-          Row(ReleaseShared, q + w, kUnderflow, q + w, 0), Row(ReleaseExclusive, 1 + w, kUnderflow, 1 + w, 0),
-          Row(ReleaseExclusive, most * q + 2 * w, kGo, most + w, most), Row(ReleaseExclusive, 3 * w, kGo, 2 * w, -1),
-          Row(AcquireExclusive, 0, kGo, w, 0), Row(AcquireExclusive, ~(w - 1), kFull, ~(w - 1), 0),
-          Row(AcquireExclusive, 1, kWait, 1 + w, 0), Row(AcquireExclusive, w, kWait, 2 * w, 0)}) {
-        const Transition got = step(before);
-        EXPECT_TRUE(got.word == after && got.verdict == verdict) << std::hex << before;
-        EXPECT_EQ(SInt64{got.wokenReaders} - got.wokenWriters, woken) << std::hex << before;
+    constexpr UInt64 kMostReaders = 0x1FFFFF;
+    constexpr UInt64 q = UInt64{1} << 21; // one waiting reader
+    constexpr UInt64 w = UInt64{1} << 42; // one writer
+    constexpr UInt64 kAllWriters = ~(w - 1);
+    struct Case {
+        Transition (*step)(UInt64);
+        UInt64 before;
+        Verdict verdict;
+        UInt64 after;
+        UInt32 wokenReaders = 0;
+        UInt32 wokenWriters = 0;
+    };
+    constexpr Case kCases[] = {
+        {.step = AcquireShared, .before = 4, .verdict = kGo, .after = 5},
+        {.step = AcquireShared, .before = 1 + w, .verdict = kWait, .after = 1 + q + w},
+        {.step = AcquireShared, .before = kMostReaders, .verdict = kFull, .after = kMostReaders},
+        {.step = AcquireShared, .before = kMostReaders * q + w, .verdict = kFull, .after = kMostReaders * q + w},
+        {.step = ReleaseShared, .before = 2 + q + w, .verdict = kGo, .after = 1 + q + w},
+        {.step = ReleaseShared, .before = 1 + 2 * w, .verdict = kGo, .after = 2 * w, .wokenWriters = 1},
+        {.step = ReleaseShared, .before = q + w, .verdict = kUnderflow, .after = q + w},
+        {.step = AcquireExclusive, .before = 0, .verdict = kGo, .after = w},
+        {.step = AcquireExclusive, .before = 1, .verdict = kWait, .after = 1 + w},
+        {.step = AcquireExclusive, .before = w, .verdict = kWait, .after = 2 * w},
+        {.step = AcquireExclusive, .before = kAllWriters, .verdict = kFull, .after = kAllWriters},
+        {.step = ReleaseExclusive, .before = 1 + w, .verdict = kUnderflow, .after = 1 + w},
+        {.step = ReleaseExclusive, .before = 3 * w, .verdict = kGo, .after = 2 * w, .wokenWriters = 1},
+        {.step = ReleaseExclusive,
+         .before = kMostReaders * q + 2 * w,
+         .verdict = kGo,
+         .after = kMostReaders + w,
+         .wokenReaders = kMostReaders},
+    };
+    for (const Case& row : kCases) {
+        SCOPED_TRACE(testing::Message() << "row " << &row - kCases << ", word 0x" << std::hex << row.before);
+        const Transition got = row.step(row.before);
+        EXPECT_EQ(row.verdict, got.verdict);
+        EXPECT_EQ(row.after, got.word);
+        EXPECT_EQ(row.wokenReaders, got.wokenReaders);
+        EXPECT_EQ(row.wokenWriters, got.wokenWriters);
     }
 }
 
@@ -81,7 +139,9 @@ TEST(ReadWriteLock, ReadersNeverSeeAWriterHalfWay) {
     const auto use = [&] {
         for (int round = 0; round < 2'000; ++round) {
             lock.AcquireExclusive();
-            ++first, std::this_thread::yield(), ++second; // others come meanwhile, and wait
+            ++first;
+            std::this_thread::yield(); // others come now, and wait
+            ++second;
             lock.ReleaseExclusive();
             ReadWriteLock::AutoShared shared(lock);
             EXPECT_EQ(first, second);
@@ -89,10 +149,29 @@ TEST(ReadWriteLock, ReadersNeverSeeAWriterHalfWay) {
         }
     };
     { std::jthread one(use), two(use), three(use), four(use); }
-    EXPECT_EQ(first, 8'000);
+    EXPECT_EQ(8'000, first);
 }
 
-TEST(ThreadHelper, SleepIsWholeSecondsAndWholeMicroseconds) {
-    EXPECT_EQ(ThreadHelper::IntervalFromSeconds(-1.2500001).tv_nsec, 749'999'000);
+TEST(SleepInterval, IsWholeSecondsAndWholeMicroseconds) {
+    struct Case {
+        double seconds;
+        time_t wholeSeconds;
+        long nanoseconds;
+    };
+    constexpr Case kCases[] = {
+        {.seconds = 1.5, .wholeSeconds = 1, .nanoseconds = 500'000'000},
+        {.seconds = 0.0000004, .wholeSeconds = 0, .nanoseconds = 0},
+        {.seconds = -1.2500001, .wholeSeconds = -2, .nanoseconds = 749'999'000},
+        {.seconds = -3'600.0, .wholeSeconds = -3'600, .nanoseconds = 0},
+    };
+    for (const Case& row : kCases) {
+        SCOPED_TRACE(row.seconds);
+        const timespec interval = SleepIntervalFromSeconds(row.seconds);
+        EXPECT_EQ(row.wholeSeconds, interval.tv_sec);
+        EXPECT_EQ(row.nanoseconds, interval.tv_nsec);
+    }
+}
+
+TEST(CurrentThread, NegativeTimeIsNotSlept) {
     CurrentThread::SleepForSeconds(-3600.0); // an hour, were the sign lost
 }

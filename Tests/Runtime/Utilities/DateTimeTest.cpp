@@ -3,8 +3,19 @@
 #include <gtest/gtest.h>
 
 TEST(DateTime, TicksBecomeSecondsRoundedToward1970) {
-    long before = 7, after = 7;
-    ZarvoTimeToUnixTime({kUnixEpochTicks - 10'000'001}, before);
-    ZarvoTimeToUnixTime({kUnixEpochTicks + 9'999'999}, after);
-    EXPECT_TRUE(before == -1 && after == 0);
+    struct Case {
+        SInt64 ticksAfter1970;
+        long seconds;
+    };
+    constexpr Case kCases[] = {
+        {.ticksAfter1970 = -10'000'001, .seconds = -1},
+        {.ticksAfter1970 = -9'999'999, .seconds = 0},
+        {.ticksAfter1970 = 9'999'999, .seconds = 0},
+        {.ticksAfter1970 = 10'000'000, .seconds = 1},
+    };
+    for (const Case& row : kCases) {
+        long seconds = 7;
+        ZarvoTimeToUnixTime({kUnixEpochTicks + row.ticksAfter1970}, seconds);
+        EXPECT_EQ(row.seconds, seconds) << row.ticksAfter1970;
+    }
 }

@@ -1,75 +1,74 @@
 #include "Runtime/Utilities/Format.h"
 #include "Tests/Support/ConsoleCapture.h"
+#include "Tests/Support/MutexInspector.h"
 #include "Tests/Support/RefusedMemory.h"
 
 #include <algorithm>
 #include <csignal>
 #include <gtest/gtest.h>
 
-static std::string gTold; // what the hooks were told, in their order: who, type, and the text in brackets
-
-template <char who, typename Answer = bool>
-static Answer Tell(LogType type, const char* format, va_list arguments) {
-    char buffer[512];
-    vsnprintf(buffer, sizeof(buffer), format, arguments); // uses the list of arguments up
-    gTold += who + std::to_string(type) + "[" + buffer + "]";
-    return static_cast<Answer>(who == 'P' && type != kLogTypeError);
+TEST(Format, LongResultIsCut) {
+    const std::string cut(10'239, 'x');
+    EXPECT_EQ(cut, Format("%sxx", cut.c_str()).c_str());
 }
 
-// Types: 0 error, 1 assertion, 2 warning, 3 log, 4 exception; of the record, then of the console function.
-TEST(LogAssert, ModeChoosesTypeConsoleFunctionStackTraceAndPosition) {
-    constexpr StackTraceLogType none = kStackTraceNone, some = kStackTracePreprocessed, native = kStackTraceNative;
-    CleanLogEntryHandlerNode nodes[] = {{nodes + 1, nullptr}, {nodes, Tell<'c', void>}};
-    Mutex::AutoLock lock(g_LogHandlerListMutex);
-    gCleanLogEntryHandlers = nodes, gCurrentLogEntryHandler = Tell<'p'>; // which takes what would be printed
-    gPreprocessor = [](const auto&, auto* shortTrace, auto* trace, auto* file, auto* line) {
-        *shortTrace = "short", *trace = "new", *file = "m", *line += 1;
+TEST(LogAssert, MessageEndsWithOneNewlineAtLeast) {
+    struct Case {
+        const char* message;
+        const char* printed;
     };
-    using Row = std::tuple<UInt32, const char*, StackTraceLogType, const char*, const char*, const char*>;
-    for (const auto& [mode, types, table, trace, file, printed] :
-         {Row(0x0, "30", none, "", "", ""), Row(0x4, "33", none, "", "", ""), Row(0x284, "23", none, "", "", ""),
-          Row(0x1000, "20", none, "", "", ""), Row(0x82, "12", some, "", "", "new\n\n"),
-          Row(0x1000103, "01", none, "at", "f", "at\n\n"), Row(0x400001, "00", some, "\nat\n", "f", "at\n\n"),
-          Row(0x200000, "11", some, "", "", "new\n\n"), Row(0x440001, "00", some, "at", "f", ""),
-          Row(0x1040101, "00", none, "at", "f", "at\n\n"), Row(0x40001, "00", native, "at", "f", ""),
-          Row(0x800001, "00", some, "", "f", "new\n\n(Filename: m Line: 13)\n\n"), Row(0x20001, "40", none, "", "", ""),
-          Row(0x800001, "00", native, "", "f", "Stacktrace is not supported on this platform.\n\n"),
-          Row(0xC00001, "00", some, "at", "f", "at\n\n(Filename: f Line: 12)\n\n"),
-          Row(0xC00001, "00", some, "", "f", ""), Row(0xC00001, "00", some, "at", "Debug.bindings", "at\n\n")}) {
-        std::fill_n(gStackTraceLogType, kLogTypeCount, table);
-        const auto stage = (mode & 0x1000000) != 0 ? DebugStringToFilePostprocessedStacktrace : DebugStringToFile;
-        gTold.clear(), stage({"text", "", "", trace, file, 12, -1, mode});
-        const char* const clean = *types == '1' ? "Assertion failed: text\nshort" : "text";
-        EXPECT_EQ(gTold, Format("c%c[%s\n\n]p%c[text\n%s]", types[0], clean, types[1], printed).c_str()) << mode;
+    constexpr Case kCases[] = {
+        {.message = "", .printed = "\n"},
+        {.message = "text", .printed = "text\n"},
+        {.message = "text\n\n", .printed = "text\n\n"},
+        {.message = "100% %n, and long enough for the heap", .printed = "100% %n, and long enough for the heap\n"},
+    };
+    for (const Case& row : kCases) {
+        const ConsoleCapture console;
+        ReportError(row.message);
+        EXPECT_EQ(row.printed, console.Text());
     }
-    gCleanLogEntryHandlers = nullptr, gCurrentLogEntryHandler = nullptr, gPreprocessor = nullptr;
-    std::fill_n(gStackTraceLogType, kLogTypeCount, some);
 }
 
-TEST(LogAssert, TextsArePrintedWithOneAddedNewlineAtMostAndShortFormsFillTheRecord) {
+TEST(LogAssert, ConsolePrintAddsNothing) {
     const ConsoleCapture console;
-    gTold.clear(), gCurrentLogEntryHandler = Tell<'P'>;
-    gUtpLogFunc = [](const auto& it) {
-        gTold += Format("%s:%d:%d %u %d ", it.file, it.line, it.column, it.mode, it.identifier).c_str();
-    };
-    for (const char* const message : {"", "text\n\n", "100% %n, and long enough for the heap"})
-        AssertImplementation(7, "file", 12, -1, message);
-    ReportError("two", {"a", 13}), Check(false, "three", {"b", 14}), Check(true, "four"), printf_console("%d", 5);
-    gCurrentLogEntryHandler = nullptr, gUtpLogFunc = nullptr;
-    EXPECT_EQ(Format("%s", std::string(10'240, 'x').c_str()), std::string(10'239, 'x').c_str()); // cut
-    EXPECT_EQ(console.Text(), "\ntext\n\n100% %n, and long enough for the heap\nthree\n5");
-    EXPECT_EQ(gTold, "P1[\n]file:12:-1 2 7 P1[text\n\n]file:12:-1 2 7 P1[100% %n, and long enough for the heap\n]"
-                     "file:12:-1 2 7 P0[two\n]a:13:-1 1 0 P1[three\n]b:14:-1 2 0 P5[5]");
+    printf_console("%d", 5);
+    EXPECT_EQ("5", console.Text());
 }
+
+TEST(LogAssert, HandlerDecidesWhatIsPrinted) {
+    const ConsoleCapture console;
+    gCurrentLogEntryHandler = [](LogType type, const char*, va_list) { return type == kLogTypeAssert; };
+    ReportError("error");
+    ReportFailedCheck("check");
+    printf_console("print");
+    gCurrentLogEntryHandler = nullptr;
+    EXPECT_EQ("check\n", console.Text());
+}
+
+// What a report says of itself.
+struct Record {
+    std::string message;
+    std::string file;
+    int line;
+    int column = -1;
+    UInt32 mode;
+    int identifier = 0;
+
+    friend bool operator==(const Record&, const Record&) = default;
+    friend void PrintTo(const Record& it, std::ostream* out) {
+        *out << it.file << ':' << it.line << ':' << it.column << ": " << it.message << ", mode " << it.mode
+             << ", identifier " << it.identifier;
+    }
+};
 
 // What the hooks were told of the last record. Nothing is printed: the handler of console prints takes it all.
 struct Told {
     LogType type, console;      // given to the clean log handlers, and to the handler of console prints
     std::string clean, printed; // the texts that these two got
-    std::string file;           // of the record that is forwarded
-    int line, column;
-    std::string order; // clean log handlers (c, d), console (p), and the two forward functions (f, g)
-    bool isListLocked; // by this thread, when a clean log handler was called
+    Record record;              // that is forwarded
+    std::string order;          // clean log handlers (c, d), console (p), and the two forward functions (f, g)
+    bool isListLocked;          // by this thread, when a clean log handler was called
 };
 
 class LogHooks : public testing::Test {
@@ -85,9 +84,12 @@ protected:
             return false;
         };
         gLogToConsoleFunc = [](const DebugStringToFileData& data) {
-            s_Told.file = data.file;
-            s_Told.line = data.line;
-            s_Told.column = data.column;
+            s_Told.record = {.message = data.message,
+                             .file = data.file,
+                             .line = data.line,
+                             .column = data.column,
+                             .mode = data.mode,
+                             .identifier = data.identifier};
             s_Told.order += 'f';
         };
         gUtpLogFunc = [](const DebugStringToFileData&) { s_Told.order += 'g'; };
@@ -117,7 +119,7 @@ private:
         s_Told.type = type;
         s_Told.clean = Print(format, arguments);
         s_Told.order += 'c';
-        s_Told.isListLocked = g_LogHandlerListMutex.IsLockedByCurrentThread();
+        s_Told.isListLocked = MutexInspector::IsLockedByCurrentThread(g_LogHandlerListMutex);
     }
     static void TellSecond(LogType, const char*, va_list) { s_Told.order += 'd'; }
 
@@ -151,6 +153,25 @@ TEST_F(LogHooks, EachModeBitChoosesTypeAndConsole) {
     for (const Case& row : kCases) {
         SCOPED_TRACE(testing::Message() << "mode 0x" << std::hex << row.bit);
         DebugStringToFile({.mode = row.bit});
+        EXPECT_EQ(row.type, s_Told.type);
+        EXPECT_EQ(row.console, s_Told.console);
+    }
+}
+
+TEST_F(LogHooks, FirstMatchOfSeveralBitsChoosesTypeAndConsole) {
+    struct Case {
+        UInt32 mode;
+        LogType type, console;
+    };
+    constexpr Case kCases[] = {
+        {.mode = 0x3, .type = kLogTypeError, .console = kLogTypeAssert},
+        {.mode = 0x82, .type = kLogTypeAssert, .console = kLogTypeWarning},
+        {.mode = 0x284, .type = kLogTypeWarning, .console = kLogTypeLog},
+        {.mode = 0x20003, .type = kLogTypeException, .console = kLogTypeAssert},
+    };
+    for (const Case& row : kCases) {
+        SCOPED_TRACE(testing::Message() << "mode 0x" << std::hex << row.mode);
+        DebugStringToFile({.mode = row.mode});
         EXPECT_EQ(row.type, s_Told.type);
         EXPECT_EQ(row.console, s_Told.console);
     }
@@ -196,21 +217,69 @@ TEST_F(LogHooks, TableAndModeChooseTheTraces) {
 TEST_F(LogHooks, NativeTraceDropsThePositionThatIsAskedFor) {
     std::fill_n(gStackTraceLogType, kLogTypeCount, kStackTraceNative);
     DebugStringToFile({.message = "text", .file = "file", .line = 12, .mode = kLogModeError});
-    EXPECT_EQ("file", s_Told.file);
-    EXPECT_EQ(12, s_Told.line);
+    EXPECT_EQ("file", s_Told.record.file);
+    EXPECT_EQ(12, s_Told.record.line);
 
     DebugStringToFile(
         {.message = "text", .file = "file", .line = 12, .mode = kLogModeError | kLogModeShowSourcePosition});
-    EXPECT_EQ("", s_Told.file);
-    EXPECT_EQ(0, s_Told.line);
+    EXPECT_EQ("", s_Told.record.file);
+    EXPECT_EQ(0, s_Told.record.line);
 }
 
-TEST_F(LogHooks, PositionIsPrintedOnlyWithALine) {
-    constexpr UInt32 kMode = kLogModeError | kLogModeKeepStackTrace | kLogModeShowSourcePosition;
-    DebugStringToFile({.message = "text", .stackTrace = "at", .file = "file", .line = 12, .mode = kMode});
-    EXPECT_EQ("text\nat\n\n(Filename: file Line: 12)\n\n", s_Told.printed);
+TEST_F(LogHooks, NativeTraceIsATextThatSaysSo) {
+    std::fill_n(gStackTraceLogType, kLogTypeCount, kStackTraceNative);
+    DebugStringToFile({.message = "text", .mode = kLogModeAssert});
+    EXPECT_EQ("Assertion failed: text\nStacktrace is not supported on this platform.\n\n", s_Told.clean);
+    EXPECT_EQ("text\nStacktrace is not supported on this platform.\n\n", s_Told.printed);
+}
 
-    DebugStringToFile({.message = "text", .stackTrace = "at", .file = "file", .line = 0, .mode = kMode});
+TEST_F(LogHooks, TraceIsPrintedAsAParagraph) {
+    for (const char* const trace : {"at", "\nat", "at\n", "\nat\n"}) {
+        DebugStringToFile({.message = "text", .stackTrace = trace, .mode = kLogModeError | kLogModeKeepStackTrace});
+        EXPECT_EQ("text\nat\n\n", s_Told.printed) << trace;
+    }
+}
+
+TEST_F(LogHooks, PositionIsPrintedAfterATrace) {
+    struct Case {
+        const char* trace;
+        const char* file;
+        SInt32 line;
+        const char* printed;
+    };
+    constexpr Case kCases[] = {
+        {.trace = "at", .file = "file", .line = 12, .printed = "text\nat\n\n(Filename: file Line: 12)\n\n"},
+        {.trace = "at", .file = "file", .line = 0, .printed = "text\nat\n\n"},
+        {.trace = "at", .file = "", .line = 12, .printed = "text\nat\n\n"},
+        {.trace = "at", .file = "in Debug.bindings", .line = 12, .printed = "text\nat\n\n"},
+        {.trace = "", .file = "file", .line = 12, .printed = "text\n"},
+    };
+    for (const Case& row : kCases) {
+        DebugStringToFile({.message = "text",
+                           .stackTrace = row.trace,
+                           .file = row.file,
+                           .line = row.line,
+                           .mode = kLogModeError | kLogModeKeepStackTrace | kLogModeShowSourcePosition});
+        EXPECT_EQ(row.printed, s_Told.printed) << row.file << ", line " << row.line;
+    }
+}
+
+TEST_F(LogHooks, PreprocessorMayReplaceThePosition) {
+    gPreprocessor = [](const DebugStringToFileData&, core::string*, core::string* trace, core::string* file,
+                       SInt32* line) {
+        *trace = "at";
+        *file = "made";
+        *line += 1;
+    };
+    DebugStringToFile(
+        {.message = "text", .file = "file", .line = 12, .mode = kLogModeError | kLogModeShowSourcePosition});
+    EXPECT_EQ("text\nat\n\n(Filename: made Line: 13)\n\n", s_Told.printed);
+}
+
+TEST_F(LogHooks, SecondStageTakesTheTracesAsTheyAre) {
+    DebugStringToFilePostprocessedStacktrace(
+        {.message = "text", .shortStackTrace = "short", .stackTrace = "at", .mode = kLogModeAssert});
+    EXPECT_EQ("Assertion failed: text\nshort\n\n", s_Told.clean);
     EXPECT_EQ("text\nat\n\n", s_Told.printed);
 }
 
@@ -219,16 +288,29 @@ TEST_F(LogHooks, AreToldInTheirOrder) {
     EXPECT_EQ("cdpfg", s_Told.order);
 }
 
-TEST_F(LogHooks, CleanHandlersAreCalledUnderTheListsLock) {
-    EXPECT_FALSE(g_LogHandlerListMutex.IsLockedByCurrentThread());
+TEST_F(LogHooks, CleanHandlersAreCalledUnderTheLock) {
+    EXPECT_FALSE(MutexInspector::IsLockedByCurrentThread(g_LogHandlerListMutex));
     ReportError("text");
     EXPECT_TRUE(s_Told.isListLocked);
-    EXPECT_FALSE(g_LogHandlerListMutex.IsLockedByCurrentThread());
+    EXPECT_FALSE(MutexInspector::IsLockedByCurrentThread(g_LogHandlerListMutex));
 }
 
-TEST_F(LogHooks, AssertionCarriesItsColumn) {
-    AssertImplementation(0, "file", 12, 34, "text");
-    EXPECT_EQ(34, s_Told.column);
+TEST_F(LogHooks, AssertionFillsTheRecord) {
+    EXPECT_EQ(1, AssertImplementation(7, "file", 12, 34, "text"));
+    EXPECT_EQ((Record{.message = "text", .file = "file", .line = 12, .column = 34, .mode = 2, .identifier = 7}),
+              s_Told.record);
+}
+
+TEST_F(LogHooks, ErrorFillsTheRecord) {
+    ReportError("text", {"file", 12});
+    EXPECT_EQ((Record{.message = "text", .file = "file", .line = 12, .mode = 1}), s_Told.record);
+}
+
+TEST_F(LogHooks, OnlyAFailedCheckIsReported) {
+    EXPECT_TRUE(Check(true, "text"));
+    EXPECT_EQ("", s_Told.order);
+    EXPECT_FALSE(Check(false, "text", {"file", 12}));
+    EXPECT_EQ((Record{.message = "text", .file = "file", .line = 12, .mode = 2}), s_Told.record);
 }
 
 TEST_F(LogHooks, FatalErrorEndsTheProcessAfterItsOutput) {

@@ -1,8 +1,10 @@
-// What the tests of the command share: a line of words becomes an archive in a folder, the command runs there, and
-// everything that it says, its status and the whole folder are compared with what other words describe.
+// What the tests of the command share. A line of words becomes an archive in a folder, and the command runs there. Its
+// status, everything that it prints and the whole folder are compared with what other words describe.
 //
-//   Expect({"web levels=2 a/b:c70000"});             // everything comes out
-//   Expect({"node[0].offset=9 a:", "data:a", "a:"}); // a can't be decompressed, and is left empty
+//   Expect({.archive = "web levels=2 a/b:c70000"});   // everything is extracted
+//   Expect({.archive = "node[0].offset=9 a:c10",      // "a" can't be decompressed, and stays empty
+//           .messages = "data:a",
+//           .output = "a:"});
 #pragma once
 
 #include "Tests/Support/RunVarnex.h"
@@ -16,7 +18,7 @@
 
 namespace fs = std::filesystem;
 
-// What the command says, by word. A word with a path, "file:a", stands for the text and the path.
+// What the command prints, by word. A word with a path, "file:a", stands for the text and the path.
 inline const std::map<std::string, std::string> kMessages = {
     {"ok", "All ok!"},
     {"unread", "ERROR: can't read or not a zarvo web file"},
@@ -37,7 +39,8 @@ inline const std::map<std::string, std::string> kMessages = {
     {"toowide", "Value cannot be stored by type cast target: exceeds maximum representable value. "
                 "Result will be truncated."}};
 
-// The system's refusal to make a folder, "refused:/a", has its reason with the macOS back end only.
+// The text for words, up to a ";". "refused:/a" is the system's refusal to make a folder: only the macOS back end gives
+// a reason.
 inline std::string Say(const std::string& words, const std::string& folder = "") {
     const bool hasReason = std::string(VARNEX_BINARY).ends_with("OSXBackEnd");
     std::istringstream stream(words);
@@ -52,8 +55,9 @@ inline std::string Say(const std::string& words, const std::string& folder = "")
     return text;
 }
 
-// "c70000", "r70000", "z70000": so many bytes that become half as many when they are compressed, as many, or hardly
-// any; "r70000@5000@10" is a part of them, and fewer are always their start. Other words stand for themselves.
+// "c70000" is 70,000 bytes that compress to half their size, "r70000" bytes that don't compress, "z70000" bytes that
+// compress to almost nothing. A smaller number gives the start of the same bytes. "r70000@5000@10" is 10 of them, from
+// 5,000 on. Other words stand for themselves.
 inline std::string Bytes(const std::string& word) {
     char kind;
     size_t size, from = 0, count = std::string::npos;
@@ -65,7 +69,8 @@ inline std::string Bytes(const std::string& word) {
     return bytes.substr(from, count);
 }
 
-// The files ("a/b:c70000", with bytes behind the colon) and folders ("a|") among words. A file "?" is not listed.
+// The files ("a/b:c70000", with the bytes after the colon) and folders ("a|") among words. The file "?" is not listed
+// in the directory.
 inline std::vector<ArchiveEntry> Entries(const std::string& words) {
     std::vector<ArchiveEntry> entries;
     std::istringstream stream(words);
@@ -78,9 +83,9 @@ inline std::vector<ArchiveEntry> Entries(const std::string& words) {
     return entries;
 }
 
-// An archive in words: entries, the layout ("web6" is the block-based one under the older signature), the kind of its
-// blocks, "section" for a section of that kind, and name=value: version, chunk, levels, or the number of a stored
-// field.
+// An archive in words: its entries, its layout ("web6" is the block-based one under the older signature), the kind of
+// its blocks, "section" when the section is of that kind too, an option, and name=value: version, chunk, levels, or the
+// value of a stored field.
 inline ArchiveDescription Archive(const std::string& words, ArchiveDescription archive = {}) {
     const std::string layouts[] = {"fs", "web6", "web", "raw", "old"}, kinds[] = {"stored", "lzma", "lz4", "lz4hc"};
     const std::string options[] = {"streamed", "endmark", "end", "padded"};
@@ -102,18 +107,19 @@ inline ArchiveDescription Archive(const std::string& words, ArchiveDescription a
         if (name == "levels") archive.levelCount = static_cast<UInt32>(value);
         if (name == "chunk") archive.chunkSize = value;
         const bool isOption = option != std::end(options) || word == "section" || name != word;
-        EXPECT_TRUE(isLayout || isKind || isOption) << word;
+        if (!isLayout && !isKind && !isOption) ADD_FAILURE() << "no such word: " << word;
         if (name != word && name != "version" && name != "levels" && name != "chunk") archive.fields[name] = value;
     }
     return archive;
 }
 
-// Paths below a folder and what each one is: a file's bytes (of a long one their number and a hash), a link's target,
-// or kFolder for a folder that holds nothing.
+// Maps each path below a folder to what it is: a file's bytes (or Brief of them), a link's target, or kFolder for an
+// empty folder. Other folders are not listed.
 using FolderTree = std::map<std::string, std::string>;
 
 inline const std::string kFolder = "<folder>";
 
+// The bytes, or their number and a hash when there are many.
 inline std::string Brief(const std::string& bytes) {
     if (bytes.size() < 100) return bytes;
     return std::to_string(bytes.size()) + " bytes, " + std::to_string(std::hash<std::string>()(bytes));
@@ -130,7 +136,8 @@ inline FolderTree ReadFolderTree(const std::string& folder) {
     return tree;
 }
 
-// What entries make of a folder, and of the folder itself when their path is empty or there are none.
+// The tree of an output folder that holds the entries. An empty path stands for the folder itself, which is listed too
+// when there are no entries.
 inline FolderTree Output(const std::vector<ArchiveEntry>& entries, const std::string& folder = "a.zarvo_data") {
     FolderTree tree;
     for (const auto& [path, bytes, flags, sourceFile, isListed] : entries)
@@ -139,16 +146,16 @@ inline FolderTree Output(const std::vector<ArchiveEntry>& entries, const std::st
 }
 
 struct Case {
-    std::string archive;          // as Archive takes it
-    std::string messages = "ok";  // as Say takes it; first what comes before the report on the header, and ";"
-    std::string output = "all";   // as Entries takes it; or all entries, or "none": no folder
-    ArchiveDescription form = {}; // what words can't say of the archive
-    std::string folder = {};      // else an empty one
+    std::string archive = {};     // words for Archive
+    std::string messages = "ok";  // words for Say; those before a ";" are printed before the header
+    std::string output = "all";   // words for Entries, "all" entries of the archive, or "none": no output folder
+    ArchiveDescription form = {}; // what words can't say about the archive
+    std::string folder = {};      // to run in; a fresh one by default
     std::string path = "a.zarvo";
-    std::function<bool()> prepare = {}; // as RunProgram takes it
-    bool isHeard = true;
+    std::function<bool()> prepare = {}; // see RunProgram
+    bool isHeard = true;                // false: nobody reads the standard output
     std::string program = VARNEX_BINARY;
-    std::function<void(std::string& bytes)> change = {}; // of the archive
+    std::function<void(std::string& bytes)> change = {}; // damages the archive
 };
 
 inline void Expect(const Case& run) {
@@ -158,9 +165,11 @@ inline void Expect(const Case& run) {
     const TemporaryFolder empty;
     const std::string folder = run.folder.empty() ? empty.Path() : run.folder;
 
-    const size_t layout = static_cast<size_t>(archive.layout); // from the third on old ones, the last without a size
+    const size_t layout = static_cast<size_t>(archive.layout);
     const UInt32 version = archive.version.value_or(std::array{7u, 6u, 3u, 3u, 5u}[layout]);
-    const size_t size = layout < 2 || (layout < 4 && version > 1) ? bytes.size() : 0;
+    const bool isLegacy = archive.layout == ArchiveLayout::kWeb || archive.layout == ArchiveLayout::kRaw;
+    const bool hasSize = isLegacy ? version > 1 : archive.layout != ArchiveLayout::kArchive;
+    const size_t size = hasSize ? bytes.size() : 0;
     const bool isRead = !run.messages.ends_with("unread"), isListed = isRead && !run.messages.ends_with("nodirectory");
     const size_t early = run.messages.find(';') + 1;
     std::ostringstream said;

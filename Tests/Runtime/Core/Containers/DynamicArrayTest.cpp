@@ -7,36 +7,112 @@
 #include <random>
 #include <vector>
 
+namespace {
+
 using Strings = dynamic_array<core::string>;
 constexpr const char* kLong = "a text that does not fit into the string itself";
 
-// Whether an array stands so: size, capacity, and whether it owns its buffer.
-static bool Is(const auto& array, size_t size, size_t capacity, bool isOwner) {
-    return array.size() == size && array.capacity() == capacity && array.owns_data() == isOwner;
+// What an array says of its buffer.
+struct Shape {
+    size_t size;
+    size_t capacity;
+    bool isOwner;
+
+    friend bool operator==(const Shape&, const Shape&) = default;
+    friend void PrintTo(const Shape& shape, std::ostream* out) {
+        *out << "size " << shape.size << ", capacity " << shape.capacity << (shape.isOwner ? ", owned" : ", not owned");
+    }
+};
+
+Shape ShapeOf(const auto& array) {
+    return {.size = array.size(), .capacity = array.capacity(), .isOwner = array.owns_data()};
 }
 
-TEST(DynamicArray, ForeignMemoryIsUsedInPlaceThenCopiedByThePolicyAndLeftAlone) {
-    for (const auto& [policy, capacity] : {std::pair(kResizeDouble, 10u), {kResizeExact, 6u}}) {
+std::vector<std::string> TextsOf(const Strings& strings) {
+    std::vector<std::string> texts;
+    for (const core::string& text : strings)
+        texts.push_back(text.c_str());
+    return texts;
+}
+
+constexpr Shape kWithoutBuffer = {.size = 0, .capacity = 0, .isOwner = false};
+
+} // namespace
+
+TEST(DynamicArray, MovedForeignMemoryIsUsedInPlace) {
+    UInt16 foreign[] = {1, 2, 3, 4, 5};
+    dynamic_array<UInt16> array(kMemLabelFileSystem);
+    ASSERT_TRUE(array.resize_initialized(7)); // a buffer that is freed
+    auto source = dynamic_array<UInt16>::wrap(foreign, 5, 9, kMemLabelGeneral);
+    array = std::move(source);
+    EXPECT_EQ(foreign, array.data());
+    EXPECT_EQ((Shape{.size = 5, .capacity = 5, .isOwner = false}), ShapeOf(array));
+    EXPECT_EQ(kMemLabelFileSystem, array.get_memory_label().identifier);
+    EXPECT_EQ(kWithoutBuffer, ShapeOf(source));
+}
+
+TEST(DynamicArray, FirstGrowthCopiesForeignMemory) {
+    struct Case {
+        ResizePolicy policy;
+        size_t capacity;
+    };
+    for (const Case& row :
+         {Case{.policy = kResizeDouble, .capacity = 10}, Case{.policy = kResizeExact, .capacity = 6}}) {
         UInt16 foreign[] = {1, 2, 3, 4, 5};
-        dynamic_array<UInt16> array(kMemLabelFileSystem);
-        array.resize_initialized(7);
-        array = dynamic_array<UInt16>::wrap(foreign, 5, 9, kMemLabelGeneral);
-        EXPECT_TRUE(array.data() == foreign && Is(array, 5, 5, false));
-        array.resize_buffer_nocheck(6, policy);
-        EXPECT_TRUE(Is(array, 5, capacity, true) && array.get_memory_label() == kMemLabelFileSystem);
+        auto array = dynamic_array<UInt16>::wrap(foreign, 5, 5, kMemLabelGeneral);
+        ASSERT_TRUE(array.resize_buffer_nocheck(6, row.policy));
+        EXPECT_EQ((Shape{.size = 5, .capacity = row.capacity, .isOwner = true}), ShapeOf(array));
+        EXPECT_EQ((std::vector<UInt16>{1, 2, 3, 4, 5}), std::vector<UInt16>(array.begin(), array.end()));
         array[0] = 0;
-        EXPECT_TRUE(foreign[0] == 1 && memcmp(&array[1], foreign + 1, sizeof(foreign) - 2) == 0);
+        EXPECT_EQ(1, foreign[0]);
     }
 }
 
-TEST(DynamicArray, ImpossibleSizesAreReportedAndRefused) {
+TEST(DynamicArray, DoublingGivesTheRequestWhenThatIsMore) {
+    dynamic_array<UInt8> array(kMemLabelGeneral);
+    ASSERT_TRUE(array.resize_uninitialized(5));
+    ASSERT_TRUE(array.resize_buffer_nocheck(11, kResizeDouble));
+    EXPECT_EQ(11, array.capacity());
+}
+
+TEST(DynamicArray, RefusedSizeChangesNothing) {
     const ConsoleCapture console;
     dynamic_array<UInt64> numbers(kMemLabelGeneral);
     numbers.push_back(1);
-    for (const size_t size : {size_t{1} << 61, size_t{1} << 63}) // 2^61 numbers are 2^64 bytes, which wrap to 0
-        EXPECT_FALSE(numbers.resize_initialized(size, kResizeExact) || numbers.resize_uninitialized(size_t{1} << 62));
-    EXPECT_TRUE(Is(numbers, 1, 1, true) && numbers[0] == 1 && numbers.resize_uninitialized(2)); // which can be served
-    EXPECT_EQ(console.Text(), "Dynamic array capacity overflow: 0x8000000000000000\n");
+    // 2^61 numbers are 2^64 bytes, which wrap to 0.
+    for (const size_t size : {size_t{1} << 61, size_t{1} << 62, size_t{1} << 63}) {
+        SCOPED_TRACE(size);
+        EXPECT_FALSE(numbers.resize_initialized(size, kResizeExact));
+        EXPECT_FALSE(numbers.resize_uninitialized(size, kResizeExact));
+        EXPECT_FALSE(numbers.reserve(size));
+        EXPECT_EQ((Shape{.size = 1, .capacity = 1, .isOwner = true}), ShapeOf(numbers));
+        EXPECT_EQ(1, numbers[0]);
+    }
+    EXPECT_TRUE(numbers.resize_uninitialized(2));
+}
+
+TEST(DynamicArray, CapacityBeyondSignedCountsIsReported) {
+    const ConsoleCapture console;
+    dynamic_array<UInt64> numbers(kMemLabelGeneral);
+    numbers.push_back(1);
+    EXPECT_FALSE(numbers.reserve((size_t{1} << 63) - 1));
+    EXPECT_EQ("", console.Text());
+    EXPECT_FALSE(numbers.reserve(size_t{1} << 63));
+    EXPECT_EQ("Dynamic array capacity overflow: 0x8000000000000000\n", console.Text());
+}
+
+TEST(DynamicArray, RefusedCopyEndsTheProcess) {
+    constexpr size_t kRefused = size_t{1} << 60;
+    UInt8 byte = 0;
+    const auto array = dynamic_array<UInt8>::wrap(&byte, kRefused, kRefused, kMemLabelGeneral);
+    EXPECT_EXIT(dynamic_array<UInt8>{array}, testing::KilledBySignal(SIGABRT), "");
+}
+
+TEST(DynamicArray, RefusedElementEndsTheProcess) {
+    constexpr size_t kRefused = size_t{1} << 60;
+    UInt8 byte = 0;
+    auto array = dynamic_array<UInt8>::wrap(&byte, kRefused, kRefused, kMemLabelGeneral);
+    EXPECT_EXIT(array.push_back(1), testing::KilledBySignal(SIGABRT), "");
 }
 
 TEST(DynamicArray, BehavesAsItsTwinUnderRandomEdits) {
@@ -44,22 +120,56 @@ TEST(DynamicArray, BehavesAsItsTwinUnderRandomEdits) {
         std::mt19937 random(seed);
         Strings ours(kMemLabelFileSystem);
         std::vector<std::string> twin;
+        size_t capacity = 0; // that the growth rules give
         for (int step = 0; step < 100; ++step) {
-            const size_t count = random() % 20, edit = random() % (twin.empty() ? 5 : 7);
-            size_t capacity = ours.capacity();
+            const size_t count = random() % 20;
+            const std::string text(kLong + 2 * count);
+            const size_t edit = random() % (twin.empty() ? 6 : 9);
+            SCOPED_TRACE(testing::Message() << "seed " << seed << ", step " << step << ", edit " << edit);
             switch (edit) {
-            case 0: ours.resize_initialized(count), twin.resize(count); break;
-            case 1: ours.reserve(count), capacity = std::max(capacity, count); break;
-            case 2: ours = Strings(static_cast<Strings&&>(Strings(ours))), capacity = twin.size(); break;
-            case 3: ours.emplace_back(kLong + 2 * count), twin.emplace_back(kLong + 2 * count); break;
-            case 4: count < 2 ? (ours.clear(), twin.clear()) : void(ours = static_cast<Strings&&>(ours)); break;
-            case 5: ours.pop_back(), twin.pop_back(); break;
-            default: ours.push_back(ours.back()), twin.push_back(std::string(twin.back())); break;
+            case 0:
+                ASSERT_TRUE(ours.resize_initialized(count));
+                twin.resize(count);
+                break;
+            case 1:
+                ASSERT_TRUE(ours.reserve(count));
+                capacity = std::max(capacity, count);
+                break;
+            case 2: {
+                Strings copy(ours);
+                Strings moved(std::move(copy));
+                ours = std::move(moved);
+                capacity = twin.size();
+                break;
+            }
+            case 3:
+                ours.emplace_back(text.c_str());
+                twin.push_back(text);
+                break;
+            case 4: ours = static_cast<Strings&&>(ours); break;
+            case 5:
+                if (count >= 2) break; // not too often
+                ours.clear();
+                twin.clear();
+                break;
+            case 6:
+                ours.pop_back();
+                twin.pop_back();
+                break;
+            case 7:
+                ours.push_back(ours.back());
+                twin.push_back(std::string(twin.back()));
+                break;
+            default:
+                ours.truncate(twin.size() / 2);
+                twin.resize(twin.size() / 2);
+                break;
             }
             if (twin.size() > capacity) capacity = std::max(twin.size(), 2 * capacity);
-            ASSERT_TRUE(Is(ours, twin.size(), capacity, capacity != 0)) << seed << ", " << edit;
-            for (size_t i = 0; i < twin.size(); ++i)
-                ASSERT_TRUE(ours[i] == twin[i].c_str() && ours[i].get_memory_label() == kMemLabelFileSystem) << seed;
+            ASSERT_EQ((Shape{.size = twin.size(), .capacity = capacity, .isOwner = capacity != 0}), ShapeOf(ours));
+            ASSERT_EQ(twin, TextsOf(ours));
+            for (const core::string& element : ours)
+                ASSERT_EQ(kMemLabelFileSystem, element.get_memory_label().identifier);
         }
     }
 }
@@ -82,7 +192,7 @@ TEST(DynamicArray, ElementsAreDestroyedInTheirOrder) {
         dynamic_array<Element> array(kMemLabelGeneral);
         for (const char name : {'a', 'b', 'c', 'd', 'e'})
             array.emplace_back(name);
-        array.resize_initialized(3);
+        array.truncate(3);
         EXPECT_EQ("de", destroyed);
         destroyed.clear();
     }
@@ -112,21 +222,28 @@ TEST(DynamicArray, TakingOverTheLargestForeignSizeIsReported) {
 TEST(DynamicArray, ForeignMemoryResizedToNothingIsLetGo) {
     UInt8 byte = 0;
     auto array = dynamic_array<UInt8>::wrap(&byte, 0, 1, kMemLabelGeneral);
-    array.resize_buffer_nocheck(0, kResizeExact);
-    EXPECT_TRUE(array.owns_data());
-    EXPECT_EQ(0, array.capacity());
+    ASSERT_TRUE(array.resize_buffer_nocheck(0, kResizeExact));
+    EXPECT_EQ((Shape{.size = 0, .capacity = 0, .isOwner = true}), ShapeOf(array));
     EXPECT_EQ(nullptr, array.data());
 }
 
 TEST(DynamicBlockArray, ElementsStayWhereTheyWerePlaced) {
     dynamic_block_array<core::string, 32> texts(kMemLabelFileList);
-    core::string* places[65];
-    for (core::string*& place : places)
-        place = &(texts.emplace_back() = kLong); // the leak checker sees one that stays
-    texts.grow(100);                             // a fourth block, which holds no element yet
+    const core::string* places[65];
+    for (const core::string*& place : places) {
+        core::string& element = texts.emplace_back();
+        element = kLong; // the leak checker sees one that is not destroyed
+        place = &element;
+    }
+    texts.grow(100); // a fourth block, which holds no element yet
+    EXPECT_EQ(65, texts.size());
     for (size_t i = 0; i < 65; ++i)
-        EXPECT_TRUE(texts.size() == 65 && places[i] == &texts[i]) << i;
-    EXPECT_EQ(texts[64].get_memory_label(), MemLabelId(kMemLabelFileList));
+        EXPECT_EQ(places[i], &texts[i]) << i;
+}
+
+TEST(DynamicBlockArray, ElementsGetTheLabelOfTheArray) {
+    dynamic_block_array<core::string, 32> texts(kMemLabelFileList);
+    EXPECT_EQ(kMemLabelFileList, texts.emplace_back().get_memory_label().identifier);
 }
 
 TEST(DynamicBlockArray, RefusedBlockEndsTheProcess) {

@@ -3,30 +3,62 @@
 #include <gtest/gtest.h>
 #include <vector>
 
-TEST(StringRef, BehavesAsItsTwinOnEveryShortText) {
+// All texts of up to 3 characters, of which one is a NUL and one is negative where char is signed.
+static std::vector<std::string> MakeShortTexts() {
     std::vector<std::string> texts{""};
-    for (size_t i = 0; texts.size() < 156; ++i) // all of up to 3 characters
+    for (size_t i = 0; texts.size() < 156; ++i)
         for (const char character : {'\0', 'a', 'b', 'c', '\xC4'})
             texts.push_back(texts[i] + character);
+    return texts;
+}
+
+static int Sign(int difference) { return (difference > 0) - (difference < 0); }
+
+TEST(StringRef, BehavesAsItsTwinOnEveryShortText) {
+    const std::vector<std::string> texts = MakeShortTexts();
     for (const std::string& a : texts)
         for (const std::string& b : texts) {
             SCOPED_TRACE(testing::PrintToString(a) + " and " + testing::PrintToString(b));
-            const core::string_ref ours(a.empty() ? nullptr : a.data(), a.size()), other(b.data(), b.size());
-            std::string upper = b;
-            std::replace(upper.begin(), upper.end(), 'b', 'B');
-            ASSERT_EQ(std::pair(ours == other, ours < other), std::pair(a == b, a < b));
-            ASSERT_TRUE((ours.compare(b.c_str()) <=> 0) == (a.compare(b.c_str()) <=> 0));
-            ASSERT_TRUE((ours.compare(upper.c_str(), kCaseInsensitive) <=> 0) == (a.compare(b.c_str()) <=> 0));
-            ASSERT_TRUE(ours.starts_with(other) == a.starts_with(b) && ours.rfind(b[0]) == a.rfind(b[0]));
-            ASSERT_EQ(ours.starts_with({upper.data(), upper.size()}, kCaseInsensitive), a.starts_with(b));
+            const core::string_ref ours(a.empty() ? nullptr : a.data(), a.size());
+            const core::string_ref other(b.data(), b.size());
+            ASSERT_EQ(a == b, ours == other);
+            ASSERT_EQ(a < b, ours < other);
+            ASSERT_EQ(Sign(a.compare(b.c_str())), Sign(ours.compare(b.c_str())));
+            ASSERT_EQ(a.starts_with(b), ours.starts_with(other));
+            ASSERT_EQ(a.rfind(b[0]), ours.rfind(b[0]));
             for (const size_t pos : {size_t{0}, size_t{1}, size_t{3}, ~size_t{0}}) { // the last and a size wrap
-                ASSERT_TRUE(ours.find(other, pos) == a.find(b, pos) && ours.find(b[0], pos) == a.find(b[0], pos));
-                ASSERT_EQ(ours.find_case_insensitive(upper.data(), pos, b.size()), b.empty() ? pos : a.find(b, pos));
+                ASSERT_EQ(a.find(b, pos), ours.find(other, pos));
+                ASSERT_EQ(a.find(b[0], pos), ours.find(b[0], pos));
             }
         }
-    EXPECT_LT(core::string_ref("").compare(core::string_ref("", size_t{1} << 32)), 0); // only the lengths are looked at
+}
+
+TEST(StringRef, CaseIsIgnoredOnRequest) {
+    const std::vector<std::string> texts = MakeShortTexts();
+    for (const std::string& a : texts)
+        for (const std::string& b : texts) {
+            SCOPED_TRACE(testing::PrintToString(a) + " and " + testing::PrintToString(b));
+            const core::string_ref ours(a.data(), a.size());
+            std::string upper = b;
+            std::replace(upper.begin(), upper.end(), 'b', 'B');
+            ASSERT_EQ(Sign(a.compare(b.c_str())), Sign(ours.compare(upper.c_str(), kCaseInsensitive)));
+            ASSERT_EQ(a.starts_with(b), ours.starts_with({upper.data(), upper.size()}, kCaseInsensitive));
+            for (const size_t pos : {size_t{0}, size_t{1}, size_t{3}, ~size_t{0}}) {
+                const size_t found = b.empty() ? pos : a.find(b, pos);
+                ASSERT_EQ(found, ours.find_case_insensitive(upper.data(), pos, b.size()));
+            }
+        }
+}
+
+TEST(StringRef, LongerTextComesAfterByAnyDifference) {
+    // Cut to 32 bits, the difference of the sizes would be 0. An empty common part is not read.
+    EXPECT_LT(core::string_ref("").compare(core::string_ref("", size_t{1} << 32)), 0);
+}
+
+TEST(StringRef, TruncatedCopyEndsInANul) {
     char copy[] = "####";
-    EXPECT_TRUE(strcpy_truncate(copy, "abc", 3, 3) == 2 && memcmp(copy, "ab\0#", 4) == 0);
+    EXPECT_EQ(2, strcpy_truncate(copy, "abc", 3, 3));
+    EXPECT_EQ(std::string("ab\0#", 4), std::string(copy, 4));
 }
 
 TEST(StringRef, OnlyTheTypeOneIgnoresCase) {

@@ -1,36 +1,116 @@
 #include "Runtime/Core/Containers/String.h"
 
+#include <csignal>
 #include <gtest/gtest.h>
 #include <random>
 
 using core::string;
 
-static int ModeByte(const string& text) { return reinterpret_cast<const UInt8*>(&text)[31]; }
+namespace {
 
-// Whether a string has the content, a NUL behind it, and a mode byte that says truly where it lies.
-static bool Is(const std::string& content, const string& text) {
+constexpr size_t kRefused = size_t{1} << 60; // more characters than there is memory for
+
+int ModeByte(const string& text) { return reinterpret_cast<const UInt8*>(&text)[31]; }
+
+// The content, the NUL after it, and a mode byte that says where the characters are.
+void ExpectHolds(const std::string& content, const string& text) {
+    EXPECT_EQ(content, std::string(text.begin(), text.end()));
+    EXPECT_EQ('\0', text.c_str()[text.size()]);
     const bool isInline = text.data() == reinterpret_cast<const char*>(&text);
-    return content == std::string(text.begin(), text.end()) && text.c_str()[text.size()] == '\0' &&
-           (isInline ? static_cast<size_t>(ModeByte(text)) == 31 - text.size() : ModeByte(text) >= 64);
+    if (isInline)
+        EXPECT_EQ(31 - text.size(), static_cast<size_t>(ModeByte(text)));
+    else
+        EXPECT_LE(64, ModeByte(text));
 }
 
-// Inline, on the heap (without room left) or external; '+' appends a number of characters, '>' grows to that room.
-TEST(String, AppendingAndGrowingMakeTheRoomThatTheRuleGives) {
-    using Row = std::tuple<char, size_t, char, size_t, size_t, int>;
-    for (const auto& [from, size, how, added, capacity, modeByte] :
-         {Row('i', 0, '+', 31, 31, 0), Row('i', 31, '+', 1, 62, 64), Row('i', 10, '+', 53, 63, 64 | 21),
-          Row('h', 100, '+', 1, 200, 95), Row('h', 100, '+', 150, 250, 95), Row('e', 20, '+', 11, 31, 0),
-          Row('e', 20, '+', 12, 32, 95), Row('e', 40, '+', 0, 0, 159), Row('i', 5, '>', 32, 32, 64 | 26),
-          Row('h', 40, '>', 41, 41, 95), Row('e', 5, '>', 31, 31, 26), Row('e', 40, '>', 33, 40, 95)}) {
-        const std::string content(size, 'a'), tail(how == '+' ? added : 0, '+');
-        string text = from == 'e' ? string::wrap(content.c_str()) : string();
-        if (from != 'e') text.grow(size), text = content.c_str();
-        for (const size_t tooMany : {size_t{1} << 60, string::npos})
-            EXPECT_EQ(nullptr, text.grow(tooMany)); // refused, and nothing has changed
-        EXPECT_TRUE(how == '+' || text.grow(added) == text.data());
-        EXPECT_TRUE(Is(content + tail, text += tail.c_str())) << from << size << how << added;
-        EXPECT_EQ(std::pair(capacity, modeByte), std::pair(text.capacity(), ModeByte(text))) << from << size << how;
+enum Mode { kInline, kHeap, kExternal };
+
+// A string in that mode, on the heap without room left. An external one borrows content.
+string MakeString(Mode mode, const std::string& content) {
+    if (mode == kExternal) return string::wrap(content.c_str());
+    string text;
+    if (mode == kHeap && text.grow(content.size()) == nullptr) ADD_FAILURE() << "memory is refused";
+    text = content.c_str();
+    return text;
+}
+
+// A row of the growth rules: what a string of a size becomes when so many characters are added, or asked room for.
+struct Growth {
+    Mode mode;
+    size_t size;
+    size_t count;
+    size_t capacity;
+    int modeByte;
+
+    friend void PrintTo(const Growth& row, std::ostream* out) {
+        constexpr const char* kNames[] = {"inline", "heap", "external"};
+        *out << kNames[row.mode] << " text of " << row.size << ", count " << row.count;
     }
+};
+
+} // namespace
+
+TEST(String, AppendingMakesRoomByTheRule) {
+    constexpr Growth kCases[] = {
+        {.mode = kInline, .size = 0, .count = 31, .capacity = 31, .modeByte = 0},
+        {.mode = kInline, .size = 31, .count = 1, .capacity = 62, .modeByte = 64},
+        {.mode = kInline, .size = 10, .count = 53, .capacity = 63, .modeByte = 64 | 21},
+        {.mode = kHeap, .size = 100, .count = 1, .capacity = 200, .modeByte = 64 | 31},
+        {.mode = kHeap, .size = 100, .count = 150, .capacity = 250, .modeByte = 64 | 31},
+        {.mode = kExternal, .size = 20, .count = 11, .capacity = 31, .modeByte = 0},
+        {.mode = kExternal, .size = 20, .count = 12, .capacity = 32, .modeByte = 64 | 31},
+        {.mode = kExternal, .size = 40, .count = 0, .capacity = 0, .modeByte = 128 | 31},
+    };
+    for (const Growth& row : kCases) {
+        SCOPED_TRACE(testing::PrintToString(row));
+        const std::string content(row.size, 'a');
+        const std::string tail(row.count, '+');
+        string text = MakeString(row.mode, content);
+        text += tail.c_str();
+        ExpectHolds(content + tail, text);
+        EXPECT_EQ(row.capacity, text.capacity());
+        EXPECT_EQ(row.modeByte, ModeByte(text));
+    }
+}
+
+TEST(String, GrowingMakesTheRoomAskedFor) {
+    constexpr Growth kCases[] = {
+        {.mode = kInline, .size = 5, .count = 32, .capacity = 32, .modeByte = 64 | 26},
+        {.mode = kHeap, .size = 40, .count = 41, .capacity = 41, .modeByte = 64 | 31},
+        {.mode = kExternal, .size = 5, .count = 31, .capacity = 31, .modeByte = 26},
+        {.mode = kExternal, .size = 40, .count = 33, .capacity = 40, .modeByte = 64 | 31},
+    };
+    for (const Growth& row : kCases) {
+        SCOPED_TRACE(testing::PrintToString(row));
+        const std::string content(row.size, 'a');
+        string text = MakeString(row.mode, content);
+        const char* const room = text.grow(row.count);
+        EXPECT_EQ(text.data(), room);
+        ExpectHolds(content, text);
+        EXPECT_EQ(row.capacity, text.capacity());
+        EXPECT_EQ(row.modeByte, ModeByte(text));
+    }
+}
+
+TEST(String, RefusedGrowthChangesNothing) {
+    for (const Mode mode : {kInline, kHeap, kExternal})
+        for (const size_t count : {kRefused, string::npos}) { // npos and the NUL after it wrap to 0
+            SCOPED_TRACE(testing::Message() << "mode " << mode << ", count " << count);
+            const std::string content("text");
+            string text = MakeString(mode, content);
+            const int modeByte = ModeByte(text);
+            EXPECT_EQ(nullptr, text.grow(count));
+            ExpectHolds(content, text);
+            EXPECT_EQ(modeByte, ModeByte(text));
+        }
+}
+
+TEST(String, RefusedTextEndsTheProcess) {
+    const core::string_ref text("", kRefused); // never read
+    string target("text");
+    EXPECT_EXIT(target += text, testing::KilledBySignal(SIGABRT), "");
+    EXPECT_EXIT(target = text, testing::KilledBySignal(SIGABRT), "");
+    EXPECT_EXIT(string{text}, testing::KilledBySignal(SIGABRT), "");
 }
 
 TEST(String, BehavesAsItsTwinUnderRandomEdits) {
@@ -39,29 +119,84 @@ TEST(String, BehavesAsItsTwinUnderRandomEdits) {
         std::mt19937 random(seed);
         string ours(kMemLabelFileSystem);
         std::string twin;
-        const auto take = [&](string source, bool isHandedOver) { // which depends on the labels
-            const char* const buffer = source.data();
-            ours = std::move(source);
-            EXPECT_TRUE(Is("", source) && (ours.data() == buffer) == isHandedOver) << seed;
-        };
         for (int step = 0; step < 100; ++step) {
-            const size_t from = random() % (twin.size() + 1), count = random() % (twin.size() - from + 1);
+            const size_t edit = random() % 9;
+            SCOPED_TRACE(testing::Message() << "seed " << seed << ", step " << step << ", edit " << edit);
+            const size_t from = random() % (twin.size() + 1);
+            const size_t count = random() % (twin.size() - from + 1);
             const std::string other = lent.substr(random() % 50, 1 + random() % 44);
-            switch (random() % 11) {
-            case 0: take(string(other.c_str(), kMemLabelFileSystem), other.size() > 31), twin = other; break;
-            case 1: take(string(other.c_str(), kMemLabelGeneral), false), twin = other; break;
-            case 2: take(string::wrap(lent.c_str() + count % 50), true), twin = lent.substr(count % 50); break;
-            case 3: ours.append(ours.data() + from, count), twin += twin.substr(from, count); break;
-            case 4: ours.assign(ours.data() + from, count), twin = twin.substr(from, count); break;
-            case 5: ours = ours + other.c_str(), twin += other; break;
-            case 6: ours.resize(from), ours += 'c', twin.resize(from), twin += 'c'; break;
-            case 7: ours.reserve(from), ours += core::string_ref(other.c_str()), twin += other; break;
-            case 8: ours.resize(twin.size() + 5), twin.resize(twin.size() + 5); break;
-            case 9: ours = string(static_cast<const string&>(ours)), ours = static_cast<string&&>(ours); break;
-            default: ours.clear(), ours += other.c_str(), ours[0] = 'X', twin = other, twin[0] = 'X'; break;
+            switch (edit) {
+            case 0:
+                ours = string(other.c_str(), kMemLabelFileSystem);
+                twin = other;
+                break;
+            case 1:
+                ours = string(other.c_str(), kMemLabelGeneral);
+                twin = other;
+                break;
+            case 2:
+                ours = string::wrap(lent.c_str() + count % 50);
+                twin = lent.substr(count % 50);
+                break;
+            case 3:
+                ours.append(ours.data() + from, count);
+                twin += twin.substr(from, count);
+                break;
+            case 4:
+                ours.assign(ours.data() + from, count);
+                twin = twin.substr(from, count);
+                break;
+            case 5:
+                ours = ours + other.c_str();
+                twin += other;
+                break;
+            case 6:
+                ours.truncate(from);
+                ours += 'c';
+                twin.resize(from);
+                twin += 'c';
+                break;
+            case 7:
+                ours = string(static_cast<const string&>(ours));
+                ours = static_cast<string&&>(ours);
+                break;
+            default:
+                ours.clear();
+                ours += other.c_str();
+                ours[0] = 'X';
+                twin = other;
+                twin[0] = 'X';
+                break;
             }
-            ASSERT_TRUE(Is(twin, ours) && ours.get_memory_label() == kMemLabelFileSystem) << seed << ", " << step;
+            ExpectHolds(twin, ours);
+            ASSERT_EQ(kMemLabelFileSystem, ours.get_memory_label().identifier);
+            if (HasFailure()) return;
         }
+    }
+}
+
+TEST(String, MoveHandsOverTheBufferBetweenEqualLabels) {
+    const std::string lent(40, 'x');
+    struct Case {
+        const char* name;
+        string source;
+        bool isHandedOver;
+    };
+    Case cases[] = {
+        {.name = "inline", .source = string("short", kMemLabelFileSystem), .isHandedOver = false},
+        {.name = "heap", .source = string(lent.c_str(), kMemLabelFileSystem), .isHandedOver = true},
+        {.name = "heap of another label", .source = string(lent.c_str(), kMemLabelGeneral), .isHandedOver = false},
+        {.name = "external", .source = string::wrap(lent.c_str(), kMemLabelGeneral), .isHandedOver = true},
+    };
+    for (Case& row : cases) {
+        SCOPED_TRACE(row.name);
+        const std::string content(row.source.c_str());
+        const char* const buffer = row.source.data();
+        string target("a text that does not fit into the string itself", kMemLabelFileSystem);
+        target = std::move(row.source);
+        ExpectHolds(content, target);
+        EXPECT_EQ(row.isHandedOver, target.data() == buffer);
+        ExpectHolds("", row.source);
     }
 }
 

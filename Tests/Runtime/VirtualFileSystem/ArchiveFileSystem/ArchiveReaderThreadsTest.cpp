@@ -1,12 +1,8 @@
 // One reader, many threads. What must happen at the same time is held together by a disk that is shut, never by timing.
 #include "Tests/Runtime/VirtualFileSystem/ArchiveFileSystem/ReaderTest.h"
+#include "Tests/Support/MutexInspector.h"
 
 #include <thread>
-
-// Shows what no operation tells: a count below 0 means that so many threads wait.
-struct MutexInspector {
-    static SInt32 Counter(const Mutex& mutex) { return mutex.m_Counter; }
-};
 
 namespace {
 

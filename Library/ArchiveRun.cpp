@@ -1,0 +1,183 @@
+#include "Library/ArchiveRun.h"
+
+#include <algorithm>
+#include <chrono>
+#include <cstdio>
+#include <cstring>
+
+namespace {
+
+constexpr UInt32 kMaxThreads = 1'024;
+constexpr auto kProgressInterval = std::chrono::milliseconds(100);
+
+// Half of the memory that programs can have without anything being pushed out.
+UInt64 DefaultMemory() {
+    constexpr UInt64 kUnknown = UInt64{1} << 30;
+    FILE* const file = fopen("/proc/meminfo", "re");
+    if (file == nullptr) return kUnknown;
+    char line[128];
+    unsigned long long kibibytes = 0;
+    while (fgets(line, sizeof(line), file) != nullptr)
+        if (sscanf(line, "MemAvailable: %llu kB", &kibibytes) == 1) break;
+    fclose(file);
+    return kibibytes != 0 ? kibibytes * 1'024 / 2 : kUnknown;
+}
+
+UInt64 MemoryOf(const zarvo_run_options& options) { return options.memory != 0 ? options.memory : DefaultMemory(); }
+
+// A block takes its decoded bytes, and its stored ones, which are no more.
+UInt64 MaxBlockBytes(zarvo_archive* archive, UInt64 memory) { return std::min(archive->MaxBlockBytes(), memory / 2); }
+
+UInt32 CountThreads(zarvo_archive* archive, const zarvo_run_options& options, UInt64 memory, UInt64 maxBlockBytes) {
+    UInt64 largest = 1;
+    for (UInt32 index = 0; index < archive->Blocks().BlockCount(); ++index) {
+        const BlockDecoder::Block block = archive->Blocks().GetBlock(index);
+        const bool isHeldWhole = !BlockDecoder::IsStoredAsIs(block) && block.size <= maxBlockBytes &&
+                                 !BlockDecoder::IsReadInPieces(block, maxBlockBytes);
+        if (isHeldWhole) largest = std::max<UInt64>(largest, block.size);
+    }
+    const UInt64 wanted = options.threads != 0 ? options.threads : ProcessorCount();
+    const UInt64 affordable = memory / (2 * largest);
+    return static_cast<UInt32>(std::clamp<UInt64>(std::min(wanted, affordable), 1, kMaxThreads));
+}
+
+} // namespace
+
+ArchiveRun::ArchiveRun(zarvo_archive* archive, const zarvo_run_options& options)
+    : m_Archive(archive),
+      m_Options(options),
+      m_MaxBlockBytes(MaxBlockBytes(archive, MemoryOf(options))),
+      m_ThreadCount(CountThreads(archive, options, MemoryOf(options), m_MaxBlockBytes)),
+      m_Data(&archive->Blocks(), archive->Nodes(), m_MaxBlockBytes, this) {}
+
+bool ArchiveRun::MakeResults() {
+    if (!m_States.resize_uninitialized(Nodes().size(), kResizeExact)) return false;
+    if (!m_States.empty()) memset(m_States.data(), kNoResult, m_States.size());
+    return true;
+}
+
+void ArchiveRun::SetState(size_t entry, State state) {
+    if (state == kPending) ++m_Expected;
+    // What belongs to a result comes before it.
+    std::atomic_ref<UInt8>(m_States[entry]).store(state, std::memory_order_release);
+}
+
+ArchiveRun::State ArchiveRun::GetState(size_t entry) {
+    return static_cast<State>(std::atomic_ref<UInt8>(m_States[entry]).load(std::memory_order_acquire));
+}
+
+void ArchiveRun::SetDone(size_t entry) {
+    SetState(entry, kDone);
+    m_Results.fetch_add(1, std::memory_order_relaxed); // for progress only
+}
+
+void ArchiveRun::SetKept(size_t entry) {
+    SetState(entry, kKept);
+    m_Results.fetch_add(1, std::memory_order_relaxed); // for progress only
+}
+
+void ArchiveRun::SetFailed(size_t entry, const Failure& failure) {
+    bool isKept = false;
+    {
+        std::lock_guard lock(m_Lock);
+        const size_t index = m_Failures.size();
+        isKept = (!m_FailureOf.empty() || m_FailureOf.resize_uninitialized(m_States.size(), kResizeExact)) &&
+                 m_Failures.resize_uninitialized(index + 1);
+        if (isKept) {
+            m_Failures[index] = {entry, failure};
+            m_FailureOf[entry] = static_cast<UInt32>(index);
+        }
+    }
+    if (!isKept) {
+        Failure noMemory;
+        (void)noMemory.SetMemory();
+        m_Data.StopFor(noMemory);
+        return;
+    }
+    SetState(entry, kFailed);
+    m_Results.fetch_add(1, std::memory_order_relaxed); // for progress only
+}
+
+zarvo_code ArchiveRun::Run(Failure* failure) {
+    m_Data.Prepare();
+    RunOnThreads(m_ThreadCount, this);
+    m_Data.DropUnended();
+    TellReports();
+    (void)TellProgress(); // too late to stop anything
+    m_Messages.TellAll(m_Archive->Messages());
+    if (m_Data.FatalFailure().code != ZARVO_OK) {
+        *failure = m_Data.FatalFailure();
+        return failure->code;
+    }
+    return m_IsStopped ? failure->Set(ZARVO_ERROR_STOPPED, "stopped") : ZARVO_OK;
+}
+
+void ArchiveRun::Work(UInt32 number) {
+    {
+        MessageScope scope(&m_Messages);
+        m_Data.Work(number);
+    }
+    std::lock_guard lock(m_Lock);
+    ++m_Ended;
+    m_HasEnded.notify_one();
+}
+
+void ArchiveRun::Watch(UInt32 count) {
+    std::unique_lock lock(m_Lock);
+    while (!m_HasEnded.wait_for(lock, kProgressInterval, [&] { return m_Ended == count; })) {
+        lock.unlock();
+        TellReports();
+        if (!TellProgress()) {
+            m_IsStopped = true;
+            m_Data.Stop();
+        }
+        lock.lock();
+    }
+}
+
+// Tells the results that have no missing one before them.
+void ArchiveRun::TellReports() {
+    for (; m_Reported < m_States.size(); ++m_Reported) {
+        const State state = GetState(m_Reported);
+        if (state == kNoResult) continue;
+        if (state == kPending) {
+            // A run that was stopped leaves gaps.
+            if (!m_Data.IsStopped() || m_Ended == 0) return;
+            continue;
+        }
+        zarvo_report report = {};
+        report.struct_size = sizeof(report);
+        report.index = m_Reported;
+        report.text = "";
+        const Node& node = Nodes()[m_Reported];
+        Failure failure;
+        if (state == kFailed) {
+            std::lock_guard lock(m_Lock);
+            failure = m_Failures[m_FailureOf[m_Reported]].failure;
+            report.outcome = ZARVO_OUTCOME_FAILED;
+            report.code = failure.code;
+            report.system_code = failure.systemCode;
+            report.text = failure.text;
+            ++m_Summary.failures;
+        } else if (state == kKept) {
+            report.outcome = ZARVO_OUTCOME_KEPT;
+            ++m_Summary.kept;
+        } else {
+            report.outcome = ZARVO_OUTCOME_DONE;
+            ++(zarvo_archive::IsFolder(node) ? m_Summary.folders : m_Summary.files);
+            m_Summary.bytes += zarvo_archive::SizeOf(node);
+        }
+        Report(report);
+    }
+}
+
+bool ArchiveRun::TellProgress() {
+    if (m_Options.progress == nullptr) return true;
+    zarvo_progress progress = {};
+    progress.struct_size = sizeof(progress);
+    progress.bytes = m_Data.BytesTaken();
+    progress.bytes_total = m_Data.BytesTotal();
+    progress.files = m_Results.load(std::memory_order_relaxed); // a count, that nothing else goes by
+    progress.files_total = m_Expected;
+    return m_Options.progress(m_Options.context, &progress) == 0;
+}

@@ -1,0 +1,81 @@
+// What extraction, tests and visits have in common: how many threads, how much memory, progress, and reports in the
+// archive's order, whatever order the threads work in. An operation derives from it and says what becomes of the bytes.
+//
+// One thread makes and runs it; what a subclass takes comes from all workers at once.
+#pragma once
+
+#include "Library/Archive.h"
+#include "Library/DataRun.h"
+#include "Library/Threads.h"
+
+class ArchiveRun : protected DataRun::Sink, private ThreadedWork {
+public:
+    // options: every field, without defaults filled in.
+    ArchiveRun(zarvo_archive* archive, const zarvo_run_options& options);
+    ~ArchiveRun() override = default;
+
+    // Runs what has been added. The failure that ended it, or ZARVO_OK.
+    zarvo_code Run(Failure* failure);
+
+    const zarvo_summary& Summary() const { return m_Summary; }
+
+protected:
+    using Node = ArchiveStorageHeader::Node;
+
+    DataRun& Data() { return m_Data; }
+    const EntryIndex::Nodes& Nodes() const { return m_Archive->Nodes(); }
+    zarvo_archive* Archive() const { return m_Archive; }
+    const zarvo_run_options& Options() const { return m_Options; }
+    UInt32 ThreadCount() const { return m_ThreadCount; }
+
+    // Asks for the memory of results, one an entry. Before the functions below.
+    [[nodiscard]] bool MakeResults();
+
+    // An entry that will have a result of its own; all others have none. Before Run.
+    void Expect(size_t entry) { SetState(entry, kPending); }
+
+    // The result of an entry, once. Any thread.
+    void SetDone(size_t entry);
+    void SetKept(size_t entry);
+    void SetFailed(size_t entry, const Failure& failure);
+
+    // Called for each result in the archive's order, on the calling thread.
+    virtual void Report(const zarvo_report& report) = 0;
+
+    // Whether data beyond an entry's start is outside of the archive's, so that none of it can be read.
+    bool IsOutsideData(const Node& node) const { return node.offset >= m_Archive->Info().data_size; }
+
+private:
+    enum State : UInt8 { kNoResult, kPending, kDone, kKept, kFailed };
+
+    void Work(UInt32 number) override;
+    void Watch(UInt32 count) override;
+    void TellReports();
+    bool TellProgress(); // false: to be stopped
+    void SetState(size_t entry, State state);
+    State GetState(size_t entry);
+
+    zarvo_archive* m_Archive;
+    const zarvo_run_options m_Options;
+    UInt64 m_MaxBlockBytes;
+    UInt32 m_ThreadCount;
+    DataRun m_Data;
+    MessageQueue m_Messages;
+    zarvo_summary m_Summary = ZARVO_SUMMARY_INIT;
+    bool m_IsStopped = false; // by the caller
+
+    dynamic_array<UInt8> m_States{kMemLabelFileSystem}; // State; written and read by atomic references
+    size_t m_Reported = 0;                              // entries whose results have been told
+    UInt64 m_Expected = 0;
+    std::atomic<UInt64> m_Results{0};
+
+    std::mutex m_Lock;
+    std::condition_variable m_HasEnded;
+    UInt32 m_Ended = 0; // workers
+    struct FailedEntry {
+        UInt64 entry;
+        Failure failure;
+    };
+    dynamic_array<FailedEntry> m_Failures{kMemLabelFileSystem}; // in the order in which they came
+    dynamic_array<UInt32> m_FailureOf{kMemLabelFileSystem};     // by entry; empty until there is one
+};

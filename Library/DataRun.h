@@ -1,0 +1,178 @@
+// Decodes an archive's blocks in all threads, each block once, and hands the files' bytes to a sink while they are in
+// the processor's cache.
+//
+// The data is cut into units: a run of whole blocks of about 1 MiB, a piece of that size of data that is stored as it
+// is, or one block that is decoded piece by piece. A thread takes the next unit, decodes it, and hands over all that
+// lies in it: files that lie in it whole at once, parts of others. Files are looked at in the order of their places,
+// not of the directory, so that nothing is decoded twice however the directory is sorted. A thread that decodes a block
+// piece by piece passes its pieces on to threads that have nothing to do.
+//
+//   DataRun run(decoder, nodes, maxBlockBytes, &sink);
+//   run.AddFile(entry) ..., or run.AddAllBlocks(); run.AddOther(entry) ...
+//   run.Prepare();
+//   run.Work(worker);   // in each thread, each with a number of its own
+//
+// Work is for any number of threads at once, everything else for one.
+#pragma once
+
+#include "Library/BlockDecoder.h"
+#include "Runtime/Threads/Mutex.h"
+
+#include <condition_variable>
+#include <mutex>
+
+// A file that lies in more than one piece, from its first part to its last.
+struct SharedFile : private NonCopyable {
+    SharedFile(UInt32 index, UInt64 size) : entry(index), left(size) {}
+
+    const UInt32 entry;
+    std::atomic<UInt64> left; // bytes of parts that have not been handed over
+
+    Mutex lock;                                           // for what follows, and the sink's
+    UInt64 readable VARNEX_GUARDED_BY(lock) = ~UInt64{0}; // bytes before the first damage that has been met
+    Failure damage VARNEX_GUARDED_BY(lock);
+
+    // The run's own.
+    UInt64 inOrder = 0; // bytes that have been handed over, where that is done in order
+    size_t liveIndex = 0;
+};
+
+class DataRun : private NonCopyable {
+public:
+    using Nodes = dynamic_array<ArchiveStorageHeader::Node>;
+
+    // What becomes of the bytes. Called by all workers at once, with their numbers.
+    class Sink {
+    public:
+        virtual ~Sink() = default;
+
+        // A whole file: readable bytes of it, and why there are no more (null: these are all).
+        virtual void TakeFile(UInt32 worker, UInt32 entry, const UInt8* bytes, UInt64 readable,
+                              const Failure* damage) = 0;
+
+        // A file that is shared by several pieces: its state is made, used (its parts come in any order, unless the run
+        // keeps it) and ended, once all parts have come.
+        virtual SharedFile* ShareFile(UInt32 entry, UInt64 size) = 0; // null when memory is refused
+        virtual void TakePart(UInt32 worker, SharedFile* file, UInt64 offset, const UInt8* bytes, UInt64 size) = 0;
+        virtual void EndFile(UInt32 worker, SharedFile* file) = 0; // and deletes it
+        virtual void DropFile(SharedFile* file) = 0;               // the run was stopped; deletes it
+
+        // An entry that was added without data.
+        virtual void TakeOther(UInt32 worker, UInt32 entry) = 0;
+
+        // A block that can't be decoded after its first readable bytes.
+        virtual void TakeDamage(UInt32 blockIndex, UInt64 readable, const Failure& damage) = 0;
+    };
+
+    // All outlive the run. Blocks of more than maxBlockBytes are not decoded whole.
+    DataRun(const BlockDecoder* decoder, const Nodes& nodes, UInt64 maxBlockBytes, Sink* sink);
+    ~DataRun();
+
+    // Before Prepare. False when memory is refused. A file needs bytes, and its start must lie in the data.
+    [[nodiscard]] bool AddFile(UInt32 entry);
+    [[nodiscard]] bool AddOther(UInt32 entry);
+    void AddAllBlocks() { m_TakesAllBlocks = true; }
+    void KeepOrder() { m_KeepsOrder = true; } // parts of a file come one after the other, from its start on
+
+    void Prepare();
+
+    // Works until nothing is left, or the run is stopped.
+    void Work(UInt32 worker);
+    void Stop();
+    void StopFor(const Failure& failure); // which is the FatalFailure unless there is one already
+    bool IsStopped() const { return m_IsStopped.load(std::memory_order_relaxed); } // a hint: data is under the lock
+
+    // Once all workers are done: drops the files that a stopped run has not ended.
+    void DropUnended();
+
+    // As above: why the run was stopped, unless by the caller.
+    const Failure& FatalFailure() const { return m_Fatal; }
+
+    UInt64 BytesTotal() const { return m_BytesTotal; }
+    UInt64 BytesTaken() const { return m_BytesTaken.load(std::memory_order_relaxed); } // for progress
+
+private:
+    struct File {
+        UInt64 begin; // in the data
+        UInt64 end;   // not past the data's end
+        UInt32 entry;
+    };
+    struct PieceFile {
+        const File* file;
+        SharedFile* shared; // null: the file lies in the piece whole
+    };
+    // A range that can't be read.
+    struct Hole {
+        UInt64 begin;
+        UInt64 end;
+        Failure failure;
+    };
+    // Decoded data, and what lies in it.
+    struct Piece {
+        UInt64 begin = 0;
+        UInt64 end = 0;
+        dynamic_array<UInt8> bytes{kMemLabelFileSystem};
+        dynamic_array<PieceFile> files{kMemLabelFileSystem};
+        dynamic_array<Hole> holes{kMemLabelFileSystem};
+    };
+    struct Unit {
+        UInt64 begin = 0;
+        UInt64 end = 0;
+        UInt32 firstBlock = 0;
+        bool isStream = false;
+        size_t firstFile = 0; // [firstFile, endFile) begin in it
+        size_t endFile = 0;
+        dynamic_array<PieceFile> carried{kMemLabelFileSystem}; // begin before it
+        dynamic_array<PieceFile> leaving{kMemLabelFileSystem}; // begin in it and end after it, in order
+    };
+
+    static constexpr UInt64 kUnitSize = 1'048'576;
+    static constexpr size_t kOthersAtOnce = 64;
+
+    // With m_Lock held.
+    enum UnitAnswer { kUnit, kNoUnit, kNoMemoryForUnit };
+    UnitAnswer NextUnit(Unit* unit);
+    UInt64 FindUnitEnd(const Unit& unit, UInt64 begin) const;
+    bool ListFiles(Unit* unit);
+    SharedFile* Share(const File& file);
+
+    void WorkOnUnit(UInt32 worker, const Unit& unit, Piece* piece);
+    void WorkOnStream(UInt32 worker, const Unit& unit, Piece** piece);
+    bool PassOn(Piece** piece);
+    void Decode(const Unit& unit, Piece* piece);
+    void AddHole(Piece* piece, UInt64 begin, UInt64 end, const Failure& failure);
+    void Deliver(UInt32 worker, const Piece& piece);
+    void DeliverPart(UInt32 worker, const PieceFile& part, UInt64 offset, const UInt8* bytes, UInt64 size,
+                     const Hole* hole);
+    void Unshare(SharedFile* shared);
+    void StopWithoutMemory();
+
+    const BlockDecoder* m_Decoder;
+    const Nodes& m_Nodes;
+    const UInt64 m_MaxBlockBytes;
+    const UInt64 m_DataSize;
+    Sink* m_Sink;
+    bool m_KeepsOrder = false;
+    bool m_TakesAllBlocks = false;
+    dynamic_array<File> m_Files{kMemLabelFileSystem}; // by their beginnings, once prepared
+    dynamic_array<UInt32> m_Others{kMemLabelFileSystem};
+    UInt64 m_BytesTotal = 0;
+
+    // What follows is under m_Lock, which is held to find the next unit, and never to decode or to write.
+    std::mutex m_Lock;
+    std::condition_variable m_HasWork;     // a piece was passed on, a stream has ended, or the run is stopped
+    std::condition_variable m_HasAdvanced; // a file's inOrder, or the run is stopped
+    UInt64 m_Position = 0;                 // data before it has been given out
+    size_t m_NextFile = 0;
+    size_t m_NextOther = 0;
+    dynamic_array<PieceFile> m_Active{kMemLabelFileSystem}; // begin before m_Position and end after it
+    dynamic_array<SharedFile*> m_Shared{kMemLabelFileSystem};
+    dynamic_array<Piece*> m_Passed{kMemLabelFileSystem}; // never more than workers that wait
+    dynamic_array<Piece*> m_Spare{kMemLabelFileSystem};
+    size_t m_Streams = 0; // being decoded
+    size_t m_Waiting = 0; // workers
+    Failure m_Fatal;
+
+    std::atomic<bool> m_IsStopped{false};
+    std::atomic<UInt64> m_BytesTaken{0};
+};

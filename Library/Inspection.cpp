@@ -1,0 +1,122 @@
+#include "Library/Inspection.h"
+
+#include "Runtime/Allocator/Allocator.h"
+
+#include <algorithm>
+
+zarvo_code TestRun::Test(const zarvo_test_options& what, zarvo_summary* summary, Failure* failure) {
+    Data().AddAllBlocks();
+    if (const zarvo_code code = Run(failure); code != ZARVO_OK) return code;
+    std::sort(m_Damages.begin(), m_Damages.end(), [](const Damage& a, const Damage& b) { return a.begin < b.begin; });
+    // A block that is cut into units is told once, with its first damage.
+    UInt32 last = ~UInt32{0};
+    for (const Damage& damage : m_Damages) {
+        if (damage.blockIndex == last) continue;
+        last = damage.blockIndex;
+        ++summary->damaged_blocks;
+        if (what.block != nullptr) what.block(Options().context, damage.blockIndex, damage.failure.text);
+    }
+    for (size_t entry = 0; entry < Nodes().size(); ++entry) {
+        const UInt64 size = zarvo_archive::SizeOf(Nodes()[entry]);
+        const UInt64 readable = ReadableBytes(Nodes()[entry]);
+        ++(zarvo_archive::IsFolder(Nodes()[entry]) ? summary->folders : summary->files);
+        summary->bytes += size;
+        if (readable == size) continue;
+        ++summary->failures;
+        if (what.entry != nullptr) what.entry(Options().context, entry, readable);
+    }
+    return ZARVO_OK;
+}
+
+UInt64 TestRun::ReadableBytes(const Node& node) const {
+    const UInt64 size = zarvo_archive::SizeOf(node);
+    if (size == 0) return 0;
+    if (IsOutsideData(node)) return 0;
+    UInt64 end = node.offset + std::min(size, Archive()->Info().data_size - node.offset);
+    // Of those that end after the file's beginning, the first.
+    const Damage* const damage = std::lower_bound(m_Damages.begin(), m_Damages.end(), node.offset,
+                                                  [](const Damage& at, UInt64 place) { return at.end <= place; });
+    if (damage != m_Damages.end()) end = std::min(end, std::max(damage->begin, UInt64{node.offset}));
+    return end - node.offset;
+}
+
+void TestRun::TakeDamage(UInt32 blockIndex, UInt64 readable, const Failure& damage) {
+    const BlockDecoder::Block block = Archive()->Blocks().GetBlock(blockIndex);
+    Mutex::AutoLock lock(m_DamageLock);
+    const size_t index = m_Damages.size();
+    if (m_Damages.resize_uninitialized(index + 1)) {
+        m_Damages[index] = {blockIndex, block.position + readable, block.position + block.size, damage};
+        return;
+    }
+    Failure noMemory;
+    (void)noMemory.SetMemory();
+    Data().StopFor(noMemory);
+}
+
+zarvo_code VisitRun::Visit(Failure* failure) {
+    if (!MakeResults()) return failure->SetMemory();
+    if (const zarvo_code code = m_Plan.Build(Options().wanted, Options().excluded, failure); code != ZARVO_OK)
+        return code;
+    Data().KeepOrder();
+    for (UInt32 entry = 0; entry < Nodes().size(); ++entry) {
+        const OutputPlan::Verdict verdict = m_Plan.VerdictOf(entry);
+        if (verdict == OutputPlan::kUnwanted || verdict == OutputPlan::kReplaced) continue;
+        Expect(entry);
+        const Node& node = Nodes()[entry];
+        bool isAdded = true;
+        if (verdict == OutputPlan::kRefused || verdict == OutputPlan::kClash) {
+            Failure refusal;
+            m_Plan.SetRefusal(entry, &refusal);
+            SetFailed(entry, refusal);
+        } else if (verdict == OutputPlan::kFolder || node.size == 0 || IsOutsideData(node)) {
+            isAdded = Data().AddOther(entry);
+        } else {
+            isAdded = Data().AddFile(entry);
+        }
+        if (!isAdded) return failure->SetMemory();
+    }
+    return Run(failure);
+}
+
+void VisitRun::HandOver(UInt32 entry, UInt64 offset, const UInt8* bytes, UInt64 size) {
+    if (size != 0 && m_What.bytes != nullptr)
+        m_What.bytes(Options().context, entry, offset, bytes, static_cast<size_t>(size));
+}
+
+void VisitRun::TakeFile(UInt32, UInt32 entry, const UInt8* bytes, UInt64 readable, const Failure* damage) {
+    HandOver(entry, 0, bytes, readable);
+    if (damage != nullptr)
+        SetFailed(entry, *damage);
+    else
+        SetDone(entry);
+}
+
+SharedFile* VisitRun::ShareFile(UInt32 entry, UInt64 size) { return New<SharedFile>(kMemLabelFileSystem, entry, size); }
+
+void VisitRun::TakePart(UInt32, SharedFile* file, UInt64 offset, const UInt8* bytes, UInt64 size) {
+    HandOver(file->entry, offset, bytes, size);
+}
+
+void VisitRun::EndFile(UInt32, SharedFile* file) {
+    {
+        Mutex::AutoLock lock(file->lock);
+        if (file->damage.code != ZARVO_OK)
+            SetFailed(file->entry, file->damage);
+        else
+            SetDone(file->entry);
+    }
+    Delete(file, kMemLabelFileSystem);
+}
+
+void VisitRun::DropFile(SharedFile* file) { Delete(file, kMemLabelFileSystem); }
+
+void VisitRun::TakeOther(UInt32 worker, UInt32 entry) {
+    if (!IsOutsideData(Nodes()[entry]) || zarvo_archive::SizeOf(Nodes()[entry]) == 0) return SetDone(entry);
+    Failure damage;
+    (void)SetOutsideData(&damage);
+    TakeFile(worker, entry, nullptr, 0, &damage);
+}
+
+void VisitRun::Report(const zarvo_report& report) {
+    if (m_What.report != nullptr) m_What.report(Options().context, &report);
+}

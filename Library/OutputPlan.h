@@ -1,0 +1,60 @@
+// What extraction makes of each entry, settled before anything is written, so that it depends on the archive alone:
+// which entries are wanted, which are refused, and who gives way to whom. One thread at a time; any number once it is
+// built.
+//
+// Entries whose paths on disk are equal: the last file counts, and the last folder. Entries that can't both be (a file
+// where a folder has to be): the path belongs to whoever comes first in the archive.
+#pragma once
+
+#include "Library/Failure.h"
+#include "Library/PathTable.h"
+#include "Library/Patterns.h"
+#include "Runtime/VirtualFileSystem/ArchiveFileSystem/ArchiveStorageHeader.h"
+
+class OutputPlan {
+public:
+    using Nodes = dynamic_array<ArchiveStorageHeader::Node>;
+
+    enum Verdict : UInt8 {
+        kUnwanted, // by a pattern, or without components that strip leaves
+        kReplaced, // by a later entry of the same path
+        kRefused,  // its path has a problem: see GetPathProblem
+        kClash,    // its path belongs to an earlier entry of the other kind
+        kFolder,
+        kFile,
+    };
+
+    // nodes outlives the plan. strip: how many components each path loses at its front.
+    OutputPlan(const Nodes& nodes, UInt64 strip) : m_Nodes(nodes), m_Strip(strip) {}
+
+    // wanted and excluded may be null: everything, and nothing.
+    [[nodiscard]] zarvo_code Build(zarvo_patterns* wanted, zarvo_patterns* excluded, Failure* failure);
+
+    Verdict VerdictOf(size_t entry) const { return m_Verdicts[entry]; }
+
+    // Why an entry has the verdict kRefused or kClash.
+    void SetRefusal(size_t entry, Failure* failure) const;
+
+    // A text whose normal form is the entry's path on disk.
+    core::string_ref PathOnDisk(size_t entry) const { return Strip(m_Nodes[entry].path); }
+
+private:
+    // A folder of no entry: the start of an entry's path.
+    struct ImpliedFolder {
+        UInt32 entry;
+        UInt32 length;
+    };
+
+    core::string_ref Strip(core::string_ref path) const;
+    core::string_ref PathOfItem(UInt32 item) const;
+    bool IsFolderItem(UInt32 item) const;
+    [[nodiscard]] bool Settle(UInt32 entry, dynamic_array<UInt64>* hashes);
+    UInt32* Find(UInt64 hash, core::string_ref path);
+
+    const Nodes& m_Nodes;
+    const UInt64 m_Strip;
+    dynamic_array<Verdict> m_Verdicts{kMemLabelFileSystem};
+    dynamic_array<ImpliedFolder> m_Implied{kMemLabelFileSystem};
+    PathTable m_Table; // items: entries, and after them implied folders
+    UInt64 m_Seed = 0;
+};

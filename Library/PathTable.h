@@ -1,0 +1,57 @@
+// A hash table that finds items by the normal form of their paths. It holds numbers of items only: whoever owns it says
+// which path an item has. A slot takes 8 bytes, and four fifths of the slots are used at most.
+//
+// An owner is a callable: core::string_ref pathOf(UInt32 item). One thread at a time; any number for Find.
+#pragma once
+
+#include "Library/PathRules.h"
+#include "Runtime/Core/Containers/DynamicArray.h"
+
+class PathTable {
+public:
+    static constexpr UInt32 kNoItem = ~UInt32{0};
+
+    // Makes room for count items. What is in the table stays; places of items that Find has returned do not.
+    [[nodiscard]] bool Reserve(size_t count) {
+        const size_t wanted = count + count / 4 + 8;
+        if (wanted <= m_Slots.size()) return true;
+        dynamic_array<Slot> old = std::move(m_Slots);
+        // A table that outgrows its size once leaves room for some more.
+        if (!m_Slots.resize_uninitialized(old.empty() ? wanted : wanted + count / 4, kResizeExact)) return false;
+        for (Slot& slot : m_Slots)
+            slot.item = kNoItem;
+        for (const Slot& slot : old)
+            if (slot.item != kNoItem) *FirstFree(slot.hash) = slot;
+        return true;
+    }
+
+    // Where the item with that path is, or kNoItem is to be replaced by it. The table must have room.
+    template <typename PathOf>
+    UInt32* Find(UInt64 hash, core::string_ref path, PathOf&& pathOf) {
+        const UInt32 shortHash = static_cast<UInt32>(hash);
+        for (size_t index = StartOf(shortHash);; index = Next(index)) {
+            Slot& slot = m_Slots[index];
+            if (slot.item == kNoItem) slot.hash = shortHash;
+            if (slot.item == kNoItem || (slot.hash == shortHash && IsSamePath(pathOf(slot.item), path)))
+                return &slot.item;
+        }
+    }
+
+private:
+    struct Slot {
+        UInt32 hash;
+        UInt32 item;
+    };
+
+    // As far into the table as the hash is into its range.
+    size_t StartOf(UInt32 hash) const { return static_cast<size_t>((UInt64{hash} * m_Slots.size()) >> 32); }
+    size_t Next(size_t index) const { return index + 1 == m_Slots.size() ? 0 : index + 1; }
+    Slot* FirstFree(UInt32 hash) {
+        size_t index = StartOf(hash);
+        while (m_Slots[index].item != kNoItem)
+            index = Next(index);
+        return &m_Slots[index];
+    }
+
+    dynamic_array<Slot> m_Slots{kMemLabelFileSystem};
+};

@@ -1,0 +1,450 @@
+#include "Tests/Library/LibraryTest.h"
+#include "Tests/Support/TemporaryFolder.h"
+
+#include <fcntl.h>
+#include <map>
+#include <mutex>
+#include <random>
+#include <sys/resource.h>
+#include <sys/stat.h>
+#include <unistd.h>
+
+namespace {
+
+namespace fs = std::filesystem;
+
+// What lies below a folder: the text of each file, "/" for a folder, "-> target" for a link.
+using Tree = std::map<std::string, std::string>;
+
+Tree TreeOf(const std::string& folder) {
+    Tree tree;
+    for (const fs::directory_entry& entry : fs::recursive_directory_iterator(folder)) {
+        const std::string name = entry.path().string().substr(folder.size() + 1);
+        if (entry.is_symlink())
+            tree[name] = "-> " + fs::read_symlink(entry.path()).string();
+        else if (entry.is_directory())
+            tree[name] = "/";
+        else
+            tree[name] = ReadFile(entry.path());
+    }
+    return tree;
+}
+
+// How an extraction went: a line for each report, and what it comes to.
+struct Outcome {
+    std::string reports = {};
+    zarvo_code code = ZARVO_OK;
+    uint64_t files = 0;
+    uint64_t failures = 0;
+
+    friend bool operator==(const Outcome&, const Outcome&) = default;
+    friend std::ostream& operator<<(std::ostream& out, const Outcome& outcome) {
+        return out << "code " << outcome.code << ", " << outcome.files << " files, " << outcome.failures
+                   << " failures\n"
+                   << outcome.reports;
+    }
+};
+
+struct Settings {
+    uint32_t threads = 2;
+    int32_t overwrite = ZARVO_OVERWRITE_ALWAYS;
+    int32_t keepBroken = 0;
+    int32_t dryRun = 0;
+    uint64_t strip = 0;
+    uint64_t memory = 0;
+    zarvo_patterns* wanted = nullptr;
+};
+
+struct ReportContext {
+    const zarvo_archive* archive;
+    std::string lines = {};
+};
+
+void AddReport(void* given, const zarvo_report* report) {
+    auto& context = *static_cast<ReportContext*>(given);
+    zarvo_entry entry = ZARVO_ENTRY_INIT;
+    EXPECT_EQ(ZARVO_OK, zarvo_get_entry(context.archive, report->index, &entry));
+    const char* const words[] = {"", " kept", ": "};
+    context.lines += std::string(entry.path) + words[report->outcome] + report->text + "\n";
+}
+
+Outcome Extract(const std::string& bytes, const std::string& folder, const Settings& settings = {}) {
+    const zarvo::archive archive = OpenBytes(bytes);
+    ReportContext context{archive.get()};
+    zarvo_run_options run = ZARVO_RUN_OPTIONS_INIT;
+    run.threads = settings.threads;
+    run.memory = settings.memory;
+    run.wanted = settings.wanted;
+    run.context = &context;
+    zarvo_extract_options how = ZARVO_EXTRACT_OPTIONS_INIT;
+    how.overwrite = settings.overwrite;
+    how.keep_broken = settings.keepBroken;
+    how.dry_run = settings.dryRun;
+    how.strip = settings.strip;
+    how.report = AddReport;
+    zarvo_summary summary = ZARVO_SUMMARY_INIT;
+    Outcome outcome;
+    outcome.code = zarvo_extract(archive.get(), folder.c_str(), &run, &how, &summary, nullptr);
+    outcome.reports = context.lines;
+    outcome.files = summary.files;
+    outcome.failures = summary.failures;
+    return outcome;
+}
+
+std::string Archive(std::vector<ArchiveEntry> entries, CompressionType type = kCompressionLz4) {
+    return BuildArchive({.entries = std::move(entries), .type = type}).bytes;
+}
+
+// Files of all sizes, in folders, with the units' size in reach; some are empty, some hold several units.
+std::vector<ArchiveEntry> ManyFiles(unsigned seed) {
+    std::mt19937 random(seed);
+    const std::string text = SampleText(3'000'000);
+    std::vector<ArchiveEntry> entries;
+    for (int number = 0; number < 40; ++number) {
+        const size_t sizes[] = {0, 10, 5'000, 50'000};
+        const size_t size = number == 20 ? 1'300'000 : sizes[random() % 4];
+        const std::string folder = "f" + std::to_string(random() % 5) + "/g" + std::to_string(random() % 3) + "/";
+        entries.push_back({.path = folder + std::to_string(number), .bytes = text.substr(random() % 1'000'000, size)});
+    }
+    return entries;
+}
+
+} // namespace
+
+TEST(Extraction, WritesEveryFormWithAnyNumberOfThreads) {
+    const std::vector<ArchiveEntry> entries = ManyFiles(3);
+    Tree expected;
+    for (const ArchiveEntry& entry : entries) {
+        expected[entry.path] = entry.bytes;
+        for (fs::path above = fs::path(entry.path).parent_path(); !above.empty(); above = above.parent_path())
+            expected[above] = "/";
+    }
+    const struct {
+        const char* what;
+        ArchiveDescription form;
+    } cases[] = {
+        {"stored", {}},
+        {"LZ4", {.type = kCompressionLz4}},
+        {"LZ4 in tiny blocks", {.chunkSize = 1'000, .type = kCompressionLz4}},
+        {"LZMA", {.type = kCompressionLzma}},
+        {"LZMA streams", {.chunkSize = 3'000'000, .type = kCompressionLzma, .streamed = true}},
+        {"web", {.layout = ArchiveLayout::kWeb}},
+        {"raw", {.layout = ArchiveLayout::kRaw}},
+    };
+    for (const auto& row : cases) {
+        ArchiveDescription description = row.form;
+        description.entries = entries;
+        const std::string bytes = BuildArchive(description).bytes;
+        for (const uint32_t threads : {1u, 2u, 8u}) {
+            SCOPED_TRACE(std::string(row.what) + ", threads " + std::to_string(threads));
+            const TemporaryFolder folder;
+            const Outcome outcome = Extract(bytes, folder / "out/put", {.threads = threads});
+            EXPECT_EQ(ZARVO_OK, outcome.code);
+            EXPECT_EQ(entries.size(), outcome.files);
+            EXPECT_EQ(0u, outcome.failures);
+            EXPECT_EQ(true, expected == TreeOf(folder / "out/put"));
+        }
+    }
+}
+
+// Random damage: what is told, and what is on the disk, is the same for any number of threads, and agrees with what
+// tests, visits and reads say.
+TEST(Extraction, DamageIsToldAlikeByAllAndForAnyThreads) {
+    std::mt19937 random(5);
+    for (const CompressionType type : {kCompressionLz4, kCompressionLzma}) {
+        for (const bool isStreamed : {false, type == kCompressionLzma}) {
+            SCOPED_TRACE(std::to_string(type) + (isStreamed ? " streamed" : ""));
+            std::string bytes = BuildArchive({.entries = ManyFiles(7),
+                                              .chunkSize = isStreamed ? 3'000'000u : 131'072u,
+                                              .type = type,
+                                              .streamed = isStreamed})
+                                    .bytes;
+            for (int flip = 0; flip < (type == kCompressionLz4 ? 100 : 6); ++flip)
+                bytes[bytes.size() / 8 + random() % (bytes.size() / 8 * 7)] ^= static_cast<char>(1 << random() % 8);
+            zarvo::archive archive = OpenBytes(bytes);
+
+            std::map<uint64_t, uint64_t> damaged;
+            zarvo_run_options run = ZARVO_RUN_OPTIONS_INIT;
+            run.context = &damaged;
+            zarvo_test_options test = ZARVO_TEST_OPTIONS_INIT;
+            test.entry = [](void* context, uint64_t index, uint64_t readable) {
+                (*static_cast<std::map<uint64_t, uint64_t>*>(context))[index] = readable;
+            };
+            ASSERT_EQ(ZARVO_OK, zarvo_test(archive.get(), &run, &test, nullptr, nullptr));
+            EXPECT_NE(0u, damaged.size());
+            for (const zarvo::entry entry : archive.entries()) {
+                const bool isDamaged = damaged.contains(entry.index());
+                EXPECT_EQ(isDamaged ? damaged[entry.index()] : entry.size(), *archive.readable(entry.index()))
+                    << entry.path();
+            }
+
+            Outcome first;
+            Tree firstTree;
+            for (const uint32_t threads : {1u, 8u}) {
+                const TemporaryFolder folder;
+                const Outcome outcome = Extract(bytes, folder.Path(), {.threads = threads, .keepBroken = 1});
+                EXPECT_EQ(damaged.size(), outcome.failures);
+                const Tree tree = TreeOf(folder.Path());
+                for (const auto& [index, readable] : damaged)
+                    EXPECT_EQ(readable, tree.at(std::string(archive.entries()[index].path())).size()) << index;
+                if (threads == 1) {
+                    first = outcome;
+                    firstTree = tree;
+                }
+                EXPECT_EQ(first, outcome);
+                EXPECT_EQ(true, firstTree == tree);
+            }
+        }
+    }
+}
+
+TEST(Extraction, VisitHandsOverEachFileInOrder) {
+    struct Seen {
+        std::mutex lock;
+        std::map<uint64_t, std::string> bytes;
+    };
+    const std::vector<ArchiveEntry> entries = ManyFiles(9);
+    for (const bool isStreamed : {false, true}) {
+        const std::string bytes = BuildArchive({.entries = entries,
+                                                .chunkSize = isStreamed ? 0u : 131'072u,
+                                                .type = kCompressionLzma,
+                                                .streamed = isStreamed})
+                                      .bytes;
+        const zarvo::archive archive = OpenBytes(bytes);
+        Seen seen;
+        zarvo_run_options run = ZARVO_RUN_OPTIONS_INIT;
+        run.threads = 4;
+        run.context = &seen;
+        zarvo_visit_options visit = ZARVO_VISIT_OPTIONS_INIT;
+        visit.bytes = [](void* context, uint64_t index, uint64_t offset, const void* data, size_t size) {
+            auto& given = *static_cast<Seen*>(context);
+            std::lock_guard lock(given.lock);
+            EXPECT_EQ(given.bytes[index].size(), offset);
+            given.bytes[index].append(static_cast<const char*>(data), size);
+        };
+        ASSERT_EQ(ZARVO_OK, zarvo_visit(archive.get(), &run, &visit, nullptr, nullptr));
+        for (size_t index = 0; index < entries.size(); ++index)
+            EXPECT_EQ(true, entries[index].bytes == seen.bytes[index]) << index;
+    }
+}
+
+TEST(Extraction, PathsAreRefusedSettledAndStripped) {
+    const std::string bytes = Archive({{.path = "/a/b", .bytes = "1"},
+                                       {.path = "../x", .bytes = "2"},
+                                       {.path = "a\\b", .bytes = "3"},
+                                       {.path = "a/b/c", .bytes = "4"},
+                                       {.path = "d", .flags = kFolderEntry},
+                                       {.path = "d", .bytes = "5"},
+                                       {.path = "d/e", .bytes = "6"},
+                                       {.path = ".", .bytes = "7"},
+                                       {.path = "f/", .bytes = "8"}});
+    {
+        const TemporaryFolder folder;
+        EXPECT_EQ((Outcome{.reports = "../x: the path has a component \"..\"\n"
+                                      "a\\b\n"
+                                      "a/b/c: an entry before it in the archive has its place\n"
+                                      "d\n"
+                                      "d: an entry before it in the archive has its place\n"
+                                      "d/e\n"
+                                      ".: the path is empty\n"
+                                      "f/: the path of a file ends with a separator\n",
+                           .files = 2,
+                           .failures = 5}),
+                  Extract(bytes, folder / "out"));
+        EXPECT_EQ((Tree{{"a", "/"}, {"a/b", "3"}, {"d", "/"}, {"d/e", "6"}}), TreeOf(folder / "out"));
+    }
+    {
+        const TemporaryFolder folder;
+        EXPECT_EQ((Outcome{.reports = "../x: the path has a component \"..\"\n"
+                                      "a\\b\n"
+                                      "a/b/c: an entry before it in the archive has its place\n"
+                                      "d/e\n"
+                                      ".: the path is empty\n"
+                                      "f/: the path of a file ends with a separator\n",
+                           .files = 2,
+                           .failures = 4}),
+                  Extract(bytes, folder / "out", {.strip = 1}));
+        EXPECT_EQ((Tree{{"b", "3"}, {"e", "6"}}), TreeOf(folder / "out"));
+    }
+}
+
+TEST(Extraction, DryRunReportsAndWritesNothing) {
+    const TemporaryFolder folder;
+    EXPECT_EQ((Outcome{.reports = "a/b\nc\n..: the path has a component \"..\"\n", .files = 2, .failures = 1}),
+              Extract(Archive({{.path = "a/b", .bytes = "1"}, {.path = "c"}, {.path = ".."}}), folder / "out",
+                      {.dryRun = 1}));
+    EXPECT_EQ(Tree{}, TreeOf(folder.Path()));
+}
+
+TEST(Extraction, WhatIsThereIsReplacedKeptOrAFailure) {
+    const std::string bytes = Archive({{.path = "a", .bytes = "new"}, {.path = "b"}, {.path = "c", .bytes = "new"}});
+    const struct {
+        int32_t overwrite;
+        Outcome outcome;
+        Tree tree;
+    } cases[] = {
+        {.overwrite = ZARVO_OVERWRITE_ALWAYS,
+         .outcome = {.reports = "a\nb\nc\n", .files = 3},
+         .tree = {{"a", "new"}, {"b", ""}, {"c", "new"}, {"linked", "old"}}},
+        {.overwrite = ZARVO_OVERWRITE_NEVER,
+         .outcome = {.reports = "a kept\nb kept\nc\n", .files = 1},
+         .tree = {{"a", "old"}, {"b", "-> linked"}, {"c", "new"}, {"linked", "old"}}},
+        {.overwrite = ZARVO_OVERWRITE_FAIL,
+         .outcome = {.reports = "a: File exists\nb: File exists\nc\n", .files = 1, .failures = 2},
+         .tree = {{"a", "old"}, {"b", "-> linked"}, {"c", "new"}, {"linked", "old"}}},
+    };
+    for (const auto& row : cases) {
+        SCOPED_TRACE(row.overwrite);
+        const TemporaryFolder folder;
+        WriteFile(folder / "linked", "old");
+        fs::create_hard_link(folder / "linked", folder / "a");
+        fs::create_symlink("linked", folder / "b");
+        EXPECT_EQ(row.outcome, Extract(bytes, folder.Path(), {.overwrite = row.overwrite}));
+        EXPECT_EQ(row.tree, TreeOf(folder.Path()));
+    }
+}
+
+// Nothing leaves the folder by a link, and what is no file is never opened.
+TEST(Extraction, LinksAndOddThingsAreNeverFollowed) {
+    const TemporaryFolder folder;
+    fs::create_directories(folder / "out");
+    fs::create_directories(folder / "elsewhere");
+    WriteFile(folder / "secret", "secret");
+    fs::create_symlink("../elsewhere", folder / "out/folder");
+    fs::create_symlink("../secret", folder / "out/file");
+    fs::create_symlink("nowhere", folder / "out/dangling");
+    fs::create_directories(folder / "out/standing");
+    ASSERT_EQ(0, mkfifo((folder / "out/pipe").c_str(), 0600));
+    const std::string notAFolder = "Not a directory: a link is in the place of a folder\n";
+    EXPECT_EQ((Outcome{.reports = "folder/a: " + notAFolder + "folder: " + notAFolder + "file\ndangling\n" +
+                                  "standing: Is a directory: a folder is in the place of a file\npipe\n" +
+                                  "pipe/x: an entry before it in the archive has its place\n",
+                       .files = 3,
+                       .failures = 4}),
+              Extract(Archive({{.path = "folder/a", .bytes = "1"},
+                               {.path = "folder", .flags = kFolderEntry},
+                               {.path = "file", .bytes = "2"},
+                               {.path = "dangling", .bytes = "3"},
+                               {.path = "standing", .bytes = "4"},
+                               {.path = "pipe", .bytes = "5"},
+                               {.path = "pipe/x", .bytes = "6"}}),
+                      folder / "out"));
+    EXPECT_EQ((Tree{{"elsewhere", "/"},
+                    {"out", "/"},
+                    {"out/dangling", "3"},
+                    {"out/file", "2"},
+                    {"out/folder", "-> ../elsewhere"},
+                    {"out/pipe", "5"},
+                    {"out/standing", "/"},
+                    {"secret", "secret"}}),
+              TreeOf(folder.Path()));
+}
+
+// Paths longer than the system takes at once, and a component that it does not take at all.
+TEST(Extraction, LongPathsWorkAndLongComponentsFail) {
+    std::string deep;
+    for (int level = 0; level < 30; ++level)
+        deep += std::string(200, 'd') + "/";
+    const TemporaryFolder folder;
+    const Outcome outcome =
+        Extract(Archive({{.path = deep + "file", .bytes = "1"}, {.path = std::string(300, 'n'), .bytes = "2"}}),
+                folder / "out");
+    EXPECT_EQ((Outcome{.reports = deep + "file\n" + std::string(300, 'n') + ": File name too long\n",
+                       .files = 1,
+                       .failures = 1}),
+              outcome);
+    int descriptor = open((folder / "out").c_str(), O_PATH);
+    for (int level = 0; level < 30; ++level) {
+        const int next = openat(descriptor, std::string(200, 'd').c_str(), O_PATH);
+        close(descriptor);
+        descriptor = next;
+    }
+    const int file = openat(descriptor, "file", O_RDONLY);
+    char byte = 0;
+    EXPECT_EQ(1, read(file, &byte, 1));
+    EXPECT_EQ('1', byte);
+    close(file);
+    close(descriptor);
+}
+
+TEST(Extraction, ArchiveInItsOwnFolderIsNotReplaced) {
+    const TemporaryFolder folder;
+    WriteFile(folder / "archive", Archive({{.path = "archive", .bytes = "1"}, {.path = "b", .bytes = "2"}}));
+    zarvo::archive archive = *zarvo::archive::open(folder / "archive");
+    zarvo_summary summary = ZARVO_SUMMARY_INIT;
+    EXPECT_EQ(ZARVO_OK, zarvo_extract(archive.get(), folder.Path().c_str(), nullptr, nullptr, &summary, nullptr));
+    EXPECT_EQ(1u, summary.files);
+    EXPECT_EQ(1u, summary.failures);
+    EXPECT_EQ("2", ReadFile(folder / "b"));
+}
+
+// A block that the budget can't hold is streamed where its kind allows it, and an error of its files where not.
+TEST(Extraction, MemoryBudgetIsKept) {
+    const std::string text = SampleText(3'000'000);
+    for (const CompressionType type : {kCompressionLzma, kCompressionLz4}) {
+        const TemporaryFolder folder;
+        const std::string bytes =
+            BuildArchive({.entries = {{.path = "a", .bytes = text}}, .chunkSize = 0, .type = type}).bytes;
+        const Outcome outcome = Extract(bytes, folder / "out", {.memory = 4'000'000});
+        const std::string refusal = "a: block 0 takes 3000000 bytes of memory, and the limit is 2000000\n";
+        EXPECT_EQ(type == kCompressionLzma ? "a\n" : refusal, outcome.reports);
+    }
+}
+
+TEST(Extraction, FolderThatCantBeMadeEndsTheRun) {
+    const TemporaryFolder folder;
+    WriteFile(folder / "file", "");
+    EXPECT_EQ((Outcome{.code = ZARVO_ERROR_SYSTEM}), Extract(Archive({{.path = "a"}}), folder / "file/out"));
+}
+
+// A file that is larger than it may be is an entry's failure, and leaves nothing behind.
+TEST(Extraction, FileTooLargeForTheLimitLeavesNothing) {
+    const TemporaryFolder folder;
+    const std::string text = SampleText(3'000'000);
+    const std::string bytes = Archive(
+        {{.path = "a", .bytes = text.substr(0, 1'000)}, {.path = "b", .bytes = text}, {.path = "c", .bytes = "1"}});
+    signal(SIGXFSZ, SIG_IGN);
+    const rlimit limited = {2'000'000, RLIM_INFINITY};
+    ASSERT_EQ(0, setrlimit(RLIMIT_FSIZE, &limited));
+    const Outcome outcome = Extract(bytes, folder / "out");
+    const rlimit unlimited = {RLIM_INFINITY, RLIM_INFINITY};
+    ASSERT_EQ(0, setrlimit(RLIMIT_FSIZE, &unlimited));
+    EXPECT_EQ((Outcome{.reports = "a\nb: File too large\nc\n", .files = 2, .failures = 1}), outcome);
+    EXPECT_EQ((Tree{{"a", text.substr(0, 1'000)}, {"c", "1"}}), TreeOf(folder / "out"));
+}
+
+// The run waits for its first look at the progress, which stops it: nothing is half there.
+TEST(Extraction, ProgressStopsTheRun) {
+    struct WaitingSource final : zarvo::source {
+        explicit WaitingSource(std::string served) : bytes(std::move(served)) {}
+
+        int64_t read_at(std::span<std::byte> buffer, uint64_t offset) override {
+            isHeld.wait(true);
+            const size_t start = std::min<uint64_t>(offset, bytes.size());
+            const size_t count = std::min(buffer.size(), bytes.size() - start);
+            memcpy(buffer.data(), bytes.data() + start, count);
+            return static_cast<int64_t>(count);
+        }
+        int64_t size() override { return static_cast<int64_t>(bytes.size()); }
+
+        std::string bytes;
+        std::atomic<bool> isHeld = false;
+    };
+    auto source = std::make_unique<WaitingSource>(BuildArchive({.entries = ManyFiles(1)}).bytes);
+    WaitingSource& held = *source;
+    const zarvo::archive archive = *zarvo::archive::open(std::move(source));
+    held.isHeld = true;
+    zarvo_run_options run = ZARVO_RUN_OPTIONS_INIT;
+    run.context = &held;
+    run.progress = [](void* context, const zarvo_progress*) {
+        std::atomic<bool>& isHeld = static_cast<WaitingSource*>(context)->isHeld;
+        isHeld = false;
+        isHeld.notify_all();
+        return 1;
+    };
+    const TemporaryFolder folder;
+    EXPECT_EQ(ZARVO_ERROR_STOPPED,
+              zarvo_extract(archive.get(), (folder / "out").c_str(), &run, nullptr, nullptr, nullptr));
+    for (const auto& [name, text] : TreeOf(folder / "out"))
+        EXPECT_EQ(std::string::npos, name.find(".zarvo-")) << name;
+}

@@ -1,0 +1,129 @@
+// The manual page and the completions, held to the table of options and to the sources.
+#include "Tests/Tools/Zarvo/ZarvoTest.h"
+#include "Tools/Zarvo/Options.h"
+
+#include <regex>
+#include <set>
+
+namespace {
+
+const std::string kRoot = VARNEX_SOURCE_DIR "/";
+
+// The first group of every match.
+std::vector<std::string> FindAll(const std::string& text, const char* pattern) {
+    const std::regex regex(pattern);
+    return {std::sregex_token_iterator(text.begin(), text.end(), regex, 1), std::sregex_token_iterator()};
+}
+
+std::string ReadManualSection(const std::string& name) {
+    const std::string manual = ReadFile(kRoot + "man/zarvo.1");
+    const size_t from = manual.find("\n.SH " + name + "\n");
+    return from == std::string::npos ? "" : manual.substr(from, manual.find("\n.SH ", from + 1) - from);
+}
+
+// The text of a line of arguments: a macro that changes fonts joins them, and mark, when there is one, stands for those
+// that vary, which have no quotes.
+std::string ReadManualLine(const std::string& line, const std::string& mark = "") {
+    std::string text;
+    for (std::string argument : FindAll(line, "(\"[^\"]*\"|\\S+)")) {
+        const bool isQuoted = argument[0] == '"';
+        if (isQuoted) argument = argument.substr(1, argument.size() - 2);
+        text += isQuoted || mark.empty() ? argument : mark;
+    }
+    text = std::regex_replace(text, std::regex("\\\\-"), "-");
+    return std::regex_replace(text, std::regex("\\\\\\(aq"), "'");
+}
+
+TEST(ZarvoManual, HasTheOptionsOfTheHelp) {
+    std::set<std::string> listed, known;
+    for (const std::string& line : FindAll(ReadManualSection("OPTIONS"), "\n\\.TP\n\\.BI? ([^\n]*)"))
+        listed.insert(ReadManualLine(line));
+    std::vector<const Subcommand*> subcommands(GetSubcommands().begin(), GetSubcommands().end());
+    subcommands.push_back(&kNoSubcommand);
+    for (const Subcommand* const subcommand : subcommands)
+        for (const Option* const option : subcommand->options)
+            known.insert(DescribeOption(*option));
+    EXPECT_EQ(known, listed);
+    EXPECT_LT(8u, known.size());
+}
+
+TEST(ZarvoManual, HasEverySubcommand) {
+    std::vector<std::string> known;
+    for (const Subcommand* const subcommand : GetSubcommands())
+        known.emplace_back(subcommand->name);
+    EXPECT_EQ(known, FindAll(ReadManualSection("SYNOPSIS"), "\n\\.B zarvo (\\w+)"));
+    EXPECT_EQ(known, FindAll(ReadManualSection("DESCRIPTION"), "\n\\.SS zarvo (\\w+)"));
+}
+
+// The library's sources for what no subcommand does.
+const std::set<std::string> kUncalled = {"ArchiveRun", "Extraction", "OutputFolder", "OutputPlan"};
+
+// A message's fixed texts, with "%" for what varies: in the sources a literal, in the manual page words in turns.
+TEST(ZarvoManual, HasTheMessagesOfTheSources) {
+    std::string code;
+    for (const char* const folder : {"Tools/Zarvo", "Library"})
+        for (const auto& entry : fs::directory_iterator(kRoot + folder))
+            if (entry.path().extension() == ".cpp" && !kUncalled.contains(entry.path().stem()))
+                code += ReadFile(entry.path());
+    code = std::regex_replace(code, std::regex("\"\\s+\""), "");
+    std::set<std::string> said, explained;
+    for (const std::string& form : FindAll(code, "\\b(?:MakeMessage|Set|SetSystem|SetDamaged)\\([^\"();]*\"([^\"]*)\""))
+        said.insert(std::regex_replace(form, std::regex("%(s|u|llu)"), "%"));
+    for (const std::string& line : FindAll(ReadManualSection("MESSAGES"), "\n\\.BI ([^\n]*)")) {
+        const std::string text = ReadManualLine(line, "%");
+        EXPECT_TRUE(explained.insert(text).second) << text << " is there twice";
+    }
+    // Forms that others fill in, and what only programs that call the library hear.
+    for (const char* const text :
+         {"%", "%: %", "no such entry", "the offset is past the end", "a read delivered more than was asked"})
+        EXPECT_EQ(1u, said.erase(text)) << text;
+    EXPECT_EQ(said, explained);
+}
+
+class ZarvoCompletionsTest : public ZarvoTest {
+protected:
+    // What a line ends in after a press of the tabulator, in a bash without a terminal.
+    static std::string Complete(const std::string& words) {
+        return RunProgram("/bin/bash",
+                          {"-c", "source <('" ZARVO_COMPLETIONS "' bash); compopt() { :; }; COMP_WORDS=(" + words +
+                                     "); COMP_CWORD=$((${#COMP_WORDS[@]} - 1)); _zarvo; echo -n \"${COMPREPLY[*]}\""})
+            .second;
+    }
+};
+
+TEST_F(ZarvoCompletionsTest, OfBashFollowTheSubcommand) {
+    const std::pair<const char*, const char*> kCases[] = {
+        {"zarvo ''", "list info cat"},
+        {"zarvo li", "list"},
+        {"zarvo -q c", "cat"},
+        {"zarvo --v", "--version"},
+        {"zarvo list --j", "--json"},
+        {"zarvo cat --j", ""},
+        {"zarvo cat info --f", "--files-from"},
+        {"zarvo --progress ''", "auto always never"},
+        {"zarvo list --progress = al", "always"},
+        {"zarvo list --progress =", "auto always never"},
+        {"zarvo list -j ''", ""},
+        {"zarvo list -- --j", ""},
+    };
+    for (const auto& [words, completions] : kCases)
+        EXPECT_EQ(completions, Complete(words)) << words;
+}
+
+TEST_F(ZarvoCompletionsTest, OfEveryShellHaveEveryOption) {
+    for (const std::string shell : {"bash", "zsh", "fish"}) {
+        const auto [status, text] = RunProgram(ZARVO_COMPLETIONS, {shell});
+        EXPECT_EQ(0, status);
+        for (const Subcommand* const subcommand : GetSubcommands())
+            for (const Option* const option : subcommand->options) {
+                std::string form =
+                    option->name.empty() ? std::string("-") + option->letter : "--" + std::string(option->name);
+                if (shell == "fish")
+                    form =
+                        option->name.empty() ? std::string("-s ") + option->letter : "-l " + std::string(option->name);
+                EXPECT_NE(std::string::npos, text.find(form)) << shell << " lacks " << form;
+            }
+    }
+}
+
+} // namespace

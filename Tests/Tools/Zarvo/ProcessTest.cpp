@@ -1,0 +1,86 @@
+// The command as a process: its standard descriptors, signals and terminals.
+#include "Tests/Tools/Zarvo/ZarvoTest.h"
+
+namespace {
+
+class ZarvoProcess : public ZarvoTest {
+protected:
+    ZarvoProcess() { signal(SIGPIPE, SIG_DFL); }
+
+    // Runs a line of shell with the command as $Z; standard output and error together.
+    static Transcript Shell(const std::string& line) {
+        return RunProgram("/bin/bash", {"-c", "Z='" VARNEX_BINARY "'; " + line});
+    }
+    // An archive whose list is larger than a pipe and the command's buffer.
+    static void MakeLongArchive() {
+        ArchiveDescription archive;
+        for (int index = 0; index < 40'000; ++index)
+            archive.entries.push_back({.path = "a folder/a file of number " + std::to_string(index)});
+        MakeArchive("long.zarvo", archive);
+    }
+};
+
+TEST_F(ZarvoProcess, FailsWhereItsDescriptorsDo) {
+    MakeArchive("a.zarvo", Archive("a:x d|"));
+    MakeArchive("empty.zarvo", {});
+    const struct {
+        const char* line;
+        Transcript heard;
+    } kCases[] = {
+        {"$Z list a.zarvo >/dev/full", {1, "zarvo: standard output: No space left on device\n"}},
+        {"$Z list a.zarvo >&-", {1, "zarvo: standard output: Bad file descriptor\n"}},
+        {"$Z cat a.zarvo a >&-", {1, "zarvo: standard output: Bad file descriptor\n"}},
+        {"$Z info a.zarvo <&- >/dev/full", {1, "zarvo: standard output: No space left on device\n"}},
+        {"$Z --help >/dev/full", {1, "zarvo: standard output: No space left on device\n"}},
+        {"$Z list --files-from=- a.zarvo <&-", {1, "zarvo: standard input: Bad file descriptor\n"}},
+        {"$Z cat a.zarvo d >&-", {0, ""}},
+        {"$Z list empty.zarvo >/dev/full", {0, ""}},
+        {"$Z list none >/dev/full", {2, "zarvo: none: No such file or directory\n"}},
+        {"$Z list none 2>&-", {2, ""}},
+        {"$Z list none 2>/dev/full", {2, ""}},
+    };
+    for (const auto& [line, heard] : kCases)
+        EXPECT_EQ(heard, Shell(line)) << line;
+}
+
+TEST_F(ZarvoProcess, EndsSilentlyWhenNobodyReadsOn) {
+    MakeLongArchive();
+    EXPECT_EQ(Transcript(141, ""), Shell("$Z list long.zarvo | true; exit ${PIPESTATUS[0]}"));
+    EXPECT_EQ(Transcript(1, ""), Shell("trap '' PIPE; $Z list long.zarvo | true; exit ${PIPESTATUS[0]}"));
+}
+
+TEST_F(ZarvoProcess, EndsByTheSignalThatEndsIt) {
+    MakeLongArchive();
+    // A shell's background processes ignore SIGINT. The signal comes when the pipe is full and the command waits.
+    const std::string
+        start = "mkfifo pipe; exec 9<>pipe; env --default-signal $Z list long.zarvo >&9 9>&- & ",
+        wait = "until [[ $(</proc/$!/comm) == zarvo && $(cut -d' ' -f3 /proc/$!/stat) == S ]]; do sleep 0.01; "
+               "done; ";
+    for (const char* const name : {"INT", "TERM"}) {
+        const auto [status, text] =
+            Shell(start + wait + "sleep 0.1; kill -" + name + " $!; wait $!; status=$?; rm pipe; exit $status");
+        EXPECT_EQ(128 + (std::string(name) == "INT" ? SIGINT : SIGTERM), status) << text;
+        EXPECT_EQ("zarvo: ended by SIG" + std::string(name) + " after 65536 bytes of results\n", text);
+    }
+}
+
+TEST_F(ZarvoProcess, EscapesWhatGoesToATerminal) {
+    MakeArchive("a.zarvo", {.entries = {{.path = "a\x1b"}}});
+    EXPECT_EQ(Transcript(0, "a\\x1b\r\n"), Shell("script -qec \"$Z list a.zarvo\" /dev/null </dev/null"));
+}
+
+TEST_F(ZarvoProcess, ShowsProgressOnATerminalAndWipesIt) {
+    MakeArchive("a.zarvo", Archive("a:x"));
+    // The reader waits before it takes the first bytes, so the run takes long enough.
+    MakeArchive("big.zarvo", Archive("stored a:z1000000 b:z1000000 c:z1000000"));
+    const std::string slowly = " | (sleep 0.5; cat >/dev/null)\" /dev/null </dev/null";
+    const auto [status, text] = Shell("script -qec \"$Z cat big.zarvo '**'" + slowly);
+    EXPECT_EQ(0, status);
+    EXPECT_EQ(0u, text.find("\r\x1b[K")) << text;
+    EXPECT_NE(std::string::npos, text.find(" files, ")) << text;
+    EXPECT_TRUE(text.ends_with("\r\x1b[K")) << text;
+    EXPECT_EQ(Transcript(0, ""), Shell("script -qec \"$Z cat -q big.zarvo '**'" + slowly));
+    EXPECT_EQ(Transcript(0, ""), Shell("script -qec \"$Z cat --progress=never big.zarvo '**'" + slowly));
+}
+
+} // namespace

@@ -1,0 +1,193 @@
+#include "Tools/Zarvo/Arguments.h"
+
+#include "Tools/Zarvo/Text.h"
+
+#include <CLI/CLI.hpp>
+#include <algorithm>
+#include <charconv>
+#include <limits>
+
+namespace {
+
+bool IsOption(std::string_view argument) { return argument.size() > 1 && argument[0] == '-'; }
+
+const Option* FindOption(const Subcommand& subcommand, std::string_view name) {
+    for (const Option* const option : subcommand.options)
+        if (!name.empty() && option->name == name) return option;
+    return nullptr;
+}
+
+const Option* FindOption(const Subcommand& subcommand, char letter) {
+    for (const Option* const option : subcommand.options)
+        if (option->letter == letter) return option;
+    return nullptr;
+}
+
+// Whether the argument after this one, which is an option, is its value.
+bool TakesNext(const Subcommand& subcommand, std::string_view argument) {
+    if (argument.starts_with("--")) {
+        const Option* const option = FindOption(subcommand, argument.substr(2));
+        return option != nullptr && !option->value.empty();
+    }
+    for (size_t index = 1; index < argument.size(); ++index) {
+        const Option* const option = FindOption(subcommand, argument[index]);
+        if (option != nullptr && !option->value.empty()) return index + 1 == argument.size();
+    }
+    return false;
+}
+
+// The index of the first argument that is neither an option nor an option's value; their number if there is none.
+size_t FindOperand(const Subcommand& subcommand, const std::vector<std::string>& arguments) {
+    for (size_t index = 0; index < arguments.size(); ++index) {
+        if (arguments[index] == "--") return index + 1;
+        if (!IsOption(arguments[index])) return index;
+        if (TakesNext(subcommand, arguments[index])) ++index;
+    }
+    return arguments.size();
+}
+
+// Which of two subcommands an option before it belongs to is not known before the subcommand is: "-l" may take a value.
+// So each one is tried: the first operand has to be its name, which is then taken out.
+const Subcommand& TakeSubcommand(std::vector<std::string>& arguments) {
+    for (const Subcommand* const subcommand : GetSubcommands()) {
+        const size_t index = FindOperand(*subcommand, arguments);
+        if (index >= arguments.size() || arguments[index] != subcommand->name) continue;
+        arguments.erase(arguments.begin() + static_cast<std::ptrdiff_t>(index));
+        return *subcommand;
+    }
+    return kNoSubcommand;
+}
+
+// CLI11 takes "--name=" for an option whose value is the next argument, and gives flags values: so "--name=value"
+// becomes two arguments before it sees them. Returns what is wrong, if anything is.
+std::string SplitAssignments(const Subcommand& subcommand, std::vector<std::string>& arguments) {
+    std::vector<std::string> split;
+    for (size_t index = 0; index < arguments.size(); ++index) {
+        const std::string& argument = arguments[index];
+        if (argument == "--") {
+            split.insert(split.end(), arguments.begin() + static_cast<std::ptrdiff_t>(index), arguments.end());
+            break;
+        }
+        const size_t mark = argument.starts_with("--") ? argument.find('=') : std::string::npos;
+        const Option* const option = mark == std::string::npos
+                                         ? nullptr
+                                         : FindOption(subcommand, std::string_view(argument).substr(2, mark - 2));
+        if (option != nullptr) {
+            if (option->value.empty()) return MakeMessage("% takes no value", {argument.substr(0, mark)});
+            split.insert(split.end(), {argument.substr(0, mark), argument.substr(mark + 1)});
+            continue;
+        }
+        split.push_back(argument);
+        if (IsOption(argument) && TakesNext(subcommand, argument)) {
+            if (++index == arguments.size()) return MakeMessage("% needs a value", {argument});
+            split.push_back(arguments[index]);
+        }
+    }
+    arguments = std::move(split);
+    return "";
+}
+
+// What is wrong with a value, if anything is.
+std::string CheckValue(const Option& option, const std::string& value) {
+    const std::string name = DescribeOption(option);
+    if (option.kind == ValueKind::kSize && !ParseSize(value))
+        return MakeMessage("%: '%' is no size, such as 64M", {name, value});
+    if (option.kind == ValueKind::kCount) {
+        unsigned count = 0;
+        const auto [end, error] = std::from_chars(value.data(), value.data() + value.size(), count);
+        if (error != std::errc() || end != value.data() + value.size() || count == 0)
+            return MakeMessage("%: '%' is no number from 1 on", {name, value});
+    }
+    const std::string choices = '|' + std::string(option.choices) + '|';
+    if (option.kind == ValueKind::kChoice &&
+        (value.find('|') != std::string::npos || choices.find('|' + value + '|') == std::string::npos))
+        return MakeMessage("%: '%' is none of %", {name, value, option.choices});
+    return "";
+}
+
+} // namespace
+
+std::optional<unsigned long long> ParseSize(std::string_view text) {
+    constexpr std::string_view kUnits = "KMG";
+    unsigned long long number = 0;
+    const char* const end = text.data() + text.size();
+    const auto [unit, error] = std::from_chars(text.data(), end, number);
+    if (error != std::errc() || number == 0 || end - unit > 1) return std::nullopt;
+    const size_t place = unit == end ? 0 : kUnits.find(*unit) + 1; // npos + 1 is 0, too
+    if (unit != end && place == 0) return std::nullopt;
+    if (number > std::numeric_limits<unsigned long long>::max() >> (10 * place)) return std::nullopt;
+    return number << (10 * place);
+}
+
+std::optional<Arguments> Arguments::Parse(const std::vector<std::string>& arguments, const Subcommand** subcommand,
+                                          std::string* complaint) {
+    std::vector<std::string> rest = arguments;
+    *subcommand = &TakeSubcommand(rest);
+    Arguments parsed(**subcommand);
+    *complaint = SplitAssignments(**subcommand, rest);
+    if (!complaint->empty()) return std::nullopt;
+
+    // Neither operands nor subcommands are CLI11's: it would split an operand "[a,b]", and take an archive named "list"
+    // for a subcommand. What it leaves over are operands, unknown options and the first "--".
+    CLI::App app;
+    app.set_help_flag();
+    app.allow_extras();
+    std::vector<std::pair<const Option*, const CLI::Option*>> known;
+    for (const Option* const option : (*subcommand)->options) {
+        std::string names;
+        if (option->letter != 0) names = {'-', option->letter};
+        if (!option->name.empty()) names += (names.empty() ? "--" : ",--") + std::string(option->name);
+        CLI::Option* const made = option->value.empty() ? app.add_flag(names) : app.add_option(names);
+        made->multi_option_policy(CLI::MultiOptionPolicy::TakeAll);
+        known.emplace_back(option, made);
+    }
+    std::ranges::reverse(rest);
+    try {
+        app.parse(std::move(rest));
+    } catch (const CLI::ParseError& error) {
+        *complaint = error.what();
+        return std::nullopt;
+    }
+
+    bool areOperands = false;
+    for (const std::string& left : app.remaining()) {
+        if (!areOperands && left == "--") {
+            areOperands = true;
+        } else if (!areOperands && IsOption(left)) {
+            *complaint = MakeMessage("no such option: '%'", {left});
+            return std::nullopt;
+        } else {
+            parsed.m_Operands.push_back(left);
+        }
+    }
+    for (const auto& [option, made] : known)
+        for (const std::string& value : made->results())
+            parsed.m_Options.emplace_back(option, value);
+    if (parsed.Has(kHelp) || parsed.Has(kVersion)) return parsed;
+
+    for (const auto& [option, value] : parsed.m_Options)
+        if (*complaint = CheckValue(*option, value); !complaint->empty()) return std::nullopt;
+    const size_t needed =
+        (*subcommand)->minOperands - (parsed.Has(kFilesFrom) && (*subcommand)->minOperands > 1 ? 1 : 0);
+    const std::vector<std::string>& operands = parsed.m_Operands;
+    if (*subcommand == &kNoSubcommand)
+        *complaint = operands.empty() ? MakeMessage("no subcommand is named")
+                                      : MakeMessage("no such subcommand: '%'", {operands[0]});
+    else if (operands.size() < needed)
+        *complaint = operands.empty() ? MakeMessage("no archive is named") : MakeMessage("no pattern is given");
+    if (!complaint->empty()) return std::nullopt;
+    return parsed;
+}
+
+const std::string* Arguments::Find(const Option& option) const {
+    const auto last =
+        std::find_if(m_Options.rbegin(), m_Options.rend(), [&](const auto& given) { return given.first == &option; });
+    return last != m_Options.rend() ? &last->second : nullptr;
+}
+
+std::vector<std::string> Arguments::FindAll(const Option& option) const {
+    std::vector<std::string> values;
+    for (const auto& [given, value] : m_Options)
+        if (given == &option) values.push_back(value);
+    return values;
+}

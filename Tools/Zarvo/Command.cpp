@@ -1,0 +1,63 @@
+#include "Tools/Zarvo/Command.h"
+
+#include "Tools/Zarvo/Run.h"
+#include "Tools/Zarvo/Text.h"
+
+#include <csignal>
+#include <cstring>
+#include <new>
+
+namespace {
+
+constexpr int kWrongUsage = 2;
+
+int RunSubcommand(const World& world, OutputBuffer& output, Console& console) {
+    const Subcommand* subcommand = nullptr;
+    std::string complaint;
+    const std::optional<Arguments> arguments = Arguments::Parse(world.arguments, &subcommand, &complaint);
+    const std::string name(subcommand->name);
+    if (!arguments) {
+        const std::string help = "zarvo " + name + (name.empty() ? "" : " ") + "--help";
+        console.Say(MakeMessage("%; see '%'", {complaint, help}));
+        return kWrongUsage;
+    }
+    if (arguments->Has(kHelp)) {
+        output.Write(DescribeSubcommand(*subcommand));
+        return kAllDone;
+    }
+    if (arguments->Has(kVersion)) {
+        output.Write("zarvo " + std::string(zarvo_version()) + "\n");
+        return kAllDone;
+    }
+
+    const Run run = {.arguments = *arguments, .input = world.input, .output = output, .console = console};
+    if (subcommand == &kList) return RunList(run);
+    if (subcommand == &kInfo) return RunInfo(run);
+    return RunCat(run);
+}
+
+} // namespace
+
+Ending RunZarvo(const World& world) {
+    OutputBuffer output(world.output, world.isOutputTerminal, world.signal);
+    Console console(world.error, world.isErrorTerminal, output);
+    int status = kSomethingWrong;
+    try {
+        status = RunSubcommand(world, output, console);
+    } catch (const std::bad_alloc&) {
+        console.Say(MakeMessage("Cannot allocate memory"));
+    }
+    output.Flush();
+    if (output.HasSignal()) {
+        const int signal = *world.signal;
+        console.Say(MakeMessage("ended by SIG% after % bytes of results",
+                                {sigabbrev_np(signal), std::to_string(output.GetWritten())}));
+        return {.status = kSomethingWrong, .signal = signal};
+    }
+    if (output.GetError() == EPIPE) return {.status = kSomethingWrong, .signal = SIGPIPE};
+    if (output.GetError() != 0) {
+        console.Say("standard output", strerror(output.GetError()));
+        return {.status = kSomethingWrong};
+    }
+    return {.status = status};
+}

@@ -1,0 +1,121 @@
+#include "Tools/Zarvo/Options.h"
+
+#include <algorithm>
+
+const Option kLong = {.letter = 'l', .help = "show kind (f or d), size, offset in the data, and path"};
+const Option kNul = {.letter = '0', .help = "end each path with NUL instead of a newline, also in --files-from"};
+const Option kNulInput = {.letter = '0', .help = "patterns in --files-from end with NUL instead of a newline"};
+const Option kJson = {.name = "json", .help = "print JSON Lines, one object a line"};
+const Option kFilesFrom = {.name = "files-from",
+                           .value = "FILE",
+                           .kind = ValueKind::kFile,
+                           .help = "take more patterns from FILE, one a line (-: standard input)"};
+const Option kMemory = {.name = "memory",
+                        .value = "SIZE",
+                        .kind = ValueKind::kSize,
+                        .help = "bytes that blocks may take (K, M, G; default: half of what is free)"};
+const Option kQuiet = {.letter = 'q', .help = "show no progress and no summary"};
+const Option kThreads = {.letter = 'j',
+                         .name = "threads",
+                         .value = "N",
+                         .kind = ValueKind::kCount,
+                         .help = "threads to use (default: as many as the process may)"};
+const Option kProgress = {.name = "progress",
+                          .value = "WHEN",
+                          .kind = ValueKind::kChoice,
+                          .choices = "auto|always|never",
+                          .help = "show progress on standard error: auto (on a terminal), always, never"};
+const Option kHelp = {.letter = 'h', .name = "help", .help = "print this help"};
+const Option kVersion = {.name = "version", .help = "print the version"};
+
+namespace {
+
+constexpr const Option* kListOptions[] = {&kLong,  &kNul,     &kJson,     &kFilesFrom, &kMemory,
+                                          &kQuiet, &kThreads, &kProgress, &kHelp};
+constexpr const Option* kInfoOptions[] = {&kJson, &kMemory, &kQuiet, &kThreads, &kProgress, &kHelp};
+constexpr const Option* kCatOptions[] = {&kNulInput, &kFilesFrom, &kMemory, &kQuiet, &kThreads, &kProgress, &kHelp};
+constexpr const Option* kOptions[] = {&kQuiet, &kThreads, &kProgress, &kHelp, &kVersion};
+
+constexpr std::string_view kPatterns = "A PATTERN is a path, or a glob over whole paths: * and ? and [...] stop at "
+                                       "\"/\", ** takes everything, and \\ takes\n"
+                                       "the next character as it is. One that matches a folder takes all below it.\n";
+
+} // namespace
+
+const Subcommand kList = {.name = "list",
+                          .operands = "ARCHIVE [PATTERN...]",
+                          .summary = "print the paths of the entries",
+                          .about = kPatterns,
+                          .options = kListOptions,
+                          .minOperands = 1};
+const Subcommand kInfo = {.name = "info",
+                          .operands = "ARCHIVE...",
+                          .summary = "say what archives are",
+                          .about = {},
+                          .options = kInfoOptions,
+                          .minOperands = 1};
+const Subcommand kCat = {.name = "cat",
+                         .operands = "ARCHIVE PATTERN...",
+                         .summary = "print the contents of files",
+                         .about = kPatterns,
+                         .options = kCatOptions,
+                         .minOperands = 2};
+const Subcommand kNoSubcommand = {.name = {},
+                                  .operands = "SUBCOMMAND [OPTION...] ARCHIVE [ARGUMENT...]",
+                                  .summary = "read archives of the Zarvo engine's formats",
+                                  .about = {},
+                                  .options = kOptions,
+                                  .minOperands = 0};
+
+std::span<const Subcommand* const> GetSubcommands() {
+    static constexpr const Subcommand* kSubcommands[] = {&kList, &kInfo, &kCat};
+    return kSubcommands;
+}
+
+std::string DescribeOption(const Option& option) {
+    std::string text;
+    if (option.letter != 0) text += {'-', option.letter};
+    if (option.letter != 0 && !option.name.empty()) text += ", ";
+    if (!option.name.empty()) (text += "--") += option.name;
+    if (!option.value.empty()) (text += option.letter == 0 ? "=" : " ") += option.value;
+    return text;
+}
+
+namespace {
+
+// Rows of two columns, a name and what it means.
+std::string DescribeRows(const std::vector<std::pair<std::string, std::string_view>>& rows) {
+    size_t width = 0;
+    for (const auto& [name, meaning] : rows)
+        width = std::max(width, name.size());
+    std::string text;
+    for (const auto& [name, meaning] : rows)
+        ((text += "  " + name).append(width + 2 - name.size(), ' ') += meaning) += '\n';
+    return text;
+}
+
+} // namespace
+
+std::string DescribeSubcommand(const Subcommand& subcommand) {
+    const bool isNone = subcommand.name.empty();
+    std::string text = "Usage: zarvo ";
+    if (!isNone) (text += subcommand.name) += " [OPTION...] ";
+    ((text += subcommand.operands) += "\n\n") += subcommand.summary;
+    text += ".\n";
+    text[text.find("\n\n") + 2] -= 'a' - 'A';
+    if (!subcommand.about.empty()) (text += '\n') += subcommand.about;
+
+    std::vector<std::pair<std::string, std::string_view>> rows;
+    if (isNone) {
+        for (const Subcommand* const each : GetSubcommands())
+            rows.emplace_back(each->name, each->summary);
+        (text += "\nSubcommands:\n") += DescribeRows(rows);
+    }
+    rows.clear();
+    for (const Option* const option : subcommand.options)
+        rows.emplace_back(DescribeOption(*option), option->help);
+    (text += "\nOptions, which may stand anywhere before --:\n") += DescribeRows(rows);
+    text += isNone ? "\n'zarvo SUBCOMMAND --help' says more of a subcommand, 'man zarvo' everything.\n"
+                   : "\n'man zarvo' says more.\n";
+    return text;
+}

@@ -1,0 +1,45 @@
+// The subcommands and their options, in one table that parsing, help and completions are made of. The manual page is
+// held to it by a test. Constant; any thread.
+#pragma once
+
+#include <cstddef>
+#include <span>
+#include <string>
+#include <string_view>
+#include <vector>
+
+// What an option's value has to be. Of kChoice, Option::choices has the values.
+enum class ValueKind { kNone, kFile, kCount, kSize, kChoice };
+
+struct Option {
+    char letter = 0;             // 'j' for "-j"; 0: none
+    std::string_view name = {};  // "threads" for "--threads"; empty: none
+    std::string_view value = {}; // what help calls the value, "N"; empty: it takes none
+    ValueKind kind = ValueKind::kNone;
+    std::string_view choices = {}; // with "|" between them
+    std::string_view help = {};    // half a sentence
+};
+
+struct Subcommand {
+    std::string_view name;
+    std::string_view operands; // as the usage line shows them
+    std::string_view summary;  // half a sentence
+    std::string_view about;    // lines of help
+    std::span<const Option* const> options;
+    size_t minOperands;
+};
+
+extern const Option kLong, kNul, kNulInput, kJson, kFilesFrom, kMemory, kQuiet, kThreads, kProgress, kHelp, kVersion;
+
+extern const Subcommand kList, kInfo, kCat;
+
+// What zarvo itself takes when no subcommand is named.
+extern const Subcommand kNoSubcommand;
+
+std::span<const Subcommand* const> GetSubcommands();
+
+// "-j, --threads N". Without indent.
+std::string DescribeOption(const Option& option);
+
+// What --help prints.
+std::string DescribeSubcommand(const Subcommand& subcommand);

@@ -1,0 +1,46 @@
+#include "Tools/Zarvo/Run.h"
+
+#include "Tools/Zarvo/Text.h"
+
+#include <algorithm>
+#include <fstream>
+#include <limits>
+
+namespace {
+
+// What "--memory" is when it isn't given: half of the memory that programs may take without others being moved out.
+unsigned long long GetDefaultMemory() {
+    std::ifstream file("/proc/meminfo");
+    std::string name, unit;
+    for (unsigned long long kibibytes = 0; file >> name >> kibibytes;) {
+        if (name == "MemAvailable:") return kibibytes * 1'024 / 2;
+        file.ignore(std::numeric_limits<std::streamsize>::max(), '\n');
+    }
+    return 1ull << 30; // where there is no such file
+}
+
+} // namespace
+
+std::optional<zarvo::archive> Run::OpenArchive(const std::string& path) const {
+    if (path == "-") {
+        console.Say(
+            path, MakeMessage("an archive must be a file that can be read at any place (a file of this name is ./-)"));
+        return std::nullopt;
+    }
+    const std::string* const memory = arguments.Find(kMemory);
+    const unsigned long long budget = memory != nullptr ? *ParseSize(*memory) : GetDefaultMemory();
+    zarvo::open_options options;
+    // A block in memory is held twice: as it is stored and as it is decoded.
+    options.max_block_bytes = std::max(budget / 2, 1ull);
+    options.log = [this, path](std::string_view text) { console.Say(path, text); };
+    zarvo::result<zarvo::archive> archive = zarvo::archive::open(path, std::move(options));
+    if (!archive) {
+        console.Say(path, archive.error().text());
+        return std::nullopt;
+    }
+    return *std::move(archive);
+}
+
+void Run::SayOfEntry(const std::string& archive, std::string_view entry, std::string_view text) const {
+    console.Say(archive + ": " + std::string(entry), text);
+}
