@@ -1,6 +1,5 @@
-// Properties: a decompressor writes nothing behind the room it is given; a stream yields the same bytes however its
-// input and room are cut; what the one-shot decoder makes of a buffer, the stream makes too; and a stream that has
-// failed stays failed.
+// Properties: a decompressor writes nothing outside the room it is given; a stream yields the same bytes however its
+// input and room are cut, and the same as decoding the whole buffer at once; and a failed stream stays failed.
 #include "Fuzz/FuzzSupport.h"
 #include "Runtime/Utilities/Compression/Compression.h"
 
@@ -16,7 +15,7 @@ struct Outcome {
     bool isFailed = false;
 };
 
-// One whole buffer into a room of exactly the given size: the sanitizer watches the bytes behind it.
+// Decodes the whole buffer into a room of exactly the given size; the sanitizer watches its ends.
 Outcome DecompressOnce(const IDecompressor& decompressor, const FuzzInput& input, size_t room) {
     Outcome outcome;
     outcome.output.resize(room);
@@ -65,7 +64,7 @@ bool IsPrefix(const std::vector<UInt8>& a, const std::vector<UInt8>& b) {
     return a.size() <= b.size() && (a.empty() || memcmp(a.data(), b.data(), a.size()) == 0);
 }
 
-// Properties that name a dictionary of gigabytes only cost time here.
+// Inputs that need a dictionary of gigabytes only cost time here.
 bool NamesLargeDictionary(const FuzzInput& input) {
     UInt32 dictionarySize = 0;
     if (input.size() < 5) return false;
@@ -84,12 +83,12 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, size_t size) {
 
     static IDecompressor* const lz4 = CreateDecompressor(kCompressionLz4, kMemLabelGeneral);
     static IDecompressor* const lzma = CreateDecompressor(kCompressionLzma, kMemLabelGeneral);
-    (void)DecompressOnce(*lz4, input, room); // its property is the sanitizer's
+    (void)DecompressOnce(*lz4, input, room); // the sanitizer checks it
     if (NamesLargeDictionary(input)) return 0;
     const Outcome once = DecompressOnce(*lzma, input, room);
     const Outcome whole = DecompressStream(*lzma, input, room, std::max<size_t>(size, 1), std::max<size_t>(room, 1));
     const Outcome pieces = DecompressStream(*lzma, input, room, inputPiece, outputPiece);
-    // Pieces see a failure no earlier than the whole does, and may have delivered more bytes before it.
+    // In pieces, a stream may deliver more bytes before it fails than in one call.
     FuzzCheck(IsPrefix(whole.output, pieces.output) || IsPrefix(pieces.output, whole.output));
     if (!whole.isFailed && !pieces.isFailed) FuzzCheck(whole.output == pieces.output);
     if (!once.isFailed && !whole.isFailed) FuzzCheck(IsPrefix(once.output, whole.output));

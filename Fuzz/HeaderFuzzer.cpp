@@ -1,5 +1,5 @@
-// Property: the block-based parsers never make more records than the bytes can hold, and what is read once is read the
-// same again.
+// Properties: the block-based parsers make no more records than the bytes can hold; and parsing twice gives the same
+// records.
 #include "Fuzz/FuzzSupport.h"
 #include "Runtime/VirtualFileSystem/ArchiveFileSystem/ArchiveStorageHeader.h"
 
@@ -7,11 +7,14 @@ using namespace ArchiveStorageHeader;
 
 namespace {
 
+constexpr size_t kStoredBlockSize = 10;
+constexpr size_t kStoredNodeMinSize = 21;
+
 struct Parsed {
     Header header{kMemLabelGeneral};
     BlocksInfo blocks{kMemLabelGeneral};
     DirectoryInfo directory{kMemLabelGeneral};
-    int result = 0;
+    HeaderResult result = kHeaderOk;
 };
 
 void Parse(FileAccessor& file, Parsed& parsed) {
@@ -40,8 +43,8 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, size_t size) {
     Parse(again.file, second);
 
     FuzzCheck(first.result == second.result);
-    FuzzCheck(first.blocks.storageBlocks.size() * 10 <= size);
-    FuzzCheck(first.directory.nodes.size() * 21 <= size);
+    FuzzCheck(first.blocks.storageBlocks.size() * kStoredBlockSize <= size);
+    FuzzCheck(first.directory.nodes.size() * kStoredNodeMinSize <= size);
     FuzzCheck(first.directory.nodes.size() == second.directory.nodes.size());
     for (size_t index = 0; index < first.directory.nodes.size(); ++index) {
         FuzzCheck(first.directory.nodes[index].path == second.directory.nodes[index].path);

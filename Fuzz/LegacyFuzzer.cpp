@@ -1,5 +1,5 @@
-// Properties: the legacy parsers never make more records than the bytes can hold; and the scanner that follows a
-// directory piece by piece calls it complete exactly when the parser can read it.
+// Properties: the legacy parsers make no more records than the bytes can hold; and the scanner, which follows a
+// directory piece by piece, calls it complete exactly when the parser can read it.
 #include "Fuzz/FuzzSupport.h"
 #include "Runtime/VirtualFileSystem/ArchiveFileSystem/ArchiveStorageHeader.h"
 #include "Runtime/VirtualFileSystem/ArchiveFileSystem/LegacyDirectoryScanner.h"
@@ -8,6 +8,9 @@
 
 using namespace ArchiveStorageHeader;
 
+constexpr size_t kStoredBlockSize = 24;  // two running positions, in ZarvoArchive
+constexpr size_t kStoredNodeMinSize = 9; // in the legacy directory, which has the smaller nodes
+
 static void ParseWhole(const FuzzInput& input) {
     Header header(kMemLabelGeneral);
     BlocksInfo blocks(kMemLabelGeneral);
@@ -15,13 +18,14 @@ static void ParseWhole(const FuzzInput& input) {
     FuzzFile archive(input.data(), input.size());
     if (ReadHeaderSignature(archive.file, header) != kHeaderOk) return;
     if (header.signature == kSignatureWeb) {
-        const int result = ReadHeaderAndBlocksInfo_ZarvoWebAndZarvoRaw(archive.file, header, blocks);
+        const HeaderResult result = ReadHeaderAndBlocksInfo_ZarvoWebAndZarvoRaw(archive.file, header, blocks);
         FuzzCheck(result != kHeaderOk || blocks.storageBlocks.size() == 1);
     } else {
-        (void)ReadAll(archive.file, header, blocks, directory); // only its effect on the records is of interest
+        (void)ReadAll(archive.file, header, blocks, directory); // the checks below hold whatever it answers
     }
-    FuzzCheck(blocks.storageBlocks.size() * 24 <= std::max<size_t>(input.size(), 24));
-    FuzzCheck(directory.nodes.size() * 9 <= input.size());
+    // The one block of ZarvoWeb and ZarvoRaw is not stored.
+    FuzzCheck(blocks.storageBlocks.size() * kStoredBlockSize <= std::max(input.size(), kStoredBlockSize));
+    FuzzCheck(directory.nodes.size() * kStoredNodeMinSize <= input.size());
 }
 
 static void ScanAndParseDirectory(FuzzInput input) {
@@ -33,7 +37,7 @@ static void ScanAndParseDirectory(FuzzInput input) {
     Header header(kMemLabelGeneral);
     DirectoryInfo directory(kMemLabelGeneral);
     FuzzFile stream(input.data(), input.size());
-    const int result = ReadDirectoryInfo_ZarvoWebAndZarvoRaw(stream.file, header, directory);
+    const HeaderResult result = ReadDirectoryInfo_ZarvoWebAndZarvoRaw(stream.file, header, directory);
     FuzzCheck(scanner.IsComplete() == (result == kHeaderOk));
 }
 

@@ -1,6 +1,6 @@
-// Property: two ways to read agree, or both fail. What one reader delivers in order, piece by piece, a fresh one
-// delivers in any range; and where the first fails, the second does. Of an archive that the writer has made and nobody
-// has touched, every range inside the stream is delivered.
+// Property: two ways to read agree, or both fail. One reader reads the stream in order, piece by piece; another reads
+// ranges of it. Both deliver the same bytes and fail at the same place. When the writer has made the archive, the
+// second delivers every range inside the stream.
 #include "Fuzz/FuzzArchives.h"
 #include "Runtime/VirtualFileSystem/ArchiveFileSystem/ArchiveStorageReader.h"
 
@@ -24,7 +24,7 @@ struct OpenArchive {
     int result;
 };
 
-// The stream from its start, up to the first byte that is not delivered.
+// The stream from its start to the first byte that can't be read.
 std::vector<UInt8> ReadInOrder(ArchiveStorageReader& reader) {
     std::vector<UInt8> stream;
     UInt8 piece[kSequentialPiece];
@@ -41,8 +41,8 @@ std::vector<UInt8> ReadInOrder(ArchiveStorageReader& reader) {
     return stream;
 }
 
-// Reads ranges through a fresh reader, and holds what it answers against what was read in order: up to its end every
-// range is delivered, and what lies behind it is refused.
+// Reads ranges through a fresh reader and compares them with the stream as read in order: the reader delivers every
+// range up to its end, and refuses what lies past it.
 void CheckRanges(const FuzzInput& archive, const std::vector<UInt8>& stream, std::span<const UInt64> seeds) {
     OpenArchive jumping(archive);
     FuzzCheck(jumping.result == 0);
@@ -57,7 +57,7 @@ void CheckRanges(const FuzzInput& archive, const std::vector<UInt8>& stream, std
         FuzzCheck(!isRead || (delivered <= length && (delivered != 0 || length == 0)));
         const UInt64 inOrder = from < stream.size() ? stream.size() - from : 0;
         if (length != 0 && length <= inOrder) FuzzCheck(isRead && delivered == length);
-        // Behind the last byte that was tried in order, nothing is known.
+        // Nothing is known past kMaxFuzzStream, where reading in order stopped.
         if (isRead && from <= stream.size() && stream.size() < kMaxFuzzStream) FuzzCheck(delivered <= inOrder);
         const UInt64 comparable = isRead ? std::min(delivered, inOrder) : 0;
         FuzzCheck(comparable == 0 || memcmp(range.data(), stream.data() + from, static_cast<size_t>(comparable)) == 0);

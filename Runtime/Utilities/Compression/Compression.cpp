@@ -6,7 +6,7 @@
 #include "Runtime/Utilities/Format.h"
 #include "Runtime/Utilities/LogAssert.h"
 
-// What a kind does that takes no memory.
+// For kinds that need no memory to decode.
 DecompressResult IDecompressor::TryDecompressMemory(const void* src, size_t* srcSize, void* dst,
                                                     size_t* dstSize) const {
     return DecompressMemory(src, srcSize, dst, dstSize) ? DecompressResult::kOk : DecompressResult::kDamaged;
@@ -20,8 +20,8 @@ DecompressResult IDecompressor::TryDecompressStream(void* state, const void* src
 
 IDecompressor* CreateDecompressor(CompressionType type, MemLabelId label) {
     if (type == kCompressionNone) return nullptr;
-    if (type == kCompressionLzma) return New<LzmaDecompressor>(label);
-    if (type == kCompressionLz4 || type == kCompressionLz4HC) return New<Lz4Decompressor>(label);
+    if (type == kCompressionLzma) return RequireMemory(New<LzmaDecompressor>(label));
+    if (type == kCompressionLz4 || type == kCompressionLz4HC) return RequireMemory(New<Lz4Decompressor>(label));
     ReportError(
         Format("Decompressing this format (%d) is not supported on this platform.", static_cast<int>(type)).c_str());
     return nullptr;

@@ -1,4 +1,4 @@
-// LZ4 blocks, each decompressed whole: there is no streaming. No data of its own: any thread.
+// LZ4 blocks, decompressed whole: LZ4 can't be streamed. Any thread.
 #pragma once
 
 #include "Runtime/Utilities/Compression/Compression.h"
@@ -9,11 +9,11 @@ public:
 
     CompressionType GetType() const override;
 
-    // Sizes of kSizeLimit and more are refused and reported as a failed check. An empty output counts as a
-    // failure. *srcSize is left as it is; after a failure *dstSize means nothing.
+    // Refuses sizes of kSizeLimit and more, and reports a failed check. An empty output is a failure. *srcSize is left
+    // as it is; after a failure *dstSize has no meaning.
     bool DecompressMemory(const void* src, size_t* srcSize, void* dst, size_t* dstSize) const override;
 
-    // Streams: refused.
+    // Refused: all answer false.
     bool DecompressStreamInit(void** state) const override;
     void DecompressStreamDeinit(void* state) const override;
     bool DecompressStream(void* state, const void* src, size_t* srcSize, void* dst, size_t* dstSize,

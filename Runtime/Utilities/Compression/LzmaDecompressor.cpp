@@ -14,16 +14,16 @@ void* LzmaDecAlloc(void*, size_t size) {
 
 void LzmaDecFree(void*, void* address) { free_alloc_internal(address, kMemLabelFileSystem, __FILE__, __LINE__); }
 
-// The decoder takes it by a pointer that is not const, but only calls through it.
+// Not const, because the decoder takes a plain pointer; it only calls the two functions.
 constinit ISzAlloc s_LzmaDecAlloc = {LzmaDecAlloc, LzmaDecFree};
 
-// Stands in for input that there is none of: the decoder copies 0 bytes from it, which null does not allow.
+// The address of empty input: the decoder copies 0 bytes from it, which null doesn't allow.
 constexpr Byte kNoInput = 0;
 
 struct LzmaStreamState {
     CLzmaDec decoder;
     bool started; // the properties were consumed, and the decoder has its tables and dictionary
-    bool failed;  // the decoder reported an error: called again it would read and write wild memory
+    bool failed;  // the decoder reported an error: another call would read and write wild memory
 };
 
 DecompressResult FailureOf(SRes result) {
@@ -54,10 +54,7 @@ DecompressResult LzmaDecompressor::TryDecompressMemory(const void* src, size_t* 
 }
 
 bool LzmaDecompressor::DecompressStreamInit(void** state) const {
-    if (*state == nullptr) {
-        *state = New<LzmaStreamState>(kMemLabelFileSystem);
-        if (*state == nullptr) return false;
-    }
+    if (*state == nullptr) *state = RequireMemory(New<LzmaStreamState>(kMemLabelFileSystem));
     auto& stream = *static_cast<LzmaStreamState*>(*state);
     if (stream.started) LzmaDec_Free(&stream.decoder, &s_LzmaDecAlloc);
     LzmaDec_Construct(&stream.decoder);
@@ -81,8 +78,7 @@ bool LzmaDecompressor::DecompressStream(void* state, const void* src, size_t* sr
 DecompressResult LzmaDecompressor::TryDecompressStream(void* state, const void* src, size_t* srcSize, void* dst,
                                                        size_t* dstSize, bool isLastInput) const {
     auto* const stream = static_cast<LzmaStreamState*>(state);
-    if (stream == nullptr) return DecompressResult::kOutOfMemory; // only memory is ever missing to make one
-    if (stream->failed) return DecompressResult::kDamaged;
+    if (stream == nullptr || stream->failed) return DecompressResult::kDamaged;
     const Byte* const input = src != nullptr ? static_cast<const Byte*>(src) : &kNoInput;
     size_t consumed = 0;
     if (!stream->started) {
@@ -94,7 +90,7 @@ DecompressResult LzmaDecompressor::TryDecompressStream(void* state, const void* 
         consumed = LZMA_PROPS_SIZE;
     }
 
-    // Every round that does not stop makes at least one byte.
+    // Ends: each round produces at least one byte, or is the last.
     size_t produced = 0;
     while (produced < *dstSize) {
         SizeT taken = *srcSize - consumed;

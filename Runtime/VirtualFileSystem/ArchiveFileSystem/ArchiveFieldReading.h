@@ -1,4 +1,4 @@
-// How the archive parsers read single fields. Private to them.
+// How the archive parsers read fields, and the nodes that two layouts share. Private to them.
 #pragma once
 
 #include "Runtime/Core/Containers/String.h"
@@ -19,19 +19,18 @@ template <typename T>
     return true;
 }
 
-// Reads a string up to its NUL, or to the end of the file once there is a character, and leaves the position just past
-// what was read. Any length, unless maxSize bytes, with the NUL, have come without one: what they hold is then the
-// string. A read that fails behind the first characters counts as the end of the file.
+// Reads a string up to its NUL and leaves the position just past the NUL. After at least one character, the end of the
+// file (or a failed read) ends the string, too; so do maxSize bytes without a NUL.
 [[nodiscard]] bool ReadString(FileAccessor& file, core::string* out, size_t maxSize = ~size_t{0});
 
-// Reads a node's path by way of scratch, which is used for one path after another: *path then takes no more memory than
-// it needs, and none when it is short.
+// Reads a node's path into scratch and copies it to *path, which so takes no more memory than it needs. Pass the same
+// scratch for one path after another.
 [[nodiscard]] bool ReadPath(FileAccessor& file, core::string* scratch, core::string* path);
 
-// Moves past size bytes that nothing here uses. They must be there.
+// Reads and drops size bytes. False when the file doesn't hold them.
 [[nodiscard]] bool SkipBytes(FileAccessor& file, size_t size);
 
-// Whether the rest of the file can hold count entries of at least entrySize bytes: asked before an array is sized by a
+// Whether the rest of the file can hold count entries of at least entrySize bytes. Ask before you size an array by a
 // number from a file.
 [[nodiscard]] bool CanHoldEntries(FileAccessor& file, UInt64 count, UInt64 entrySize);
 

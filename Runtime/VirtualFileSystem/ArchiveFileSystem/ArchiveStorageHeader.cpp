@@ -3,19 +3,14 @@
 #include "Runtime/Utilities/ZarvoConfig.h"
 #include "Runtime/VirtualFileSystem/ArchiveFileSystem/ArchiveFieldReading.h"
 
-#include <algorithm>
-#include <cstring>
-
 namespace ArchiveStorageHeader {
 
 const char* const kSignature = "ZarvoFS";
 
-constexpr size_t kStringPieceSize = 64;
 constexpr size_t kLongestSignatureSize = 13; // "ZarvoArchive" and its NUL
 constexpr UInt64 kAlignment = 16;
 
 constexpr UInt64 kStoredBlockSize = 10;
-constexpr UInt64 kStoredNodeMinSize = 21;
 
 Header::Header(MemLabelId label)
     : signature(kSignature, label),
@@ -27,58 +22,6 @@ Header::Header(MemLabelId label)
       uncompressedBlocksInfoSize(0),
       flags(0) {}
 
-bool ReadBytes(FileAccessor& file, void* buffer, size_t size) {
-    UInt64 actual = 0;
-    return file.Read(size, buffer, &actual) && actual == size;
-}
-
-bool ReadString(FileAccessor& file, core::string* out, size_t maxSize) {
-    out->clear();
-    if (out->capacity() <= kStringPieceSize && out->grow(kStringPieceSize) == nullptr) return false;
-    const UInt64 start = file.Position().Cast<UInt64>();
-    char piece[kStringPieceSize];
-    size_t terminatorLength = 0;
-    while (terminatorLength == 0 && out->size() != maxSize) {
-        UInt64 actual = 0;
-        if (!file.Read(std::min(sizeof(piece), maxSize - out->size()), piece, &actual) || actual == 0) {
-            if (out->empty()) return false;
-            break; // a failed read ends the text as the file's end does: what is read next fails, too
-        }
-        const size_t count = static_cast<size_t>(actual);
-        const void* terminator = memchr(piece, '\0', count);
-        const size_t length =
-            terminator != nullptr ? static_cast<size_t>(static_cast<const char*>(terminator) - piece) : count;
-        if (terminator != nullptr) terminatorLength = 1;
-        while (out->size() + length > out->capacity())
-            if (out->grow(2 * (out->capacity() + 1)) == nullptr) return false;
-        out->append(piece, length);
-    }
-    return file.Seek(VFS::FileOffset(VFS::FileSize(start + out->size() + terminatorLength)), kFileOriginBegin);
-}
-
-bool ReadPath(FileAccessor& file, core::string* scratch, core::string* path) {
-    if (!ReadString(file, scratch)) return false;
-    if (path->grow(scratch->size()) == nullptr) return false;
-    *path = *scratch;
-    return true;
-}
-
-bool SkipBytes(FileAccessor& file, size_t size) {
-    char dropped[16];
-    for (; size > sizeof(dropped); size -= sizeof(dropped))
-        if (!ReadBytes(file, dropped, sizeof(dropped))) return false;
-    return ReadBytes(file, dropped, size);
-}
-
-bool CanHoldEntries(FileAccessor& file, UInt64 count, UInt64 entrySize) {
-    if (count == 0) return true;
-    const UInt64 position = file.Position().Cast<UInt64>();
-    if (!file.Seek(0, kFileOriginEnd)) return false;
-    const UInt64 end = file.Position().Cast<UInt64>();
-    if (!file.Seek(VFS::FileOffset(VFS::FileSize(position)), kFileOriginBegin)) return false;
-    return end > position && count <= (end - position) / entrySize;
-}
-
 // Signature, with its NUL    layout
 // "ZarvoFS"                  block-based
 // "ZarvoWeb"                 legacy, one LZMA stream; block-based when version 6 follows
@@ -87,7 +30,7 @@ bool CanHoldEntries(FileAccessor& file, UInt64 count, UInt64 entrySize) {
 HeaderResult ReadHeaderSignature(FileAccessor& file, Header& header) {
     constexpr UInt32 kTypeAndDirectoryMask = kArchiveCompressionTypeMask | kArchiveDirectoryInBlocksInfo;
 
-    // What can't be read leaves an empty signature, which matches nothing.
+    // A failed read leaves an empty signature, which is unknown.
     if (!ReadString(file, &header.signature, kLongestSignatureSize)) header.signature.clear();
     if (header.signature == kSignature) return kHeaderOk;
     if (header.signature == kSignatureArchive || header.signature == kSignatureRaw) {
@@ -97,7 +40,7 @@ HeaderResult ReadHeaderSignature(FileAccessor& file, Header& header) {
     if (header.signature != kSignatureWeb) return kHeaderNotAnArchive;
 
     const VFS::FileOffset afterSignature(file.Position());
-    // A version that is cut short is no 6, and the parser that is called next meets the same end.
+    // A truncated version is not 6; the next parser fails on it too.
     const bool hasVersion = ReadBigEndian(file, &header.version);
     if (hasVersion && header.version == kWebSignatureVersion) {
         header.signature = kSignature;
@@ -130,11 +73,11 @@ HeaderResult ReadHeader(FileAccessor& file, Header& header) {
     return kHeaderOk;
 }
 
-// The header's length, with the padding that its version asks for.
+// The length of the header, padded as its version requires.
 static UInt64 GetHeaderLength(const Header& header) {
     // The two strings' NULs, the signature's NUL, and the integers.
     constexpr UInt64 kFixedLength = 27;
-    // A header under the ZarvoWeb signature counts one byte more than its fields, which nothing reads.
+    // Under the ZarvoWeb signature, the header has one byte after its fields, which nothing reads.
     constexpr UInt64 kWebSignatureFixedLength = 36;
 
     UInt64 length = header.engineVersion.size() + header.engineRevision.size();
@@ -156,7 +99,7 @@ UInt64 GetBlocksInfoOffset(const Header& header) {
     return GetHeaderLength(header);
 }
 
-// Order on disk: header, section, data; or, with the section at the end: header, data, section.
+// Order in the file: header, section, data; or, with the section at the end: header, data, section.
 UInt64 GetDataOffset(const Header& header) {
     if (header.signature == kSignatureArchive) return header.compressedBlocksInfoSize;
     const UInt64 headerLength = header.signature == kSignature ? GetHeaderLength(header) : 0;
@@ -181,24 +124,6 @@ HeaderResult ReadBlocksInfo(FileAccessor& file, const Header&, BlocksInfo& block
         if (!ReadBigEndian(file, &block.uncompressedSize)) return kHeaderShortRead;
         if (!ReadBigEndian(file, &block.compressedSize)) return kHeaderShortRead;
         if (!ReadBigEndian(file, &block.flags)) return kHeaderShortRead;
-    }
-    return kHeaderOk;
-}
-
-// Offset      Size      Field (each node)
-// 0           8         offset
-// 8           8         size
-// 16          4         flags
-// 20          variable  path
-HeaderResult ReadNodes(FileAccessor& file, UInt32 count, DirectoryInfo& directory) {
-    if (!CanHoldEntries(file, count, kStoredNodeMinSize)) return kHeaderShortRead;
-    if (!directory.nodes.resize_initialized(count, kResizeExact)) return kHeaderShortRead;
-    core::string path(kMemLabelGeneral);
-    for (Node& node : directory.nodes) {
-        if (!ReadBigEndian(file, &node.offset)) return kHeaderShortRead;
-        if (!ReadBigEndian(file, &node.size)) return kHeaderShortRead;
-        if (!ReadBigEndian(file, &node.flags)) return kHeaderShortRead;
-        if (!ReadPath(file, &path, &node.path)) return kHeaderShortRead;
     }
     return kHeaderOk;
 }

@@ -20,7 +20,7 @@ constexpr UInt64 kStoredRunningPositionsSize = 24;
 // 16 + 4   unused, from version 4 on
 // 4        unused
 // 4        header size: the data's position, from the archive's start
-// 4        a number that the level count bounds
+// 4        a number up to the level count
 // 4        level count L
 // 8 each   L levels: compressed size, uncompressed size; the last one gives the sizes of the whole data
 // 4        size of the archive, from version 2 on
@@ -73,7 +73,7 @@ static UInt32 GetLegacyNodeFlags(const core::string& path) {
 // 4         entry count E
 // each of E:
 //   variable  path
-//   4         offset, in the data stream, which this directory is the start of
+//   4         offset, in the data stream, which starts with this directory
 //   4         size
 HeaderResult ReadDirectoryInfo_ZarvoWebAndZarvoRaw(FileAccessor& file, const Header&, DirectoryInfo& directory) {
     UInt32 count = 0;
@@ -94,8 +94,8 @@ HeaderResult ReadDirectoryInfo_ZarvoWebAndZarvoRaw(FileAccessor& file, const Hea
     return kHeaderOk;
 }
 
-// The block tables hold running positions; a block's size is the difference of two. One too large for 32 bits is
-// reported, and its low 32 bits are kept.
+// A block's size is the difference of two running positions. A difference above 32 bits is reported, and its low 32
+// bits are kept.
 static UInt32 GetBlockSize(UInt64 start, UInt64 end) { return VFS::FileSize(end - start).Cast<UInt32>(); }
 
 // Size            Field
@@ -154,7 +154,7 @@ static HeaderResult ReadZarvoArchive(FileAccessor& file, Header& header, BlocksI
     UInt32 directoryDistance = 0;
     if (!ReadBigEndian(file, &directoryDistance)) return kHeaderShortRead;
 
-    // The first seek has shown that headerPosition is below 2^63: the sum can't wrap.
+    // The first seek succeeded, so headerPosition is below 2^63 and the sum can't wrap.
     const VFS::FileSize directoryPosition(headerPosition + directoryDistance);
     if (!file.Seek(VFS::FileOffset(directoryPosition), kFileOriginBegin)) return kHeaderShortRead;
     UInt32 dataPosition = 0;

@@ -1,10 +1,9 @@
-// The reader's set-up and tear-down: opening the file, loading what describes the archive, learning the directory of a
-// ZarvoWeb archive, and the use count.
-#include "Runtime/VirtualFileSystem/ArchiveFileSystem/ArchiveStorageReader.h"
-
+// The reader's set-up and tear-down: opening the file, loading what describes the archive, and learning the directory
+// of a ZarvoWeb archive.
 #include "Runtime/Utilities/Compression/Lz4Decompressor.h"
 #include "Runtime/Utilities/Format.h"
 #include "Runtime/Utilities/LogAssert.h"
+#include "Runtime/VirtualFileSystem/ArchiveFileSystem/CachedBlock.h"
 #include "Runtime/VirtualFileSystem/ArchiveFileSystem/ReadAheadFile.h"
 #include "Runtime/VirtualFileSystem/MemoryFileSystem/MemoryFile.h"
 #include "Runtime/VirtualFileSystem/MemoryFileSystem/MultiBlocksMemoryFileData.h"
@@ -14,7 +13,7 @@
 
 using namespace ArchiveStorageHeader;
 
-static_assert(kHeaderShortRead == 1 && kHeaderNotAnArchive == -1, "the reader passes the parsers' codes on");
+static_assert(kHeaderShortRead == 1 && kHeaderNotAnArchive == -1, "Initialize answers with the parsers' codes");
 
 constexpr UInt64 kMaxFilePosition = ~UInt64{0} >> 1;
 
@@ -31,14 +30,12 @@ ArchiveStorageReader::ArchiveStorageReader(MemLabelId memLabel)
       m_Label(memLabel) {}
 
 ArchiveStorageReader::~ArchiveStorageReader() {
-    Delete(m_DirectoryFile, m_Label);
     for (CachedBlock* block : m_CachedBlocks) {
         DeinitCachedBlock(block);
         Delete(block, m_Label);
     }
     for (std::atomic<IDecompressor*>& decompressor : m_Decompressors)
-        Delete(decompressor.load(), m_Label);
-    (void)m_File.Close(); // opened for reading: nothing is lost
+        Delete(decompressor.load(std::memory_order_relaxed), m_Label); // no other thread uses the reader any more
 }
 
 int ArchiveStorageReader::Initialize(const core::string& path, VFS::FileSize offset) {
@@ -53,13 +50,10 @@ int ArchiveStorageReader::Initialize(const core::string& path, VFS::FileSize off
 
 int ArchiveStorageReader::Initialize(FileSystemEntry& entry, VFS::FileSize offset, bool canReleaseStorage,
                                      bool reportErrors) {
-    m_FileEntry = entry;
-    m_LastModified = entry.LastModified();
-    if (entry.lastError == kFileSystemErrorNotSupported) m_CheckModificationTime = false;
-    m_ReleaseStorageWhenUnused = canReleaseStorage;
+    m_Storage.SetEntry(entry, canReleaseStorage);
     if (!MakeStorageUsed(reportErrors)) return kHeaderNotAnArchive;
 
-    int result = ReadHeader(offset.Cast<UInt64>());
+    HeaderResult result = ReadHeader(offset.Cast<UInt64>());
     if (result == kHeaderOk && !BuildOffsetTables()) result = kHeaderShortRead;
     if (result != kHeaderOk) {
         if (result == kHeaderNotAnArchive && reportErrors)
@@ -67,7 +61,7 @@ int ArchiveStorageReader::Initialize(FileSystemEntry& entry, VFS::FileSize offse
         MakeStorageUnused();
         return result;
     }
-    const FileSystemError timeError = m_FileEntry.lastError;
+    const FileSystemError timeError = m_Storage.GetEntry().lastError;
     if (timeError != kFileSystemErrorNone && timeError != kFileSystemErrorNotSupported)
         ReportFailedCheck(Format("Unexpected FileSystemError code %i after call to FileSystemEntry::LastModified() \n",
                                  static_cast<int>(timeError))
@@ -75,7 +69,23 @@ int ArchiveStorageReader::Initialize(FileSystemEntry& entry, VFS::FileSize offse
     return kHeaderOk;
 }
 
-// Whether a block has nothing to deliver and no read of it can fail: nothing of it is decoded, and its kind is known.
+bool ArchiveStorageReader::MakeStorageUsed(bool reportErrors) { return m_Storage.MakeUsed(reportErrors); }
+
+void ArchiveStorageReader::MakeStorageUnused() {
+    if (m_Storage.MakeUnused()) EmptyCache();
+}
+
+CompressionType ArchiveStorageReader::GetBlockType(UInt32 blockIndex) const {
+    if (blockIndex == kNoBlock) return kCompressionNone;
+    const UInt32 flags = m_BlocksInfo.storageBlocks[blockIndex].flags;
+    return static_cast<CompressionType>(flags & kStorageBlockCompressionTypeMask);
+}
+
+bool ArchiveStorageReader::IsBlockStreamed(UInt32 blockIndex) const {
+    return blockIndex != kNoBlock && (m_BlocksInfo.storageBlocks[blockIndex].flags & kStorageBlockStreamed) != 0;
+}
+
+// Whether a read may skip a block: it holds no data, and reading it could not fail.
 static bool CanBeLeftOut(const StorageBlock& block) {
     if (block.uncompressedSize != 0) return false;
     const UInt32 type = block.flags & kStorageBlockCompressionTypeMask;
@@ -105,29 +115,29 @@ bool ArchiveStorageReader::BuildOffsetTables() {
     return true;
 }
 
-// Lets the parsers read a file that no handler serves. It stays the caller's, and outlives the accessor.
+// Lets the parsers read a file that no handler serves. The caller keeps the file until the accessor is closed.
 static bool OpenFile(IFile* file, FileAccessor* accessor) {
     FileEntryData data;
-    data.accessorHandler = New<IFileAdapter>(kMemLabelGeneral, file, kMemLabelGeneral, false);
-    if (data.accessorHandler == nullptr) return false;
+    data.accessorHandler = RequireMemory(New<IFileAdapter>(kMemLabelGeneral, file, kMemLabelGeneral, false));
     FileSystemEntry entry(data);
     return accessor->Open(entry, kFilePermissionRead);
 }
 
-int ArchiveStorageReader::ReadHeader(UInt64 offset) {
-    if (!m_File.Seek(VFS::FileOffset(VFS::FileSize(offset)), kFileOriginBegin)) return kHeaderNotAnArchive;
-    ReadAheadFile ahead(&m_File);
+HeaderResult ArchiveStorageReader::ReadHeader(UInt64 offset) {
+    FileAccessor& archive = m_Storage.GetFile();
+    if (!archive.Seek(VFS::FileOffset(VFS::FileSize(offset)), kFileOriginBegin)) return kHeaderNotAnArchive;
+    ReadAheadFile ahead(&archive);
     FileAccessor file;
     if (!OpenFile(&ahead, &file)) return kHeaderNotAnArchive;
     if (ReadHeaderSignature(file, m_Header) != kHeaderOk) return kHeaderNotAnArchive;
 
-    int result;
+    HeaderResult result;
     if (m_Header.signature == kSignatureArchive || m_Header.signature == kSignatureRaw) {
         result = ReadAll(file, m_Header, m_BlocksInfo, m_DirectoryInfo);
-        m_DirectoryReady = result == kHeaderOk;
+        SetDirectoryReady(result == kHeaderOk);
     } else if (m_Header.signature == kSignatureWeb) {
         result = ReadHeaderAndBlocksInfo_ZarvoWebAndZarvoRaw(file, m_Header, m_BlocksInfo);
-        m_DirectoryReady = false;
+        SetDirectoryReady(false);
     } else {
         result = ReadBlockBasedHeader(file, offset);
     }
@@ -135,21 +145,21 @@ int ArchiveStorageReader::ReadHeader(UInt64 offset) {
 
     const UInt64 dataOffset = GetDataOffset(m_Header);
     if (offset > kMaxFilePosition - dataOffset) return kHeaderShortRead;
-    m_DataOffset = dataOffset + offset;
-    if (!m_File.Seek(VFS::FileOffset(VFS::FileSize(m_DataOffset)), kFileOriginBegin)) return kHeaderShortRead;
+    if (!archive.Seek(VFS::FileOffset(VFS::FileSize(dataOffset + offset)), kFileOriginBegin)) return kHeaderShortRead;
+    m_Storage.SetDataOffset(dataOffset + offset);
 
     if (m_Header.signature == kSignatureWeb && !m_BlocksInfo.storageBlocks.empty()) {
         UInt32& compressedSize = m_BlocksInfo.storageBlocks[0].compressedSize;
-        // The field is there only where there is more than the field itself.
+        // A smaller block has no size field.
         if (compressedSize > kLzmaSizeFieldSize) {
-            m_HideLzmaSizeField = true;
+            m_Storage.HideLzmaSizeField();
             compressedSize -= kLzmaSizeFieldSize;
         }
     }
     return kHeaderOk;
 }
 
-int ArchiveStorageReader::ReadBlockBasedHeader(FileAccessor& file, UInt64 offset) {
+HeaderResult ArchiveStorageReader::ReadBlockBasedHeader(FileAccessor& file, UInt64 offset) {
     if (const HeaderResult result = ArchiveStorageHeader::ReadHeader(file, m_Header); result != kHeaderOk)
         return result;
 
@@ -167,56 +177,51 @@ int ArchiveStorageReader::ReadBlockBasedHeader(FileAccessor& file, UInt64 offset
     return ReadBlocksInfoSection(file);
 }
 
-// Reads the block list and, where the header says so, the directory behind it.
-int ArchiveStorageReader::ReadBlocksInfoSection(FileAccessor& file) {
+// Reads the block list and, when the header says so, the directory that follows it.
+HeaderResult ArchiveStorageReader::ReadBlocksInfoSection(FileAccessor& file) {
     HeaderResult result = ReadBlocksInfo(file, m_Header, m_BlocksInfo);
     if (result == kHeaderOk && (m_Header.flags & kArchiveDirectoryInBlocksInfo) != 0)
         result = ReadDirectoryInfo(file, m_Header, m_DirectoryInfo);
-    m_DirectoryReady = result == kHeaderOk;
+    SetDirectoryReady(result == kHeaderOk);
     return result;
 }
 
 namespace {
 
-// A buffer for the time of a call: on the stack when it is small. A size of 0 gives none.
+// A buffer for one call, on the stack when it is small. Null when the size is 0 or memory is refused.
 class ScratchBuffer : private NonCopyable {
 public:
     explicit ScratchBuffer(size_t size) {
-        if (size == 0) return;
-        m_Data = size < sizeof(m_Stack)
-                     ? m_Stack
-                     : malloc_internal(size, 1, kMemLabelGeneral, kAllocateOptionNone, __FILE__, __LINE__);
-    }
-    ~ScratchBuffer() {
-        if (m_Data != m_Stack) free_alloc_internal(m_Data, kMemLabelGeneral, __FILE__, __LINE__);
+        if (size >= sizeof(m_Stack))
+            m_Heap = {
+                static_cast<char*>(malloc_internal(size, 1, kMemLabelGeneral, kAllocateOptionNone, __FILE__, __LINE__)),
+                kMemLabelGeneral};
+        m_Data = size == 0 ? nullptr : size < sizeof(m_Stack) ? m_Stack : m_Heap.get();
     }
 
     void* Data() { return m_Data; }
 
 private:
-    void* m_Data = nullptr;
     char m_Stack[2000];
+    Owned<char> m_Heap;
+    char* m_Data;
 };
 
-// LZ4 can't make more of a byte than this: a header that promises more is damaged.
+// LZ4 makes at most this many bytes of one; a header that promises more is damaged.
 constexpr UInt64 kMaxLz4Expansion = 255;
 
 bool IsPossibleSize(CompressionType type, UInt64 compressedSize, UInt64 uncompressedSize) {
     const bool isLz4 = type == kCompressionLz4 || type == kCompressionLz4HC;
-    // Sizes that the decompressor does not take are left to it: it reports them.
+    // The decompressor itself refuses and reports sizes that it doesn't take.
     return !isLz4 || uncompressedSize >= Lz4Decompressor::kSizeLimit ||
            uncompressedSize <= compressedSize * kMaxLz4Expansion;
 }
 
 } // namespace
 
-int ArchiveStorageReader::ReadCompressedBlocksInfo(FileAccessor& file, CompressionType type) {
-    IDecompressor* decompressor = CreateDecompressor(type, kMemLabelGeneral);
-    if (decompressor == nullptr) return kHeaderNotAnArchive;
-    struct DeleteAtEnd {
-        ~DeleteAtEnd() { Delete(decompressor, kMemLabelGeneral); }
-        IDecompressor* decompressor;
-    } const deleteAtEnd{decompressor};
+HeaderResult ArchiveStorageReader::ReadCompressedBlocksInfo(FileAccessor& file, CompressionType type) {
+    const Owned<IDecompressor> decompressor(CreateDecompressor(type, kMemLabelGeneral), kMemLabelGeneral);
+    if (!decompressor) return kHeaderNotAnArchive;
 
     const size_t compressedSize = m_Header.compressedBlocksInfoSize;
     const size_t uncompressedSize = m_Header.uncompressedBlocksInfoSize;
@@ -244,43 +249,12 @@ int ArchiveStorageReader::ReadCompressedBlocksInfo(FileAccessor& file, Compressi
     return ReadBlocksInfoSection(sectionFile);
 }
 
-bool ArchiveStorageReader::MakeStorageUsed(bool reportErrors) {
-    Mutex::AutoLock lock(m_StorageLock);
-    if (m_StorageUseCount++ == 0 && !m_File.Open(m_FileEntry, kFilePermissionRead)) {
-        if (reportErrors) ReportError(Format("Unable to open archive file: %s", m_FileEntry.Path()).c_str());
-        return false;
-    }
-    if (!m_CheckModificationTime) return true;
-    const DateTime lastModified = m_FileEntry.LastModified();
-    if (m_FileEntry.lastError != kFileSystemErrorNone)
-        ReportFailedCheck(Format("Unexpected FileSystemError code %i after call to FileSystemEntry::LastModified() \n",
-                                 static_cast<int>(m_FileEntry.lastError))
-                              .c_str());
-    if (lastModified == m_LastModified) return true;
-    if (reportErrors)
-        ReportError(Format("Archive file was modified while it was opened, and can no longer be accessed: %s",
-                           m_FileEntry.Path())
-                        .c_str());
-    return false;
-}
-
-void ArchiveStorageReader::MakeStorageUnused() {
-    if (!m_ReleaseStorageWhenUnused) return;
-    {
-        Mutex::AutoLock lock(m_StorageLock);
-        Check(m_StorageUseCount >= 1, "ArchiveStorageReader has mismatched MakeStorageUsed/MakeStorageUnused calls");
-        if (m_StorageUseCount-- != 1) return;
-        (void)m_File.Close(); // opened for reading: nothing is lost
-    }
-    EmptyCache();
-}
-
 bool ArchiveStorageReader::FindDirectory(DirectoryPieces pieces) {
     if (IsDirectoryReady()) return true;
     dynamic_array<UInt8> piece(kMemLabelGeneral);
     if (!piece.resize_uninitialized(kDirectoryPieceSize, kResizeExact)) return false;
     const bool isWhole = pieces == kDirectoryPiecesWhole;
-    // Through the cache, a stream that is cut short delivers what it holds.
+    // Through the cache, a stream that is cut short still delivers the bytes it holds.
     const FileReadFlags flags = isWhole ? kFileReadFlagsNone : kFileReadFlagsThroughCache;
     UInt64 position = m_DirectoryScanner.Position();
     while (!IsDirectoryReady() && CanDirectoryBecomeReady()) {
@@ -298,45 +272,46 @@ bool ArchiveStorageReader::CanDirectoryBecomeReady() const {
     return m_DirectoryScanner.CanCompleteWithin(m_UncompressedBlocksOffsets.back());
 }
 
+// Publishes the directory: a thread that sees it ready sees all of it.
+void ArchiveStorageReader::SetDirectoryReady(bool isReady) {
+    m_DirectoryReady.store(isReady, std::memory_order_release);
+}
+
 void ArchiveStorageReader::TryToReadDirectoryFromBlockData(UInt64 from, const void* data, size_t size) {
-    const UInt64 collected = m_DirectoryFile != nullptr ? m_DirectoryFile->Size().Cast<UInt64>() : 0;
-    // Only bytes that follow one another from the stream's start are collected: a gap would read as an empty directory.
+    const UInt64 collected = m_DirectoryFile ? m_DirectoryFile->Size().Cast<UInt64>() : 0;
+    // Collect only bytes that follow each other from the start of the stream: a gap would read as an empty directory.
     if (from != collected || from != m_DirectoryScanner.Position()) return;
     const bool isComplete = m_DirectoryScanner.Scan(static_cast<const UInt8*>(data), size);
-    // What can't end in a directory is not collected.
+    // Don't collect a stream that can't hold a directory.
     if (!CanDirectoryBecomeReady()) return;
 
-    if (isComplete && m_DirectoryFile == nullptr) {
-        // The whole directory lies in the caller's buffer, and is read in place.
-        auto* contents =
-            New<SingleBlockMemoryFileData>(kMemLabelGeneral, kMemLabelGeneral, const_cast<void*>(data), size, false);
-        if (contents == nullptr) return;
+    if (isComplete && !m_DirectoryFile) {
+        // The whole directory lies in the caller's buffer: parse it there.
+        auto* contents = RequireMemory(
+            New<SingleBlockMemoryFileData>(kMemLabelGeneral, kMemLabelGeneral, const_cast<void*>(data), size, false));
         MemoryFile file(kMemLabelGeneral, contents, kFilePermissionRead);
         contents->Release();
-        m_DirectoryReady = TryReadDirectoryInfoFromFile(&file);
+        SetDirectoryReady(TryReadDirectoryInfoFromFile(&file));
         return;
     }
 
-    if (m_DirectoryFile == nullptr) {
-        auto* contents = New<MultiBlocksMemoryFileData>(m_Label, m_Label, MultiBlocksMemoryFileData::kDefaultBlockSize);
-        if (contents == nullptr) return;
-        m_DirectoryFile = New<MemoryFile>(m_Label, m_Label, contents, kFilePermissionReadWrite);
+    if (!m_DirectoryFile) {
+        auto* contents = RequireMemory(
+            New<MultiBlocksMemoryFileData>(m_Label, m_Label, MultiBlocksMemoryFileData::kDefaultBlockSize));
+        m_DirectoryFile = {RequireMemory(New<MemoryFile>(m_Label, m_Label, contents, kFilePermissionReadWrite)),
+                           m_Label};
         contents->Release();
-        if (m_DirectoryFile == nullptr) return;
     }
     UInt64 written = 0;
     if (!m_DirectoryFile->Write(VFS::FileSize(from), size, data, &written) || written != size) return;
     if (!isComplete) return;
-    m_DirectoryReady = TryReadDirectoryInfoFromFile(m_DirectoryFile);
-    if (!m_DirectoryReady) return;
-    Delete(m_DirectoryFile, m_Label);
-    m_DirectoryFile = nullptr;
+    SetDirectoryReady(TryReadDirectoryInfoFromFile(m_DirectoryFile.get()));
+    if (IsDirectoryReady()) m_DirectoryFile = {};
 }
 
 bool ArchiveStorageReader::TryReadDirectoryInfoFromFile(IFile* file) {
     FileAccessor accessor;
-    // An open memory file can be opened, and its start sought.
     if (!OpenFile(file, &accessor)) return false;
-    (void)accessor.Seek(0, kFileOriginBegin);
+    (void)accessor.Seek(0, kFileOriginBegin); // a memory file has a start
     return ReadDirectoryInfo(accessor, m_Header, m_DirectoryInfo) == kHeaderOk;
 }

@@ -4,8 +4,9 @@
 //   ArchiveStorageReader reader(kMemLabelFileSystem);
 //   if (reader.Initialize(core::string("archive.zarvo"), 0) != 0 || !reader.FindDirectory()) return;
 //   for (const ArchiveStorageHeader::Node& node : reader.GetDirectoryInfo().nodes) {
-//       UInt64 count = 0;                                     // may be less than asked: go on from there
-//       reader.Read(node.offset, node.size, buffer, &count);
+//       UInt64 count = 0;
+//       if (!reader.Read(node.offset, node.size, buffer, &count)) ...   // damaged
+//       if (count < node.size) ...                                      // read on from node.offset + count
 //   }
 //
 // Threads: once Initialize has returned 0, Read, MakeStorageUsed and MakeStorageUnused may be called from any thread.
@@ -19,10 +20,12 @@
 //   n = 1    n + 1                     n 0, closes the file, then empties the cache   delivers
 //   n > 1    n + 1                     n - 1                                          delivers
 //
-// Locks: m_StorageLock guards the open file, m_CacheLock the list of cached blocks. No operation holds both, neither is
-// held while data is decompressed, and m_CacheLock is never held while the file is read.
+// Locks: Storage locks the open file for itself and never calls the reader; m_CacheLock guards the list of cached
+// blocks. So no operation holds both. No lock is held while data is decompressed, and m_CacheLock is not held while the
+// file is read.
 #pragma once
 
+#include "Runtime/Allocator/Owned.h"
 #include "Runtime/Core/Containers/DynamicArray.h"
 #include "Runtime/Core/Containers/String.h"
 #include "Runtime/Core/SharedObject.h"
@@ -53,20 +56,21 @@ public:
     // canReleaseStorage: whether MakeStorageUnused may close the file. reportErrors: whether a file that can't be
     // opened, has been changed or has an unreadable header is reported as an error.
     [[nodiscard]] int Initialize(FileSystemEntry& entry, VFS::FileSize offset, bool canReleaseStorage,
-                                 bool reportErrors) VARNEX_NO_THREAD_SAFETY_ANALYSIS; // no other thread uses it yet
+                                 bool reportErrors);
 
-    // Brackets a time of use: the file is open while there are more calls of the first than of the second (Initialize
-    // counts as one call of MakeStorageUsed). False when the file can't be opened or has been changed since Initialize;
-    // the call is to be balanced all the same. When the last use ends the cache is emptied, too: no read may be under
-    // way then.
+    // A pair of calls brackets a time of use: the file is open while there have been more calls of MakeStorageUsed than
+    // of MakeStorageUnused (Initialize counts as one of the first). MakeStorageUsed is false when the file can't be
+    // opened or has been changed since Initialize; even then, call MakeStorageUnused for it. The end of the last use
+    // also empties the cache, so no read may be under way.
     [[nodiscard]] bool MakeStorageUsed(bool reportErrors);
     void MakeStorageUnused();
 
-    // Copies up to size bytes of the data stream, from position from on, into buffer, and stores the number delivered
-    // in *read. True when at least one byte was delivered, or when size is 0 and from lies inside the stream. A range
-    // that passes the stream's end is refused whole. *read may be less than size when an archive is damaged or cut
-    // short; on false it is unchanged or 0.
-    bool Read(VFS::FileSize from, UInt64 size, void* buffer, UInt64* read, FileReadFlags flags = kFileReadFlagsNone);
+    // Copies bytes [from, from + size) of the data stream into buffer and sets *read to the number delivered, which is
+    // less than size when the archive is damaged or cut short. True when at least one byte was delivered, or when size
+    // is 0 and from lies inside the stream; after false, *read is unchanged or 0. A range that passes the end of the
+    // stream is refused whole.
+    [[nodiscard]] bool Read(VFS::FileSize from, UInt64 size, void* buffer, UInt64* read,
+                            FileReadFlags flags = kFileReadFlagsNone);
 
     const ArchiveStorageHeader::Header& GetHeader() const { return m_Header; }
     const ArchiveStorageHeader::DirectoryInfo& GetDirectoryInfo() const { return m_DirectoryInfo; }
@@ -74,27 +78,27 @@ public:
     // Whether GetDirectoryInfo holds the archive's directory.
     bool IsDirectoryReady() const { return m_DirectoryReady.load(std::memory_order_acquire); }
 
-    // How FindDirectory cuts the stream.
+    // The pieces in which FindDirectory reads the stream: kDirectoryPieceSize bytes each.
     enum DirectoryPieces {
-        kDirectoryPiecesUpToTheEnd, // the last is as short as the rest of the stream
-        kDirectoryPiecesWhole,      // kDirectoryPieceSize each: in a stream with less left, the directory is not found
+        kDirectoryPiecesUpToTheEnd, // the last one may be shorter
+        kDirectoryPiecesWhole,      // a directory that ends in a shorter last piece is not found
     };
     static constexpr UInt64 kDirectoryPieceSize = 65'536;
 
-    // Makes sure that GetDirectoryInfo holds the directory: where it lies inside the compressed data, reads the stream
-    // in order, as far as is needed. False when there is none to be found, when the data before its end is damaged, or
-    // when memory is refused. Once Initialize has returned 0; by one thread, and no other reads meanwhile.
+    // Makes GetDirectoryInfo hold the directory. If that lies inside the compressed data, reads the stream from its
+    // start, as far as needed. False when the stream holds no directory, when the data up to its end is damaged, or
+    // when memory is refused. Call it once Initialize has returned 0, from one thread, and with no other read under
+    // way.
     [[nodiscard]] bool FindDirectory(DirectoryPieces pieces = kDirectoryPiecesUpToTheEnd);
 
-    // False once what has been read shows that the stream holds no directory: reading on is then of no use. For callers
-    // that read by themselves, from the start of the stream in order; only what follows the reads before counts. Once
-    // Initialize has returned 0; by the thread that makes the reads.
+    // False once the bytes read so far show that the stream holds no directory, so that reading on is useless. For
+    // callers that read the stream themselves, from its start and in order; other reads don't count. Call it once
+    // Initialize has returned 0, from the thread that reads.
     bool CanDirectoryBecomeReady() const;
 
-    // For tools that work block by block: one storage block, and where it lies. All numbers are the archive's own and
-    // nobody has compared them with the file: a piece may pass the file's end, and a size may be more than there is
-    // memory for. Before its bytes are used, compare a piece with the file's size, as
-    // offset <= fileSize && size <= fileSize - offset; a sum of its own could wrap.
+    // For tools that work block by block: one storage block, and where it lies. The numbers are the archive's own,
+    // compared with nothing: a piece may pass the end of the file, and a size may exceed the memory there is. Before
+    // you use a piece, check that offset <= fileSize && size <= fileSize - offset; offset + size may wrap.
     struct Block {
         struct Piece {
             UInt64 offset; // in the file, whatever the archive's own offset in it
@@ -105,12 +109,12 @@ public:
         UInt32 size;          // in the data stream; 0 is allowed
         UInt32 storedSize;    // of the pieces together
         CompressionType type; // 0 to 63: also kinds that have no decompressor
-        bool isStreamed;      // decompressed from its start on, as one stream; never true of a block stored as is
+        bool isStreamed;      // decompressed from its start on, as one stream; false for a block stored as is
 
-        // The stored bytes, in their order. Only a ZarvoWeb archive has a second piece that is not empty: 8 bytes
-        // between the LZMA properties and the coded data belong to neither. Of a block stored as is, Read takes size
-        // bytes from here, whatever storedSize says. A block that is not streamed, has two equal sizes and a
-        // decompressor for its type holds plain bytes, too.
+        // The stored bytes, in order. The second piece is empty except in a ZarvoWeb archive, where 8 bytes between the
+        // LZMA properties and the coded data belong to neither piece. Read takes size bytes of a block stored as is,
+        // whatever storedSize says. The stored bytes are plain, too, when the block is not streamed, its two sizes are
+        // equal and its type has a decompressor.
         Piece pieces[2];
     };
 
@@ -122,37 +126,8 @@ public:
 private:
     friend struct ArchiveStorageReaderTestAccess;
 
-    // Decompressed data of one block: the whole of a chunk block, or a window of a streamed one.
-    //
-    // States by operations (w: beingWritten, r: bufferReaders):
-    //
-    //                       acquire of its block    victim scan     release or end of fill      EmptyCache
-    //   idle     w 0, r 0   chunk: r 1, shared      w 1, r 1,       (not held)                  freed
-    //                       streamed: w 1, r 1,     filling another
-    //                       owned                   block
-    //   filling  w 1, r 1   chunk: r + 1, then      skipped         filled: owned, or a chunk   kept
-    //                       waits for w 0                           w 0, shared; failed: names
-    //                       streamed: skipped                       no block, r - 1, w 0
-    //   shared   w 0, r n   r + 1                   given back      r - 1                       kept
-    //   owned    w 1, r 1   skipped                 skipped         r 0, w 0                    kept
-    //
-    // Acquiring, scanning, naming a block or none, and stamps are done under m_CacheLock; the rest of a record is its
-    // filler's (or owner's), and once it is shared only read. A record with readers is never pointed at another block;
-    // only its filler (or owner), whose fill has failed, makes it name none. Those who waited for it see that.
-    struct CachedBlock {
-        explicit CachedBlock(MemLabelId label) : buffer(label), compressedBuffer(label) {}
-
-        UInt32 blockIndex = kNoBlock;
-        UInt32 blockOffset = ~UInt32{0}; // of buffer's first byte, in the block's data
-        dynamic_array<UInt8> buffer;
-        std::atomic<SInt32> bufferReaders{0};
-        std::atomic<SInt32> beingWritten{1};   // a new record is its maker's
-        UInt32 lastAccess = 0;                 // a smaller stamp is less recently used
-        void* streamState = nullptr;           // of a streamed block whose kind can be streamed
-        dynamic_array<UInt8> compressedBuffer; // stored bytes: a whole chunk, or a piece of a stream
-        UInt32 compressedPos = 0;              // streamed: what of compressedBuffer has been consumed
-        UInt32 compressedLoaded = 0;           // streamed: how many of the block's stored bytes have been loaded
-    };
+    struct CachedBlock;       // CachedBlock.h
+    class BatchingFileReader; // BatchingFileReader.h
 
     enum CacheResult : SInt32 {
         kCacheResultReadError = -2,
@@ -161,57 +136,58 @@ private:
         kCacheResultIncomplete = 1, // stored bytes, or the stream, ended early
     };
 
-    // Delivers stored bytes to one Read call: straight from the file, or, when the call spans blocks, out of a window
-    // that is read ahead. Positions are relative to m_DataOffset.
-    class BatchingFileReader {
+    // The archive file, how many use it, and where its data starts. Positions are those of stored bytes: 0 is the first
+    // byte of block 0. The lock is private and no operation calls the reader, so nobody can hold it together with
+    // m_CacheLock; and nobody calls Storage under m_CacheLock. In ArchiveStorageReaderStorage.cpp.
+    class Storage {
     public:
-        BatchingFileReader(ArchiveStorageReader* reader, UInt64 batchSize, UInt64 startPos, UInt64 endPos,
-                           UInt64 wantedEnd);
-        bool Read(void* destination, UInt64 position, UInt64 size, UInt64* delivered);
+        // Set-up, while no other thread uses the reader; so these take no lock.
+        void SetEntry(FileSystemEntry& entry, bool canRelease) VARNEX_NO_THREAD_SAFETY_ANALYSIS;
+        FileAccessor& GetFile() VARNEX_NO_THREAD_SAFETY_ANALYSIS { return m_File; }
+        const FileSystemEntry& GetEntry() const VARNEX_NO_THREAD_SAFETY_ANALYSIS { return m_Entry; }
+        void SetDataOffset(UInt64 dataOffset) { m_DataOffset = dataOffset; }
+        void HideLzmaSizeField() { m_HideLzmaSizeField = true; }
+
+        // See MakeStorageUsed and MakeStorageUnused.
+        [[nodiscard]] bool MakeUsed(bool reportErrors);
+        // Whether the file has been closed.
+        [[nodiscard]] bool MakeUnused();
+
+        [[nodiscard]] bool ReadFromStorage(UInt64 position, UInt64 size, void* destination, UInt64* delivered);
+        // Whether the file ends at or before this position.
+        bool EndsBy(UInt64 position);
+        // Where stored bytes lie in the file: pieces[1] is empty unless they lie on both sides of a hidden field.
+        void Locate(UInt64 position, UInt64 size, Block::Piece (&pieces)[2]) const;
 
     private:
-        ArchiveStorageReader* m_Reader;
-        UInt64 m_BatchSize; // 0: no window
-        UInt64 m_StartPos;  // the call may read [m_StartPos, m_EndPos)
-        UInt64 m_EndPos;
-        UInt64 m_WantedEnd; // no more is read ahead, unless more is asked for
-        UInt64 m_LoadedWindowStart = 0;
-        UInt64 m_LoadedWindowEnd = 0;
-        dynamic_array<UInt8> m_Buffer;
+        FileSystemEntry m_Entry VARNEX_GUARDED_BY(m_Lock); // queries of it leave a code in it
+        FileAccessor m_File VARNEX_GUARDED_BY(m_Lock);
+        SInt32 m_UseCount VARNEX_GUARDED_BY(m_Lock) = 0;
+        Mutex m_Lock;
+        UInt64 m_DataOffset = 0; // in the file, of the first stored byte of block 0
+        // ZarvoWeb: positions are counted as if the 8 bytes after the 5 bytes of LZMA properties were not there.
+        bool m_HideLzmaSizeField = false;
+        bool m_CanRelease = true;
+        bool m_CheckModificationTime = true;
+        DateTime m_LastModified;
     };
 
     static constexpr UInt32 kNoBlock = ~UInt32{0};
     static constexpr UInt32 kStreamWindowSize = 65'536; // of output, and of the input pieces that it is made from
-    static constexpr UInt64 kBatchSize = 4'194'304;
     static constexpr UInt32 kLzmaPropertiesSize = 5;
-    static constexpr UInt32 kLzmaSizeFieldSize = 8; // behind the properties, in ZarvoWeb archives
+    static constexpr UInt32 kLzmaSizeFieldSize = 8; // after the properties, in ZarvoWeb archives
 
     // Set-up, in ArchiveStorageReader.cpp. Runs while no other thread uses the reader, so it takes no lock.
-    int ReadHeader(UInt64 offset) VARNEX_NO_THREAD_SAFETY_ANALYSIS;
-    int ReadBlockBasedHeader(FileAccessor& file, UInt64 offset);
-    int ReadCompressedBlocksInfo(FileAccessor& file, CompressionType type);
-    int ReadBlocksInfoSection(FileAccessor& file);
+    ArchiveStorageHeader::HeaderResult ReadHeader(UInt64 offset);
+    ArchiveStorageHeader::HeaderResult ReadBlockBasedHeader(FileAccessor& file, UInt64 offset);
+    ArchiveStorageHeader::HeaderResult ReadCompressedBlocksInfo(FileAccessor& file, CompressionType type);
+    ArchiveStorageHeader::HeaderResult ReadBlocksInfoSection(FileAccessor& file);
     [[nodiscard]] bool BuildOffsetTables();
+    void SetDirectoryReady(bool isReady);
     void TryToReadDirectoryFromBlockData(UInt64 from, const void* data, size_t size);
-    bool TryReadDirectoryInfoFromFile(IFile* file);
+    [[nodiscard]] bool TryReadDirectoryInfoFromFile(IFile* file);
 
-    // The block cache, in ArchiveStorageReaderCache.cpp.
-    CachedBlock* AcquireCachedBlock(UInt32 blockIndex, UInt32 offsetInBlock);
-    CachedBlock* AcquireAndPrefillUnusedBlock(UInt32 blockIndex, CacheResult* result, BatchingFileReader* reader);
-    CachedBlock* FindChunk(UInt32 blockIndex) VARNEX_REQUIRES(m_CacheLock);
-    CachedBlock* ClaimStream(UInt32 blockIndex, UInt32 offsetInBlock) VARNEX_REQUIRES(m_CacheLock);
-    CachedBlock* ClaimVictim() VARNEX_REQUIRES(m_CacheLock);
-    CachedBlock* AddCachedBlock() VARNEX_REQUIRES(m_CacheLock);
-    void ReleaseCachedBlock(CachedBlock* block, bool isStreamed);
-    void ReinitCachedBlock(CachedBlock* block, UInt32 blockIndex);
-    void DeinitCachedBlock(CachedBlock* block);
-    CacheResult FillStreamCachedBlock(CachedBlock* block, UInt64 maxSize, BatchingFileReader* reader);
-    CacheResult FillChunkCachedBlock(CachedBlock* block, BatchingFileReader* reader);
-    void StampCachedBlock(CachedBlock* block);
-    void EmptyCache();
-    void NoteBrokenBlock(const BrokenBlocks::Record& record);
-    BrokenBlocks::Record FindBrokenBlock(UInt32 blockIndex);
-    IDecompressor* GetDecompressor(CompressionType type);
+    // Blocks, in ArchiveStorageReader.cpp. kNoBlock counts as stored as is, and not streamed.
     CompressionType GetBlockType(UInt32 blockIndex) const;
     bool IsBlockStreamed(UInt32 blockIndex) const;
 
@@ -221,47 +197,54 @@ private:
     bool ReadCompleteBlock(UInt32 blockIndex, void* destination, UInt64* delivered, BatchingFileReader* batch);
     bool ReadBlock(UInt32 blockIndex, UInt64 offsetInBlock, UInt64 size, void* destination, UInt64* delivered,
                    BatchingFileReader* batch);
+
+    // The block cache, in ArchiveStorageReaderCache.cpp.
+    CachedBlock* AcquireCachedBlock(UInt32 blockIndex, UInt32 offsetInBlock);
+    CachedBlock* AcquireAndPrefillUnusedBlock(UInt32 blockIndex, CacheResult* result, BatchingFileReader* reader);
+    CachedBlock* FindChunk(UInt32 blockIndex) VARNEX_REQUIRES(m_CacheLock);
+    CachedBlock* ClaimStream(UInt32 blockIndex, UInt32 offsetInBlock) VARNEX_REQUIRES(m_CacheLock);
+    CachedBlock* ClaimVictim() VARNEX_REQUIRES(m_CacheLock);
+    CachedBlock* AddCachedBlock() VARNEX_REQUIRES(m_CacheLock);
     CacheResult CopyFromCachedBlock(CachedBlock* record, UInt64 offsetInBlock, UInt64 size, void* destination,
-                                    UInt64* delivered, BatchingFileReader* batch);
-    bool ReadFromStorage(UInt64 position, UInt64 size, void* destination, UInt64* delivered);
-    bool IsBehindStorageEnd(UInt64 position);
+                                    UInt64* delivered, BatchingFileReader* reader);
+    void ReleaseCachedBlock(CachedBlock* block, CacheResult result);
+    void ReinitCachedBlock(CachedBlock* block, UInt32 blockIndex);
+    void DeinitCachedBlock(CachedBlock* block);
+    CacheResult FillStreamCachedBlock(CachedBlock* block, UInt64 maxSize, BatchingFileReader* reader);
+    CacheResult LoadStreamInput(CachedBlock* block, UInt64 brokenFrom, BatchingFileReader* reader);
+    CacheResult FillChunkCachedBlock(CachedBlock* block, BatchingFileReader* reader);
+    void StampCachedBlock(CachedBlock* block);
+    void EmptyCache();
+    void NoteBrokenBlock(const BrokenBlocks::Record& record);
+    void NoteBrokenStream(const CachedBlock& block, UInt64 from);
+    BrokenBlocks::Record FindBrokenBlock(UInt32 blockIndex);
+    IDecompressor* GetDecompressor(CompressionType type);
 
     ArchiveStorageHeader::Header m_Header;
     ArchiveStorageHeader::BlocksInfo m_BlocksInfo;
     ArchiveStorageHeader::DirectoryInfo m_DirectoryInfo;
 
     // Block count + 1 entries each, once initialised: where block i starts in the data stream, and where its stored
-    // bytes start, relative to m_DataOffset; the last entry is the end.
+    // bytes start; the last entry is the end.
     dynamic_array<UInt64> m_UncompressedBlocksOffsets;
     dynamic_array<UInt64> m_CompressedBlocksOffsets;
 
-    // For each block and the end, the first block at or behind it that a read can't leave out. Without an entry when
-    // that is always the next one.
+    // For each block and the end, the first block from it on that a read can't leave out. Empty when no block can be
+    // left out.
     dynamic_array<UInt32> m_NextBlocks;
 
-    MemoryFile* m_DirectoryFile = nullptr; // owned; the start of the stream, until a directory can be parsed from it
+    Owned<MemoryFile> m_DirectoryFile; // the start of the stream, until a directory can be parsed from it
     LegacyDirectoryScanner m_DirectoryScanner;
     std::atomic<bool> m_DirectoryReady{false};
-    FileSystemEntry m_FileEntry VARNEX_GUARDED_BY(m_StorageLock); // queries of it leave a code in it
-    FileAccessor m_File VARNEX_GUARDED_BY(m_StorageLock);
-    bool m_ReleaseStorageWhenUnused = true;
-    UInt64 m_DataOffset = 0; // in the file, of the first stored byte of block 0
-    SInt32 m_StorageUseCount VARNEX_GUARDED_BY(m_StorageLock) = 0;
-    Mutex m_StorageLock;
+    Storage m_Storage;
 
-    // ZarvoWeb: stored positions are counted as if the 8 bytes behind the 5 bytes of LZMA properties were not there.
-    bool m_HideLzmaSizeField = false;
-
-    bool m_CheckModificationTime = true;
-    DateTime m_LastModified;
-    dynamic_array<CachedBlock*> m_CachedBlocks VARNEX_GUARDED_BY(m_CacheLock);
-
-    // A stream of which only a decoding in one window has failed is noted as broken from its end on.
+    dynamic_array<CachedBlock*> m_CachedBlocks VARNEX_GUARDED_BY(m_CacheLock); // owned
+    // A stream is noted as broken from its end on when it has failed only as a whole, in one window.
     BrokenBlocks m_BrokenBlocks VARNEX_GUARDED_BY(m_CacheLock);
     std::atomic<bool> m_HasBrokenBlocks{false};
-
     Mutex m_CacheLock;
     std::atomic<UInt32> m_AccessCounter{0};
+
     std::atomic<IDecompressor*> m_Decompressors[kCompressionCount] = {}; // owned; made on first use
     MemLabelId m_Label;
 };

@@ -21,9 +21,9 @@ void BrokenBlocks::Clear() {
     m_Count = 0;
 }
 
-// The record of a block, or the free one where it belongs.
+// The slot of a block's record, or the free slot where it belongs.
 size_t BrokenBlocks::SlotOf(const dynamic_array<Record>& table, UInt32 blockIndex) {
-    constexpr UInt64 kGoldenRatio = 0x9E3779B97F4A7C15; // spreads indexes with a common factor
+    constexpr UInt64 kGoldenRatio = 0x9E3779B97F4A7C15; // spreads indexes that share a factor
     const size_t mask = table.size() - 1;
     size_t slot = static_cast<size_t>(blockIndex * kGoldenRatio >> 32) & mask;
     while (table[slot].blockIndex != kNoBlock && table[slot].blockIndex != blockIndex)

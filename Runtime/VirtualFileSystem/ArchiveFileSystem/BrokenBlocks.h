@@ -1,5 +1,5 @@
-// Which blocks of an archive are known to be damaged, so that not every file in them pays for finding out. Takes memory
-// only for those. A thread must have the object to itself.
+// Which blocks of an archive are known to be damaged, so that the next file in such a block doesn't decode it again.
+// Takes memory only for damaged blocks. One thread at a time.
 #pragma once
 
 #include "Runtime/Core/Containers/DynamicArray.h"
@@ -8,19 +8,19 @@
 class BrokenBlocks {
 public:
     struct Record {
-        UInt64 from = ~UInt64{0}; // where in the block's data the first window starts that can't be had
+        UInt64 from = ~UInt64{0}; // in the block's data: the start of the first window that can't be decoded
         UInt32 blockIndex = kNoBlock;
-        bool isCut = false; // the stored bytes end early: nothing is delivered, but that is no failure
+        bool isCut = false; // the stored bytes end early: reads deliver nothing, but succeed
 
         bool IsKnown() const { return blockIndex != kNoBlock; }
     };
 
     explicit BrokenBlocks(MemLabelId label) : m_Table(label) {}
 
-    // What is known of a block; a default record when that is nothing.
+    // The note of a block, or a default record when there is none.
     Record Find(UInt32 blockIndex) const;
 
-    // Of two notes of one block, the smaller from holds. When memory is refused nothing is noted.
+    // Keeps the note with the smaller from when a block has two. Notes nothing when memory is refused.
     void Note(const Record& record);
 
     void Clear();
@@ -31,6 +31,6 @@ private:
     static size_t SlotOf(const dynamic_array<Record>& table, UInt32 blockIndex);
     bool Grow();
 
-    dynamic_array<Record> m_Table; // open addressing, at most half full; its size is 0 or a power of 2
+    dynamic_array<Record> m_Table; // open addressing, at most half full; size 0 or a power of 2
     size_t m_Count = 0;
 };

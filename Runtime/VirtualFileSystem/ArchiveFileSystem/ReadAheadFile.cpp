@@ -27,7 +27,7 @@ bool ReadAheadFile::Read(UInt64 size, void* out, UInt64* actual, FileReadFlags f
         }
         if (m_FilePosition != m_Position && !SeekFile(VFS::FileOffset(VFS::FileSize(m_Position)))) break;
         const bool isLarge = size - delivered >= kBufferSize;
-        if (!isLarge) m_BufferEnd = m_BufferStart; // a read that fails may have written to the buffer
+        if (!isLarge) m_BufferEnd = m_BufferStart; // a failed read may still write to the buffer
         UInt64 count = 0;
         if (!m_File->Read(isLarge ? size - delivered : kBufferSize, isLarge ? to + delivered : m_Buffer, &count, flags))
             break;

@@ -1,8 +1,8 @@
-// Reads an open file through a buffer, so that a parser that asks for a few bytes at a time and steps back and forth
-// costs one call of the file for many fields. It answers what a file on disk would.
+// Reads an open file through a buffer: a parser that reads a few bytes at a time, and steps back and forth, then calls
+// the file once for many fields. Answers as a file on disk would.
 //
-//   ReadAheadFile ahead(&file);   // file stays open, and untouched by others, for as long as this is used
-//   file.Seek(...);               // afterwards, since its position is anywhere then
+//   ReadAheadFile ahead(&file);   // nobody else may use the file meanwhile
+//   file.Seek(...);               // afterwards: its position may be anywhere
 //
 // For reading only. One thread at a time.
 #pragma once
@@ -20,13 +20,13 @@ public:
 
     bool Read(VFS::FileSize from, UInt64 size, void* out, UInt64* actual, FileReadFlags flags) override;
 
-    // False, as the file's own, when nothing is left.
+    // False when nothing is left, as that of a file on disk.
     bool Read(UInt64 size, void* out, UInt64* actual, FileReadFlags flags) override;
 
     bool Write(VFS::FileSize, UInt64, const void*, UInt64*) override { return false; }
     bool Write(UInt64, const void*, UInt64*) override { return false; }
 
-    // kFileOriginEnd counts as the file counts it.
+    // kFileOriginEnd is passed on to the file.
     bool Seek(VFS::FileOffset offset, FileOrigin origin) override;
     VFS::FileSize Position() const override { return m_Position; }
     bool SetLength(VFS::FileSize) override { return false; }

@@ -1,157 +1,155 @@
 #include "Tests/Runtime/VirtualFileSystem/ArchiveFileSystem/ReaderTest.h"
 #include "Tests/Support/ConsoleCapture.h"
+#include "Tests/Support/RefusedMemory.h"
 
-#include <malloc.h>
+#include <algorithm>
+#include <filesystem>
+#include <map>
 
-// What this thread asks for through the runtime's allocator; the request that requestsLeft counts down to is refused.
-struct Memory {
-    int requestsLeft = -1; // none
-    UInt64 bytes = 0;
-};
-static thread_local Memory t_Memory;
+namespace fs = std::filesystem;
 
-extern "C" int posix_memalign(void** pointer, size_t align, size_t size) {
-    t_Memory.bytes += size;
-    if (t_Memory.requestsLeft > 0 && --t_Memory.requestsLeft == 0) return ENOMEM;
-    *pointer = memalign(align, size);
-    return *pointer != nullptr ? 0 : ENOMEM;
-}
-
-// Files that lie apart in one block cost one decoding of it, and files behind its damage, or behind the end of a file
-// that was cut, none at all.
-TEST(ArchiveReader, NoBlockIsDecodedAgainForEachFileInIt) {
+TEST(ArchiveReader, FilesInOneBlockCostOneDecoding) {
     constexpr UInt64 kSize = 1'000'000;
+    constexpr UInt64 kFile = 100;
     const std::string text = SampleText(kSize);
     enum Harm { kWhole, kDamaged, kCut };
     struct {
         const char* what;
         CompressionType type;
-        bool streamed;
-        Harm harm;
-    } const cases[] = {
-        {"LZMA stream", kCompressionLzma, true, kWhole},     {"damaged LZMA stream", kCompressionLzma, true, kDamaged},
-        {"cut LZMA stream", kCompressionLzma, true, kCut},   {"LZMA", kCompressionLzma, false, kWhole},
-        {"damaged LZMA", kCompressionLzma, false, kDamaged}, {"cut LZMA", kCompressionLzma, false, kCut},
-        {"cut LZ4", kCompressionLz4, false, kCut},
+        bool streamed = false;
+        Harm harm = kWhole;
+    } const rows[] = {
+        {.what = "LZMA stream", .type = kCompressionLzma, .streamed = true},
+        {.what = "damaged LZMA stream", .type = kCompressionLzma, .streamed = true, .harm = kDamaged},
+        {.what = "cut LZMA stream", .type = kCompressionLzma, .streamed = true, .harm = kCut},
+        {.what = "LZMA", .type = kCompressionLzma},
+        {.what = "damaged LZMA", .type = kCompressionLzma, .harm = kDamaged},
+        {.what = "cut LZMA", .type = kCompressionLzma, .harm = kCut},
+        {.what = "cut LZ4", .type = kCompressionLz4, .harm = kCut},
     };
-    for (const auto& [what, type, streamed, harm] : cases) {
-        SCOPED_TRACE(what);
-        std::string bytes = BuildArchive({.entries = {{"", text}}, .blocks = {{kSize, type, streamed}}}).bytes;
+    for (const auto& row : rows) {
+        SCOPED_TRACE(row.what);
+        std::string bytes = BuildArchive({.entries = {{"", text}}, .blocks = {{kSize, row.type, row.streamed}}}).bytes;
         const size_t wholeSize = bytes.size();
-        if (harm == kDamaged) bytes[wholeSize / 2] ^= '\xFF';
-        if (harm == kCut) bytes.resize(wholeSize / 2);
+        if (row.harm == kDamaged) bytes[wholeSize / 2] ^= '\xFF';
+        if (row.harm == kCut) bytes.resize(wholeSize / 2);
         DisturbedDisk disk;
         OpenedArchive archive(bytes);
-        for (UInt64 from = 0; from < kSize - 100; from += 5'000) {
-            const std::string got = archive.Read(from, 100);
-            EXPECT_EQ(got == "refused" && harm != kWhole ? got : text.substr(from, 100), got) << from;
+        for (UInt64 from = 0; from < kSize - kFile; from += 5'000) {
+            const std::string got = archive.Read(from, kFile);
+            if (row.harm == kWhole || got != kRefused) {
+                EXPECT_EQ(text.substr(from, kFile), got) << from;
+            }
         }
         EXPECT_LT(disk.bytes, wholeSize * 3 / 2);
     }
 }
 
-// What a read delivers that goes on into a block with cut or damaged stored bytes, which only the first one looks at.
-TEST(ArchiveReader, ABrokenBlockGivesTheSameAnswerEachTime) {
-    constexpr UInt64 kFirst = 1'000;
+// Only the first read looks at the stored bytes of a cut or damaged block.
+TEST(ArchiveReader, BrokenBlockGivesTheSameAnswerEachTime) {
+    constexpr UInt64 kFirst = 1'000; // a stored block before the broken one
     std::string text(6'000'000, ' ');
     std::generate(text.begin(), text.end(), std::mt19937(7));
     const std::string start = text.substr(0, kFirst);
     struct {
         const char* what;
-        UInt64 blockSize;
-        size_t lost; // of the file's end
-        bool isDamaged;
-        std::string wholeBlock;
-    } const cases[] = {
-        {"cut, larger than what is read ahead", 5'000'000, 100, false, start},
-        {"cut", 50'000, 100, false, "refused"},
-        {"all of it lost", 50'000, 100'000, false, "refused"},
-        {"damaged", 50'000, 0, true, "refused"},
+        UInt64 blockSize = 50'000;
+        size_t lost = 0; // of the file's end
+        bool isDamaged = false;
+        std::string bothBlocks = kRefused;
+    } const rows[] = {
+        {.what = "cut, larger than the window", .blockSize = 5'000'000, .lost = 100, .bothBlocks = start},
+        {.what = "cut", .lost = 100},
+        {.what = "all of it lost", .lost = 100'000},
+        {.what = "damaged", .isDamaged = true},
     };
-    for (const auto& [what, blockSize, lost, isDamaged, wholeBlock] : cases) {
-        SCOPED_TRACE(what);
-        std::string stored = Compress(kCompressionLz4, text.substr(kFirst, blockSize));
-        if (isDamaged) stored.assign(stored.size(), '\xFF');
+    for (const auto& row : rows) {
+        SCOPED_TRACE(row.what);
+        std::string stored = Compress(kCompressionLz4, text.substr(kFirst, row.blockSize));
+        if (row.isDamaged) stored.assign(stored.size(), '\xFF');
         const BuiltArchive built =
-            BuildArchive({.entries = {{"", text.substr(0, kFirst + blockSize)}},
-                          .blocks = {{kFirst, kCompressionNone}, {blockSize, kCompressionLz4, false, stored}}});
-        const std::string bytes =
-            built.bytes.substr(0, built.dataOffset + kFirst + stored.size() - std::min(lost, stored.size()));
+            BuildArchive({.entries = {{"", text.substr(0, kFirst + row.blockSize)}},
+                          .blocks = {{kFirst, kCompressionNone}, {row.blockSize, kCompressionLz4, false, stored}}});
+        const size_t left = stored.size() - std::min(row.lost, stored.size());
         DisturbedDisk disk;
-        OpenedArchive archive(bytes);
+        OpenedArchive archive(built.bytes.substr(0, built.dataOffset + kFirst + left));
         for (const char* const time : {"first", "second"}) {
-            EXPECT_EQ(start.substr(990), archive.Read(990, 20)) << time;
-            EXPECT_EQ(wholeBlock, archive.Read(0, kFirst + blockSize)) << time;
+            SCOPED_TRACE(time);
+            EXPECT_EQ(start.substr(990), archive.Read(990, 20));
+            EXPECT_EQ(row.bothBlocks, archive.Read(0, kFirst + row.blockSize));
             disk.bytes = 0;
-            EXPECT_EQ("refused", archive.Read(kFirst + 7, 10)) << time;
-            EXPECT_EQ("refused", archive.Read(kFirst, blockSize)) << time;
-            EXPECT_EQ(0u, disk.bytes) << time;
+            EXPECT_EQ(kRefused, archive.Read(kFirst + 7, 10));
+            EXPECT_EQ(kRefused, archive.Read(kFirst, row.blockSize));
+            EXPECT_EQ(0u, disk.bytes);
         }
     }
 }
 
-TEST(ArchiveReader, AStreamedLz4BlockIsReportedForEachRead) {
+TEST(ArchiveReader, StreamedLz4BlockIsReportedForEachRead) {
     ArchiveDescription description{.entries = {{"", SampleText(9'000)}}, .blocks = {{9'000, kCompressionLz4, true}}};
     const BuiltArchive built = BuildArchive(description);
-    for (const size_t size : {built.bytes.size(), size_t{built.dataOffset}}) { // whole, and with nothing of the block
+    for (const size_t size : {built.bytes.size(), size_t{built.dataOffset}}) { // with and without the block's bytes
         SCOPED_TRACE(size);
         OpenedArchive archive(built.bytes.substr(0, size));
         std::string reports;
         const ConsoleCapture console;
         for (int file = 0; file < 3; ++file) {
-            EXPECT_EQ("refused", archive.Read(10, 20));
+            EXPECT_EQ(kRefused, archive.Read(10, 20));
             reports += "Decompressor's stream must be initialized!\n";
             EXPECT_EQ(reports, console.Text());
         }
     }
 }
 
-// Whichever request for memory is refused, the block can be read afterwards.
-TEST(ArchiveReader, RefusedMemoryIsNotRememberedAsDamage) {
+TEST(ArchiveReader, RefusedMemoryIsNotTakenForDamage) {
     constexpr UInt64 kSize = 100'000;
+    constexpr size_t kLarge = 1'024; // the program ends without smaller requests
     const std::string text = SampleText(kSize);
     struct {
         const char* what;
         CompressionType type;
-        bool streamed;
-        UInt64 from, size;
-    } const cases[] = {
-        {"part of LZMA", kCompressionLzma, false, 10, 50},
-        {"all of LZMA", kCompressionLzma, false, 0, kSize},
-        {"part of an LZMA stream", kCompressionLzma, true, 70'000, 50},
-        {"all of an LZMA stream", kCompressionLzma, true, 0, kSize},
-        {"part of LZ4", kCompressionLz4, false, 10, 50},
+        bool streamed = false;
+        UInt64 from = 0;
+        UInt64 size = kSize;
+    } const rows[] = {
+        {.what = "part of LZMA", .type = kCompressionLzma, .from = 10, .size = 50},
+        {.what = "all of LZMA", .type = kCompressionLzma},
+        {.what = "part of an LZMA stream", .type = kCompressionLzma, .streamed = true, .from = 70'000, .size = 50},
+        {.what = "all of an LZMA stream", .type = kCompressionLzma, .streamed = true},
+        {.what = "part of LZ4", .type = kCompressionLz4, .from = 10, .size = 50},
     };
-    for (const auto& [what, type, streamed, from, size] : cases) {
-        SCOPED_TRACE(what);
-        const std::string bytes = BuildArchive({.entries = {{"", text}}, .blocks = {{kSize, type, streamed}}}).bytes;
-        std::string got(size, '\xEE');
-        int refusals = 0;
-        for (bool isRefused = true; isRefused; ++refusals) {
+    for (const auto& row : rows) {
+        const std::string bytes =
+            BuildArchive({.entries = {{"", text}}, .blocks = {{kSize, row.type, row.streamed}}}).bytes;
+        std::string got(row.size, '\xEE');
+        int refused = 0;
+        for (bool hasStruck = true; hasStruck; ++refused) {
+            SCOPED_TRACE(testing::Message() << row.what << ", request " << refused + 1);
             OpenedArchive archive(bytes);
             UInt64 count = 0;
-            const ConsoleCapture console; // a stream that can't be made is reported
-            t_Memory = {.requestsLeft = refusals + 1};
-            const bool isRead = archive.reader.Read(from, size, got.data(), &count);
-            isRefused = t_Memory.requestsLeft == 0;
-            t_Memory = {};
-            EXPECT_EQ(!isRefused, isRead) << refusals;
-            EXPECT_EQ(text.substr(from, size), archive.Read(from, size)) << refusals;
+            bool isRead;
+            {
+                const RefusedMemory refusal(refused + 1, false, kLarge);
+                isRead = archive.reader.Read(row.from, row.size, got.data(), &count);
+                hasStruck = RefusedMemory::HasStruck();
+            }
+            EXPECT_EQ(!hasStruck, isRead);
+            EXPECT_EQ(text.substr(row.from, row.size), archive.Read(row.from, row.size));
         }
-        EXPECT_GT(refusals, 2);
+        EXPECT_GE(refused, 2) << row.what;
     }
 }
 
-TEST(ArchiveReader, ABrokenBlockTakesNoMemoryForTheOthers) {
+TEST(ArchiveReader, BrokenBlockTakesNoMemoryForTheOthers) {
     constexpr size_t kBlocks = 10'000;
     ArchiveDescription description{.entries = {{"", SampleText(kBlocks)}}, .chunkSize = 1};
     description.blocks = {{1, kCompressionLz4, false, "bad"}};
     OpenedArchive archive(description);
     char byte;
     UInt64 count = 0;
-    t_Memory = {};
+    const RefusedMemory refusal(1, true, kBlocks);
     EXPECT_FALSE(archive.reader.Read(0, 1, &byte, &count));
-    EXPECT_LT(t_Memory.bytes, kBlocks);
+    EXPECT_FALSE(RefusedMemory::HasStruck());
 }
 
 TEST(ArchiveReader, BrokenBlocksAreKnownUntilTheFileIsClosed) {
@@ -163,106 +161,306 @@ TEST(ArchiveReader, BrokenBlocksAreKnownUntilTheFileIsClosed) {
     const auto countReads = [&] {
         disk.reads = 0;
         for (UInt64 block = 0; block < kBlocks; ++block)
-            EXPECT_EQ("refused", archive.Read(10 * block + 1, 5)) << block;
+            EXPECT_EQ(kRefused, archive.Read(10 * block + 1, 5)) << block;
         return disk.reads.load();
     };
     EXPECT_EQ(kBlocks, countReads());
     EXPECT_EQ(0u, countReads());
     archive.reader.MakeStorageUnused();
-    ASSERT_TRUE(archive.reader.MakeStorageUsed(true)); // it may be whole now
+    ASSERT_TRUE(archive.reader.MakeStorageUsed(true)); // the file may be whole now
     EXPECT_EQ(kBlocks, countReads());
 }
 
-TEST(ArchiveReader, EmptyBlocksThatCantFailCostNothing) {
+TEST(ArchiveReader, EmptyBlocksThatCantFailAreSkipped) {
     constexpr UInt32 kEmptyBlocks = 1'000;
-    const auto unknown = static_cast<CompressionType>(9);
+    constexpr UInt32 kAllBlocks = kEmptyBlocks + 2;
+    constexpr auto kUnknown = static_cast<CompressionType>(9);
     struct {
         const char* what;
         ArchiveBlock block;
-        UInt32 blocksToRead;
-        std::string answer;
-    } const cases[] = {
-        {"stored as is", {0, kCompressionNone, false, ""}, 2, "bcde"},
-        {"stored as is, with bytes", {0, kCompressionNone, true, "!"}, 2, "bcde"},
-        {"LZ4", {0, kCompressionLz4, false, ""}, 2, "bcde"},
-        {"LZ4, with bytes", {0, kCompressionLz4, false, "!"}, kEmptyBlocks + 2, "refused"},
-        {"LZ4 stream", {0, kCompressionLz4, true, ""}, kEmptyBlocks + 2, "bcde"},
-        {"LZMA stream", {0, kCompressionLzma, true, "!"}, 2, "bcde"},
-        {"LZMA, with bytes", {0, kCompressionLzma, false, "!"}, kEmptyBlocks + 2, "refused"},
-        {"unknown", {0, unknown, false, ""}, kEmptyBlocks + 2, "refused"},
+        UInt32 blocksToRead = 2;
+        std::string answer = "bcde";
+    } const rows[] = {
+        {.what = "stored", .block = {0, kCompressionNone, false, ""}},
+        {.what = "stored, with bytes", .block = {0, kCompressionNone, true, "!"}},
+        {.what = "LZ4", .block = {0, kCompressionLz4, false, ""}},
+        {.what = "LZ4, with bytes",
+         .block = {0, kCompressionLz4, false, "!"},
+         .blocksToRead = kAllBlocks,
+         .answer = kRefused},
+        {.what = "LZ4 stream", .block = {0, kCompressionLz4, true, ""}, .blocksToRead = kAllBlocks},
+        {.what = "LZMA stream", .block = {0, kCompressionLzma, true, "!"}},
+        {.what = "LZMA, with bytes",
+         .block = {0, kCompressionLzma, false, "!"},
+         .blocksToRead = kAllBlocks,
+         .answer = kRefused},
+        {.what = "unknown", .block = {0, kUnknown, false, ""}, .blocksToRead = kAllBlocks, .answer = kRefused},
     };
-    for (const auto& [what, block, blocksToRead, answer] : cases) {
-        SCOPED_TRACE(what);
+    for (const auto& row : rows) {
+        SCOPED_TRACE(row.what);
         ArchiveDescription description{.entries = {{"", "abcdef"}}, .chunkSize = 3};
         description.blocks = {{3}};
-        description.blocks.resize(1 + kEmptyBlocks, block);
+        description.blocks.resize(1 + kEmptyBlocks, row.block);
         const ConsoleCapture console;
         OpenedArchive archive(description);
-        EXPECT_EQ(blocksToRead, Access::CountBlocksToRead(archive.reader));
-        EXPECT_EQ(kEmptyBlocks + 2, archive.reader.GetBlockCount());
-        EXPECT_EQ(answer, archive.Read(1, 4));
+        EXPECT_EQ(row.blocksToRead, Access::CountBlocksToRead(archive.reader));
+        EXPECT_EQ(kAllBlocks, archive.reader.GetBlockCount());
+        EXPECT_EQ(row.answer, archive.Read(1, 4));
     }
 }
 
-TEST(ArchiveReader, WhatEndsEarlyDeliversWhatItHolds) {
-    // A stream that ends before its block does, and asks for a dictionary of 4 GiB.
+TEST(ArchiveReader, StreamThatEndsEarlyDeliversWhatItHolds) {
+    // It asks for a dictionary of 4 GiB.
     const std::string lzma = CompressLzma(SampleText(60'000), {.endMark = true}).replace(1, 4, 4, '\xFF');
     OpenedArchive archive({.entries = {{"", SampleText(90'000)}}, .blocks = {{90'000, kCompressionLzma, true, lzma}}});
     EXPECT_EQ(SampleText(60'000).substr(50'000), archive.Read(50'000, 30'000));
-    EXPECT_EQ("refused", archive.Read(60'000, 10));
-    // A file that ends inside of the bytes that a read needs of its last block.
+    EXPECT_EQ(kRefused, archive.Read(60'000, 10));
+}
+
+TEST(ArchiveReader, StreamLongerThanItsBlockIsDamaged) {
+    const std::string lzma = CompressLzma(SampleText(70'000), {});
+    OpenedArchive archive({.entries = {{"", SampleText(60'000)}}, .blocks = {{60'000, kCompressionLzma, true, lzma}}});
+    EXPECT_EQ(kRefused, archive.Read(0, 60'000));
+}
+
+TEST(ArchiveReader, ChunkShorterThanItsBlockIsDamaged) {
+    const std::string lzma = CompressLzma(SampleText(60'000), {.endMark = true});
+    OpenedArchive archive({.entries = {{"", SampleText(90'000)}}, .blocks = {{90'000, kCompressionLzma, false, lzma}}});
+    EXPECT_EQ(kRefused, archive.Read(0, 90'000));
+    EXPECT_EQ(kRefused, archive.Read(10, 20));
+}
+
+TEST(ArchiveReader, StoredBlockIsNotReadPastTheRange) {
+    constexpr UInt64 kBlock = 10'000;
+    const std::string text = SampleText(2 * kBlock);
+    DisturbedDisk disk;
+    OpenedArchive archive({.entries = {{"", text}}, .chunkSize = kBlock});
+    disk.bytes = 0;
+    EXPECT_EQ(text.substr(kBlock - 10, 30), archive.Read(kBlock - 10, 30));
+    EXPECT_EQ(30u, disk.bytes);
+}
+
+TEST(ArchiveReader, CutStoredBlockEndsAReadBeforeIt) {
     const BuiltArchive built = BuildArchive({.entries = {{"", "0123456789abcdefghij"}}, .chunkSize = 10});
     EXPECT_EQ("0123456789", OpenedArchive(built.bytes.substr(0, built.dataOffset + 12)).Read(0, 15));
 }
 
-TEST(ArchiveReader, ADirectoryInTheDataIsReadyOnceItsLastByteHasBeenRead) {
-    constexpr UInt64 kDirectorySize = 33, kSize = 36;
-    ArchiveDescription description{.layout = ArchiveLayout::kWeb, .entries = {{"", "x"}, {"folder/file", "yz"}}};
-    for (UInt64 piece = 1; piece <= kSize; ++piece) {
-        OpenedArchive archive(description);
-        for (UInt64 from = 0; from < kSize; from += piece) {
-            EXPECT_EQ(from >= kDirectorySize, archive.reader.IsDirectoryReady()) << from << " in pieces of " << piece;
-            EXPECT_NE("refused", archive.Read(from, std::min(piece, kSize - from)));
-            EXPECT_TRUE(archive.Read(0, 10).size() == 10 && archive.reader.CanDirectoryBecomeReady()); // read again
-        }
-        const auto& nodes = archive.reader.GetDirectoryInfo().nodes;
-        EXPECT_TRUE(nodes.size() == 2 && nodes[1].path == "folder/file") << piece;
-    }
-    OpenedArchive withGap(description); // whose zeros would be an empty directory
-    EXPECT_TRUE(withGap.Read(4, 5).size() == 5 && !withGap.reader.IsDirectoryReady());
-    description.fields = {{"entryCount", 4}}; // of at least 9 bytes each: one too many
-    OpenedArchive hopeless(description);
-    EXPECT_TRUE(hopeless.Read(0, 4).size() == 4 && !hopeless.reader.CanDirectoryBecomeReady());
+TEST(ArchiveReader, StreamIsWholeAfterAFailedRead) {
+    constexpr UInt64 kWindow = 65'536;
+    constexpr UInt64 kSize = 3 * kWindow;
+    std::string text(kSize, ' ');
+    std::generate(text.begin(), text.end(), std::mt19937(7)); // several pieces of stored bytes
+    DisturbedDisk disk;
+    OpenedArchive archive({.entries = {{"", text}}, .blocks = {{kSize, kCompressionLzma, true}}});
+    EXPECT_EQ(text.substr(10, 20), archive.Read(10, 20));
+    disk.failures = 1;
+    EXPECT_EQ(kRefused, archive.Read(2 * kWindow, 20));
+    EXPECT_EQ(text.substr(2 * kWindow, 20), archive.Read(2 * kWindow, 20));
 }
 
-TEST(ArchiveReader, UseCountOpensAndClosesTheFileUnlessItHasChanged) {
-    const size_t descriptors = CountOpenDescriptors();
-    DisturbedDisk disk;
-    OpenedArchive archive({.entries = {{.bytes = "0123456789"}}, .type = kCompressionLz4, .sectionAtEnd = true});
-    ArchiveStorageReader& reader = archive.reader;
-    EXPECT_TRUE(archive.Read(5, 3) == "567" && reader.MakeStorageUsed(true));
-    reader.MakeStorageUnused();
-    EXPECT_TRUE(Access::Look(reader).records == 1 && CountOpenDescriptors() == descriptors + 1);
-    reader.MakeStorageUnused();
-    EXPECT_TRUE(Access::Look(reader).records == 0 && CountOpenDescriptors() == descriptors);
-    const ConsoleCapture console;
-    reader.MakeStorageUnused();
-    EXPECT_TRUE(reader.MakeStorageUsed(true) && archive.Read(5, 3) == "refused"); // from -1 to 0 opens nothing
-    EXPECT_TRUE(reader.MakeStorageUsed(true) && archive.Read(6, 3) == "678" && archive.Read(0, 0).empty());
-    UInt64 count = 77;
-    EXPECT_FALSE(reader.Read(5, ~0ull - 2, nullptr, &count) || reader.Read(~0ull, 2, nullptr, &count) || count != 77);
-    disk.Arm(1, {false, false}); // the question when the file was changed
-    EXPECT_FALSE(reader.MakeStorageUsed(true));
-    EXPECT_EQ("ArchiveStorageReader has mismatched MakeStorageUsed/MakeStorageUnused calls\n"
-              "Unexpected FileSystemError code 14 after call to FileSystemEntry::LastModified() \n"
-              "Archive file was modified while it was opened, and can no longer be accessed: " +
-                  archive.path + "\n",
-              console.Text());
-    FileSystemEntry entry(archive.path.c_str());
+TEST(ArchiveReader, OnlyPartsOfBlocksAreKeptInTheCache) {
+    constexpr UInt64 kBlock = 1'000;
+    const std::string text = SampleText(3 * kBlock);
+    OpenedArchive archive({.entries = {{"", text}}, .chunkSize = kBlock, .type = kCompressionLz4});
+    EXPECT_EQ(text, archive.Read(0, 3 * kBlock));
+    EXPECT_EQ(Access::Cache{.records = 0}, Access::Look(archive.reader));
+    EXPECT_EQ(text, archive.Read(0, 3 * kBlock, kFileReadFlagsThroughCache));
+    EXPECT_EQ(Access::Cache{.records = 1}, Access::Look(archive.reader));
+}
+
+TEST(ArchiveReader, DirectoryIsReadyWithItsLastByte) {
+    constexpr UInt64 kDirectorySize = 33;
+    constexpr UInt64 kSize = 36;
+    const ArchiveDescription description{.layout = ArchiveLayout::kWeb, .entries = {{"", "x"}, {"folder/file", "yz"}}};
+    for (UInt64 piece = 1; piece <= kSize; ++piece) {
+        SCOPED_TRACE(testing::Message() << "pieces of " << piece);
+        OpenedArchive archive(description);
+        for (UInt64 from = 0; from < kSize; from += piece) {
+            EXPECT_EQ(from >= kDirectorySize, archive.reader.IsDirectoryReady()) << from;
+            EXPECT_NE(kRefused, archive.Read(from, std::min(piece, kSize - from))) << from;
+            EXPECT_EQ(10u, archive.Read(0, 10).size()) << from; // read again, which must not count
+            EXPECT_TRUE(archive.reader.CanDirectoryBecomeReady()) << from;
+        }
+        const auto& nodes = archive.reader.GetDirectoryInfo().nodes;
+        ASSERT_EQ(2u, nodes.size());
+        EXPECT_EQ("folder/file", nodes[1].path);
+    }
+}
+
+TEST(ArchiveReader, ReadPastAGapFindsNoDirectory) {
+    OpenedArchive archive({.layout = ArchiveLayout::kWeb, .entries = {{"", "x"}, {"folder/file", "yz"}}});
+    EXPECT_EQ(5u, archive.Read(4, 5).size()); // the zeros of a gap would be an empty directory
+    EXPECT_FALSE(archive.reader.IsDirectoryReady());
+}
+
+TEST(ArchiveReader, EntryCountAboveTheStreamIsNoDirectory) {
+    OpenedArchive archive({.layout = ArchiveLayout::kWeb,
+                           .entries = {{"", "x"}, {"folder/file", "yz"}},
+                           .fields = {{"entryCount", 4}}}); // of at least 9 bytes each: one too many
+    EXPECT_EQ(4u, archive.Read(0, 4).size());
+    EXPECT_FALSE(archive.reader.CanDirectoryBecomeReady());
+}
+
+TEST(ArchiveReader, FindDirectoryReadsAsFarAsItHasTo) {
+    constexpr UInt64 kDirectorySize = 1'000;
+    struct {
+        const char* what;
+        UInt64 streamSize;
+        ArchiveStorageReader::DirectoryPieces pieces = ArchiveStorageReader::kDirectoryPiecesUpToTheEnd;
+        UInt64 readBefore = 0;
+        size_t lost = 0;      // of the file's end
+        size_t codedSize = 0; // of the stream, when that ends before its block does
+        std::map<std::string, UInt64> fields = {};
+        bool isFound = true;
+    } const rows[] = {
+        {.what = "shorter than a piece", .streamSize = 1'000},
+        {.what = "cut, after its first piece", .streamSize = 100'000, .lost = 100},
+        {.what = "ends early", .streamSize = 5'000, .codedSize = 2'000},
+        {.what = "part was read before", .streamSize = 5'000, .readBefore = 500},
+        {.what = "part with the directory was read before", .streamSize = 5'000, .readBefore = 1'500},
+        {.what = "no directory", .streamSize = 5'000, .fields = {{"entryCount", 9'999}}, .isFound = false},
+        {.what = "a whole piece", .streamSize = 65'536, .pieces = ArchiveStorageReader::kDirectoryPiecesWhole},
+        {.what = "no whole piece",
+         .streamSize = 65'535,
+         .pieces = ArchiveStorageReader::kDirectoryPiecesWhole,
+         .isFound = false},
+    };
+    for (const auto& row : rows) {
+        SCOPED_TRACE(row.what);
+        ArchiveDescription description{.layout = ArchiveLayout::kWeb, .fields = row.fields};
+        description.entries = {{std::string(kDirectorySize - 4 - 9, 'p'), SampleText(row.streamSize - kDirectorySize)}};
+        if (row.codedSize != 0) {
+            const std::string coded =
+                CompressLzma(BuildArchive(description).stream.substr(0, row.codedSize), {.endMark = true});
+            description.blocks = {{row.streamSize, {}, {}, coded.substr(0, 5) + "8 bytes!" + coded.substr(5)}};
+        }
+        const std::string bytes = BuildArchive(description).bytes;
+        OpenedArchive archive(bytes.substr(0, bytes.size() - row.lost));
+        EXPECT_EQ(row.readBefore, archive.Read(0, row.readBefore).size());
+        EXPECT_EQ(row.isFound, archive.reader.FindDirectory(row.pieces));
+        EXPECT_EQ(row.isFound, archive.reader.IsDirectoryReady());
+        EXPECT_EQ(row.isFound ? 1u : 0u, archive.reader.GetDirectoryInfo().nodes.size());
+    }
+}
+
+TEST(ArchiveReader, ReadsElsewhereKeepNothingForADirectory) {
+    constexpr UInt64 kPiece = 65'536;
+    constexpr UInt64 kPieces = 40;
+    constexpr size_t kBlock = 8'192; // of the file that collects the stream's start
+    OpenedArchive archive({.layout = ArchiveLayout::kWeb, .entries = {{"file", SampleText(kPieces * kPiece)}}});
+    std::string piece(kPiece, '\xEE');
+    UInt64 count = 0;
+    ASSERT_TRUE(archive.reader.Read(kPiece, kPiece, piece.data(), &count)); // the decoder takes what it needs
+    {
+        const RefusedMemory refusal(1, true, kBlock);
+        for (UInt64 from = 2 * kPiece; from < kPieces * kPiece; from += kPiece)
+            ASSERT_TRUE(archive.reader.Read(from, kPiece, piece.data(), &count)) << from;
+        EXPECT_FALSE(RefusedMemory::HasStruck());
+    }
+    EXPECT_FALSE(archive.reader.IsDirectoryReady());
+    EXPECT_TRUE(archive.reader.FindDirectory());
+}
+
+// A ZarvoWeb archive, in which 8 bytes between properties and coded bytes are hidden.
+class HiddenSizeField : public testing::Test {
+protected:
+    DisturbedDisk m_Disk;
+    OpenedArchive m_Archive{
+        ArchiveDescription{.layout = ArchiveLayout::kWeb, .blocks = {{4, {}, {}, "props8 bytes!coded"}}}};
+};
+
+TEST_F(HiddenSizeField, IsNoPartOfTheStoredBytes) {
+    EXPECT_EQ("propscoded", Access::ReadStored(m_Archive.reader, 0, 10));
+    EXPECT_EQ("sc", Access::ReadStored(m_Archive.reader, 4, 2));
+    EXPECT_EQ("props", Access::ReadStored(m_Archive.reader, 0, 5));
+    EXPECT_EQ("cod", Access::ReadStored(m_Archive.reader, 5, 3));
+}
+
+TEST_F(HiddenSizeField, DoesNotFollowCutProperties) {
+    m_Disk.Arm(1, {.isLasting = false, .isShort = true});
+    EXPECT_EQ("pr", Access::ReadStored(m_Archive.reader, 0, 10));
+}
+
+// An archive of one short file.
+class ArchiveStorage : public testing::Test {
+protected:
+    int CountOpenFiles() const { return static_cast<int>(CountOpenDescriptors()) - m_DescriptorsBefore; }
+
+    const int m_DescriptorsBefore = static_cast<int>(CountOpenDescriptors());
+    DisturbedDisk m_Disk;
+    OpenedArchive m_Archive{
+        ArchiveDescription{.entries = {{.bytes = "0123456789"}}, .type = kCompressionLz4, .sectionAtEnd = true}};
+    ArchiveStorageReader& m_Reader = m_Archive.reader;
+    const ConsoleCapture m_Console;
+};
+
+TEST_F(ArchiveStorage, FileAndCacheLastUntilTheLastUse) {
+    EXPECT_EQ("567", m_Archive.Read(5, 3));
+    EXPECT_TRUE(m_Reader.MakeStorageUsed(true));
+    m_Reader.MakeStorageUnused();
+    EXPECT_EQ(1u, Access::Look(m_Reader).records);
+    EXPECT_EQ(1, CountOpenFiles());
+    m_Reader.MakeStorageUnused();
+    EXPECT_EQ(0u, Access::Look(m_Reader).records);
+    EXPECT_EQ(0, CountOpenFiles());
+    EXPECT_TRUE(m_Reader.MakeStorageUsed(true));
+    EXPECT_EQ("567", m_Archive.Read(5, 3));
+}
+
+TEST_F(ArchiveStorage, FileThatMayNotBeReleasedStaysOpen) {
+    FileSystemEntry entry(m_Archive.path.c_str());
     ArchiveStorageReader kept(kMemLabelFileSystem);
     EXPECT_EQ(0, kept.Initialize(entry, 0, false, true));
     kept.MakeStorageUnused();
-    EXPECT_EQ(descriptors + 2, CountOpenDescriptors());
+    EXPECT_EQ(2, CountOpenFiles());
+}
+
+TEST_F(ArchiveStorage, UseBelowZeroIsReportedAndCounted) {
+    m_Reader.MakeStorageUnused();
+    m_Reader.MakeStorageUnused();
+    EXPECT_EQ("ArchiveStorageReader has mismatched MakeStorageUsed/MakeStorageUnused calls\n", m_Console.Text());
+    EXPECT_TRUE(m_Reader.MakeStorageUsed(true)); // from -1 to 0
+    EXPECT_EQ(kRefused, m_Archive.Read(5, 3));
+    EXPECT_TRUE(m_Reader.MakeStorageUsed(true));
+    EXPECT_EQ("567", m_Archive.Read(5, 3));
+}
+
+TEST_F(ArchiveStorage, MissingFileIsReportedAndNotUsed) {
+    m_Reader.MakeStorageUnused();
+    fs::remove(m_Archive.path);
+    EXPECT_FALSE(m_Reader.MakeStorageUsed(true));
+    EXPECT_EQ("Unable to open archive file: " + m_Archive.path + "\n", m_Console.Text());
+    EXPECT_EQ(0, CountOpenFiles());
+}
+
+TEST_F(ArchiveStorage, ChangedFileIsReportedAndNotUsed) {
+    fs::last_write_time(m_Archive.path, fs::last_write_time(m_Archive.path) + std::chrono::seconds(1));
+    EXPECT_FALSE(m_Reader.MakeStorageUsed(true));
+    EXPECT_EQ("Archive file was modified while it was opened, and can no longer be accessed: " + m_Archive.path + "\n",
+              m_Console.Text());
+    EXPECT_FALSE(m_Reader.MakeStorageUsed(false)); // not to be reported
+    EXPECT_EQ(1, std::ranges::count(m_Console.Text(), '\n'));
+}
+
+TEST_F(ArchiveStorage, UnknownTimeOfChangeIsReported) {
+    m_Disk.Arm(1, {.isLasting = false, .isShort = false});
+    EXPECT_FALSE(m_Reader.MakeStorageUsed(false));
+    EXPECT_EQ("Unexpected FileSystemError code 14 after call to FileSystemEntry::LastModified() \n", m_Console.Text());
+}
+
+TEST_F(ArchiveStorage, RangePastTheEndIsRefusedWhole) {
+    constexpr UInt64 kUntouched = 77;
+    struct {
+        UInt64 from;
+        UInt64 size;
+    } const rows[] = {{9, 2}, {10, 0}, {10, 1}, {5, ~0ull - 2}, {~0ull, 2}};
+    for (const auto& [from, size] : rows) {
+        UInt64 count = kUntouched;
+        EXPECT_FALSE(m_Reader.Read(from, size, nullptr, &count)) << from << ", " << size;
+        EXPECT_EQ(kUntouched, count) << from << ", " << size;
+    }
+    EXPECT_EQ("9", m_Archive.Read(9, 1));
+    EXPECT_EQ("", m_Archive.Read(0, 0));
 }
 
 TEST(ArchiveReader, BlocksNameTheirBytesInTheFile) {
@@ -276,7 +474,7 @@ TEST(ArchiveReader, BlocksNameTheirBytesInTheFile) {
         std::vector<std::string> stored; // of each block
         std::vector<bool> streamed;
         size_t firstPieceSize;
-    } const cases[] = {
+    } const rows[] = {
         {.what = "block-based",
          .description = {.entries = {{"", text}},
                          .blocks = {{1'000, kCompressionLzma, true, lzma},
@@ -296,86 +494,31 @@ TEST(ArchiveReader, BlocksNameTheirBytesInTheFile) {
          .stored = {"prop"},
          .streamed = {true},
          .firstPieceSize = 4},
+        {.what = "ZarvoWeb, too short for the field",
+         .description = {.layout = ArchiveLayout::kWeb, .blocks = {{4, {}, {}, "8 bytes!"}}},
+         .stored = {"8 bytes!"},
+         .streamed = {true},
+         .firstPieceSize = 8},
     };
-    for (const auto& test : cases) {
-        SCOPED_TRACE(test.what);
-        const BuiltArchive built = BuildArchive(test.description);
+    for (const auto& row : rows) {
+        SCOPED_TRACE(row.what);
+        const BuiltArchive built = BuildArchive(row.description);
         OpenedArchive archive(built.bytes, kOffset);
         const std::string file = std::string(kOffset, '!') + built.bytes;
-        ASSERT_EQ(test.stored.size(), archive.reader.GetBlockCount());
+        ASSERT_EQ(row.stored.size(), archive.reader.GetBlockCount());
         UInt64 position = 0;
-        for (UInt32 index = 0; index < test.stored.size(); ++index) {
+        for (UInt32 index = 0; index < row.stored.size(); ++index) {
             const ArchiveStorageReader::Block block = archive.reader.GetBlock(index);
             std::string stored;
             for (const auto& piece : block.pieces)
                 stored += file.substr(piece.offset, piece.size);
-            EXPECT_EQ(test.stored[index], stored);
-            EXPECT_EQ(test.stored[index].size(), block.storedSize);
-            EXPECT_EQ(test.streamed[index], block.isStreamed);
+            EXPECT_EQ(row.stored[index], stored);
+            EXPECT_EQ(row.stored[index].size(), block.storedSize);
+            EXPECT_EQ(row.streamed[index], block.isStreamed);
             EXPECT_EQ(position, block.position);
             position += block.size;
         }
         EXPECT_EQ(built.stream.size(), position);
-        EXPECT_EQ(test.firstPieceSize, archive.reader.GetBlock(0).pieces[0].size);
+        EXPECT_EQ(row.firstPieceSize, archive.reader.GetBlock(0).pieces[0].size);
     }
-}
-
-// The rules about pieces, where the directory takes 1,000 bytes and the stream is as long as each row says.
-TEST(ArchiveReader, FindDirectoryReadsAsFarAsItHasTo) {
-    constexpr UInt64 kDirectorySize = 1'000;
-    struct {
-        const char* what;
-        UInt64 streamSize;
-        ArchiveStorageReader::DirectoryPieces pieces = ArchiveStorageReader::kDirectoryPiecesUpToTheEnd;
-        UInt64 readBefore = 0;
-        size_t lost = 0;      // of the file's end
-        size_t codedSize = 0; // of the stream, when that ends before its block does
-        std::map<std::string, UInt64> fields = {};
-        bool isFound = true;
-    } const cases[] = {
-        {.what = "shorter than a piece", .streamSize = 1'000},
-        {.what = "cut, behind its first piece", .streamSize = 100'000, .lost = 100},
-        {.what = "ends early", .streamSize = 5'000, .codedSize = 2'000},
-        {.what = "part was read before", .streamSize = 5'000, .readBefore = 500},
-        {.what = "part with the directory was read before", .streamSize = 5'000, .readBefore = 1'500},
-        {.what = "no directory", .streamSize = 5'000, .fields = {{"entryCount", 9'999}}, .isFound = false},
-        {.what = "a whole piece", .streamSize = 65'536, .pieces = ArchiveStorageReader::kDirectoryPiecesWhole},
-        {.what = "no whole piece",
-         .streamSize = 65'535,
-         .pieces = ArchiveStorageReader::kDirectoryPiecesWhole,
-         .isFound = false},
-    };
-    for (const auto& test : cases) {
-        SCOPED_TRACE(test.what);
-        ArchiveDescription description{.layout = ArchiveLayout::kWeb, .fields = test.fields};
-        description.entries = {
-            {std::string(kDirectorySize - 4 - 9, 'p'), SampleText(test.streamSize - kDirectorySize)}};
-        if (test.codedSize != 0) {
-            const std::string coded =
-                CompressLzma(BuildArchive(description).stream.substr(0, test.codedSize), {.endMark = true});
-            description.blocks = {{test.streamSize, {}, {}, coded.substr(0, 5) + "8 bytes!" + coded.substr(5)}};
-        }
-        const std::string bytes = BuildArchive(description).bytes;
-        OpenedArchive archive(bytes.substr(0, bytes.size() - test.lost));
-        EXPECT_EQ(test.readBefore, archive.Read(0, test.readBefore).size());
-        EXPECT_EQ(test.isFound, archive.reader.FindDirectory(test.pieces));
-        EXPECT_EQ(test.isFound, archive.reader.IsDirectoryReady());
-        EXPECT_EQ(test.isFound ? 1u : 0u, archive.reader.GetDirectoryInfo().nodes.size());
-    }
-}
-
-// Reads that leave out the stream's start can't find a directory: they keep nothing, and spoil nothing.
-TEST(ArchiveReader, OnlyTheStartOfAStreamIsKeptForItsDirectory) {
-    constexpr UInt64 kPiece = 65'536, kPieces = 40;
-    ArchiveDescription description{.layout = ArchiveLayout::kWeb, .entries = {{"file", SampleText(kPieces * kPiece)}}};
-    OpenedArchive archive(description);
-    std::string piece(kPiece, '\xEE');
-    UInt64 count = 0;
-    ASSERT_TRUE(archive.reader.Read(kPiece, kPiece, piece.data(), &count)); // the decoder takes what it needs
-    t_Memory = {};
-    for (UInt64 from = 2 * kPiece; from < kPieces * kPiece; from += kPiece)
-        ASSERT_TRUE(archive.reader.Read(from, kPiece, piece.data(), &count)) << from;
-    EXPECT_LT(t_Memory.bytes, kPiece);
-    EXPECT_FALSE(archive.reader.IsDirectoryReady());
-    EXPECT_TRUE(archive.reader.FindDirectory());
 }
