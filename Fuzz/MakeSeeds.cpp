@@ -73,9 +73,11 @@ int main(int argumentCount, char** arguments) {
 
     const std::string text = Text(3'000);
     const std::filesystem::path decompressor = root / "DecompressorFuzzer";
-    WriteSeed(decompressor, "lzma", CompressLzma(text));
-    WriteSeed(decompressor, "lzma-mark", CompressLzma(text, {.endMark = true}));
-    WriteSeed(decompressor, "lzma-empty", CompressLzma("", {.endMark = true}));
+    for (const std::filesystem::path& folder : {decompressor, root / "LzmaFuzzer"}) {
+        WriteSeed(folder, "lzma", CompressLzma(text));
+        WriteSeed(folder, "lzma-mark", CompressLzma(text, {.endMark = true}));
+        WriteSeed(folder, "lzma-empty", CompressLzma("", {.endMark = true}));
+    }
     WriteSeed(decompressor, "lz4", CompressLz4(text));
     WriteSeed(decompressor, "lz4hc", CompressLz4HC(text));
     // A directory alone, as a legacy data stream starts with it.

@@ -1,0 +1,227 @@
+#include "Library/Lzma/Lzma.h"
+#include "Tools/ArchiveWriter/Compressors.h"
+
+#include <algorithm>
+#include <gtest/gtest.h>
+#include <random>
+
+using namespace lzma;
+using namespace std::string_literals;
+
+namespace {
+
+// Properties and stream of the same text, without an end mark, and with one.
+const std::string kPlain = "zarvo zarvo zarvo zarvo\n";
+const std::string kBare = "\x5d\0\x10\0\0\0\x3d\x18\x4a\xac\x4a\x1d\x09\x1a\x65\xdc\xc3\0\0"s;
+const std::string kMarked = kBare.substr(0, 15) + "\xe3\x3d\x7a\xff\xff\xfc\xf4\x50\0"s;
+
+// Counts what is allocated, and refuses once there have been so many grants.
+struct CountingMemory {
+    int grantsLeft = 1'000;
+    int held = 0;
+
+    static void* Allocate(void* context, size_t size) {
+        auto* const self = static_cast<CountingMemory*>(context);
+        if (self->grantsLeft == 0) return nullptr;
+        --self->grantsLeft;
+        ++self->held;
+        return malloc(size);
+    }
+
+    static void Release(void* context, void* address) {
+        --static_cast<CountingMemory*>(context)->held;
+        free(address);
+    }
+
+    operator Memory() { return {Allocate, Release, this}; }
+};
+
+struct Outcome {
+    Result result;
+    size_t consumed; // without properties
+    std::string output;
+    bool operator==(const Outcome&) const = default;
+};
+
+std::ostream& operator<<(std::ostream& stream, const Outcome& outcome) {
+    return stream << "result " << outcome.result << ", consumed " << outcome.consumed << ", \"" << outcome.output
+                  << '"';
+}
+
+// Memory of exactly the sizes given, for the sanitizer to watch.
+Outcome DecodeWhole(const std::string& stored, size_t room, const Memory& memory) {
+    const std::vector<char> input(stored.begin() + kPropertiesSize, stored.end());
+    std::vector<char> output(room);
+    const Answer answer = DecodeBlock(stored.data(), input.data(), input.size(), output.data(), room, memory);
+    return {answer.result, answer.consumed, std::string(output.data(), answer.produced)};
+}
+
+Outcome DecodeWhole(const std::string& stored, size_t room) {
+    CountingMemory memory;
+    return DecodeWhole(stored, room, memory);
+}
+
+Outcome DecodeStep(Stream& stream, const std::string& bytes, size_t room, Finish finish = kFinishAny) {
+    const std::vector<char> input(bytes.begin(), bytes.end());
+    std::vector<char> output(room);
+    const Answer answer = stream.Decode(input.data(), input.size(), output.data(), room, finish);
+    return {answer.result, answer.consumed, std::string(output.data(), answer.produced)};
+}
+
+// Text, runs and noise, of more than two dictionaries of 64 KiB.
+std::string MakeLongText() {
+    std::mt19937 random(7);
+    std::string text;
+    while (text.size() < 180'000) {
+        text += "line " + std::to_string(random() % 1'000) + std::string(random() % 9, 'z') + "\n";
+        if (random() % 50 == 0) text += std::string(400, static_cast<char>(random()));
+        if (random() % 50 == 0)
+            text += text.substr(text.size() - random() % std::min<size_t>(text.size(), 60'000), 300);
+    }
+    return text;
+}
+
+} // namespace
+
+TEST(LzmaBlock, RoomAndEndMarkDecideTheAnswer) {
+    struct Row {
+        const char* name;
+        std::string stored;
+        size_t room;
+        Outcome expected;
+    };
+    const Row kRows[] = {
+        {"no mark, exact room", kBare, 24, {kMayBeEnded, 14, kPlain}},
+        {"no mark, bytes behind", kBare + "!", 24, {kMayBeEnded, 14, kPlain}},
+        {"no mark, small room", kBare, 10, {kRoomFilled, 13, kPlain.substr(0, 10)}},
+        {"no mark, large room", kBare, 25, {kNeedsInput, 0, ""}},
+        {"no mark, no room", kBare, 0, {kRoomFilled, 5, ""}},
+        {"mark, exact room", kMarked, 24, {kRoomFilled, 14, kPlain}},
+        {"mark, large room", kMarked, 99, {kEnded, 19, kPlain}},
+        {"mark, bytes behind", kMarked + "!", 99, {kEnded, 19, kPlain}},
+        {"first byte not 0", kBare.substr(0, 5) + "\1" + kBare.substr(6), 24, {kDamaged, 0, ""}},
+        {"mark at the wrong code", kMarked.substr(0, 23) + "\1", 99, {kDamaged, 0, ""}},
+        {"properties beyond all", "\xe1" + kBare.substr(1), 24, {kUnsupported, 0, ""}},
+        {"fewer than 5 bytes", kBare.substr(0, 9), 0, {kNeedsInput, 0, ""}},
+    };
+    for (const Row& row : kRows)
+        EXPECT_EQ(DecodeWhole(row.stored, row.room), row.expected) << row.name;
+}
+
+TEST(LzmaBlock, EveryTruncationNeedsInput) {
+    for (size_t size = kPropertiesSize; size < kMarked.size(); ++size)
+        EXPECT_EQ(DecodeWhole(kMarked.substr(0, size), 99), (Outcome{kNeedsInput, 0, ""})) << size;
+}
+
+TEST(LzmaBlock, RefusedMemoryIsNotDamage) {
+    CountingMemory none = {.grantsLeft = 0};
+    EXPECT_EQ(DecodeWhole(kBare, 24, none), (Outcome{kNoMemory, 0, ""}));
+    CountingMemory enough;
+    EXPECT_EQ(DecodeWhole(kBare, 24, enough), (Outcome{kMayBeEnded, 14, kPlain}));
+    EXPECT_EQ(enough.held, 0);
+}
+
+TEST(LzmaStream, PiecesOfAnySizeYieldTheWhole) {
+    const std::string plain = MakeLongText();
+    const std::string stored = CompressLzma(plain, {.endMark = true});
+    for (const History history : {kHistoryOwn, kHistoryInOutput}) {
+        for (const auto& [inputPiece, roomPiece] :
+             {std::pair<size_t, size_t>(1, 1), {1, 70'000}, {7, 300}, {4'096, 13}}) {
+            CountingMemory memory;
+            Stream stream(memory);
+            ASSERT_EQ(stream.Start(stored.data(), history), kRoomFilled);
+            std::string output(plain.size(), '\0');
+            size_t consumed = kPropertiesSize, produced = 0;
+            Answer answer = {};
+            for (size_t steps = 0; answer.result != kEnded && steps < 2 * stored.size() + plain.size(); ++steps) {
+                const size_t size = std::min(inputPiece, stored.size() - consumed);
+                const size_t room = std::min(roomPiece, plain.size() - produced);
+                answer = stream.Decode(stored.data() + consumed, size, output.data() + produced, room,
+                                       produced == plain.size() ? kFinishHere : kFinishAny);
+                consumed += answer.consumed;
+                produced += answer.produced;
+            }
+            EXPECT_EQ(answer.result, kEnded) << inputPiece << " into " << roomPiece;
+            EXPECT_EQ(consumed, stored.size());
+            EXPECT_TRUE(output == plain) << inputPiece << " into " << roomPiece; // too long to print
+        }
+    }
+}
+
+TEST(LzmaStream, KnownSizeIsHeldByFinish) {
+    struct Row {
+        const char* name;
+        std::string stored;
+        size_t room;
+        Result result;
+    };
+    const Row kRows[] = {
+        {"no mark", kBare, 24, kMayBeEnded},
+        {"mark", kMarked, 24, kEnded},
+        {"within a match", kBare, 20, kDamaged},
+        {"before a literal", kBare, 3, kDamaged},
+        {"cut mark", kMarked.substr(0, 22), 24, kNeedsInput},
+    };
+    CountingMemory memory;
+    Stream stream(memory);
+    for (const Row& row : kRows) {
+        ASSERT_EQ(stream.Start(row.stored.data(), kHistoryOwn), kRoomFilled);
+        EXPECT_EQ(DecodeStep(stream, row.stored.substr(5), row.room, kFinishHere).result, row.result) << row.name;
+    }
+}
+
+TEST(LzmaStream, DamageLastsUntilItIsStartedAgain) {
+    CountingMemory memory;
+    Stream stream(memory);
+    EXPECT_EQ(DecodeStep(stream, kBare.substr(5), 24).result, kDamaged); // never started
+    ASSERT_EQ(stream.Start(kBare.data(), kHistoryOwn), kRoomFilled);
+    EXPECT_EQ(DecodeStep(stream, "\1\2\3\4\5", 24), (Outcome{kDamaged, 0, ""}));
+    EXPECT_EQ(DecodeStep(stream, kBare.substr(5), 24), (Outcome{kDamaged, 0, ""}));
+    ASSERT_EQ(stream.Start(kBare.data(), kHistoryOwn), kRoomFilled);
+    EXPECT_EQ(DecodeStep(stream, kBare.substr(5), 24), (Outcome{kMayBeEnded, 14, kPlain}));
+}
+
+TEST(LzmaStream, EndIsAnsweredAgain) {
+    CountingMemory memory;
+    Stream stream(memory);
+    ASSERT_EQ(stream.Start(kMarked.data(), kHistoryOwn), kRoomFilled);
+    EXPECT_EQ(DecodeStep(stream, kMarked.substr(5), 99), (Outcome{kEnded, 19, kPlain}));
+    EXPECT_EQ(DecodeStep(stream, "more", 99), (Outcome{kEnded, 0, ""}));
+}
+
+// Each allocation refused in turn: the stream says so, holds nothing twice, and starts once there is memory.
+TEST(LzmaStream, StartsOnceThereIsMemory) {
+    for (int grants = 0; grants < 2; ++grants) {
+        CountingMemory memory = {.grantsLeft = grants};
+        {
+            Stream stream(memory);
+            EXPECT_EQ(stream.Start(kBare.data(), kHistoryOwn), kNoMemory) << grants;
+            EXPECT_EQ(DecodeStep(stream, kBare.substr(5), 24).result, kDamaged) << grants;
+            memory.grantsLeft = 2 - grants;
+            EXPECT_EQ(stream.Start(kBare.data(), kHistoryOwn), kRoomFilled) << grants;
+            EXPECT_EQ(DecodeStep(stream, kBare.substr(5), 24).output, kPlain) << grants;
+            EXPECT_EQ(memory.held, 2) << grants;
+        }
+        EXPECT_EQ(memory.held, 0) << grants;
+    }
+}
+
+TEST(LzmaStream, HistoryInOutputTakesNoDictionary) {
+    CountingMemory memory;
+    Stream stream(memory);
+    ASSERT_EQ(stream.Start(kBare.data(), kHistoryInOutput), kRoomFilled);
+    EXPECT_EQ(memory.held, 1);
+}
+
+// The dictionary is 4,096 bytes when less is named, and what lies further back is damage even where it is still there.
+TEST(LzmaBlock, DistanceBeyondTheDictionaryIsDamage) {
+    std::mt19937 random(5);
+    std::string noise(4'200, '\0');
+    std::generate(noise.begin(), noise.end(), std::ref(random));
+    for (const size_t distance : {4'096u, 4'097u}) {
+        const std::string plain = noise + noise.substr(noise.size() - distance, 60);
+        std::string stored = CompressLzma(plain, {.level = 9, .dictionarySize = 65'536});
+        stored.replace(1, 4, "\0\0\0\0"s);
+        EXPECT_EQ(DecodeWhole(stored, plain.size()).result, distance == 4'096 ? kMayBeEnded : kDamaged) << distance;
+    }
+}
