@@ -90,12 +90,13 @@ Bytes Encode(LzmaRandom& random, const Bytes& data) {
     return stored;
 }
 
-// One input of many: as it is, cut, with trailing bytes, with bits flipped, bytes changed, or other properties.
+// One input of many: as it is, cut, with trailing bytes, with bits flipped, bytes changed, or other properties; and
+// with a code that is not below the range, as no encoder makes it, which is where sign and size come apart.
 Bytes Damage(LzmaRandom& random, const Bytes& whole) {
     Bytes stored = whole;
     const auto size = static_cast<uint32_t>(whole.size());
     const auto streamPlace = [&] { return LZMA_PROPS_SIZE + random.Below(size - LZMA_PROPS_SIZE); };
-    switch (random.Below(8)) {
+    switch (random.Below(9)) {
     case 0: break;
     case 1: stored.resize(LZMA_PROPS_SIZE + random.Below(size - LZMA_PROPS_SIZE)); break;
     case 2: stored.insert(stored.end(), 1 + random.Below(40), static_cast<uint8_t>(random.Next())); break;
@@ -110,6 +111,12 @@ Bytes Damage(LzmaRandom& random, const Bytes& whole) {
             stored[place] = static_cast<uint8_t>(random.Next());
         break;
     }
+    case 8:
+        for (size_t place = LZMA_PROPS_SIZE + 1; place < std::min<size_t>(stored.size(), LZMA_PROPS_SIZE + 5); ++place)
+            stored[place] = 0xFF;
+        for (uint32_t flips = random.Below(4); flips != 0; --flips)
+            stored[streamPlace()] = static_cast<uint8_t>(random.Next());
+        break;
     case 7:
         // Others of about the same size of table, or any, or none that is valid.
         if (random.OneIn(500))

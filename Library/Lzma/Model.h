@@ -67,7 +67,7 @@ constexpr uint32_t kLengthsWithSlots = 4; // lengths of 2, 3, 4 and more choose 
 constexpr uint32_t kFirstTreeSlot = 4;
 constexpr uint32_t kFirstDirectSlot = 14;
 constexpr uint32_t kMostTreeBits = 5; // of the slots between
-constexpr uint32_t kAlignBits = 4;    // the last bits of the slots from kFirstDirectSlot on
+constexpr int kAlignBits = 4;         // the last bits of the slots from kFirstDirectSlot on
 
 // Within the probabilities of a length: those of repeats are apart from those of matches.
 constexpr uint32_t kLengthIsLong = 0;

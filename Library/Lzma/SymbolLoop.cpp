@@ -1,5 +1,5 @@
 #include "Library/Lzma/SymbolLoop.h"
-#include "Library/Lzma/RangeDecoder.h"
+#include "Library/Lzma/BitDecoder.h"
 
 #include <cstring>
 
@@ -18,9 +18,10 @@ template <class Decoder>
     return kShortestMatch + 16 + decoder.template Tree<8>(length + kLengthHigh);
 }
 
-// Returns the distance less one.
+// Returns the distance less one, of a match at out.
 template <class Decoder>
-[[gnu::always_inline]] inline uint32_t DecodeDistance(Decoder& decoder, Probability* table, uint32_t length) {
+[[gnu::always_inline]] inline uint32_t DecodeDistance(Decoder& decoder, Probability* table, uint32_t length,
+                                                      const uint8_t* out) {
     const uint32_t choice =
         length < kShortestMatch + kLengthsWithSlots ? length - kShortestMatch : kLengthsWithSlots - 1;
     const uint32_t slot = decoder.template Tree<kSlotBits>(table + kSlot + (choice << kSlotBits));
@@ -32,7 +33,12 @@ template <class Decoder>
         return (highest << bits) + decoder.ReverseTree(tree, bits);
     }
     const uint32_t direct = decoder.DirectBits(highest, bits - kAlignBits);
-    return (direct << kAlignBits) + decoder.ReverseTree(table + kAlign, kAlignBits);
+    // What the match copies begins within 16 bytes of here, and is under way before the last bits are known: 1 to 2 %
+    // of the time on streams larger than the processor's nearer caches.
+    const size_t middle = (size_t{direct} << kAlignBits) + (1 << kAlignBits) / 2;
+    if constexpr (!Decoder::kIsTrial)
+        __builtin_prefetch(reinterpret_cast<const void*>(reinterpret_cast<uintptr_t>(out) - middle));
+    return (direct << kAlignBits) + decoder.AlignTree(table + kAlign);
 }
 
 // Copies count bytes, at least one, that begin distance back. The ranges may overlap: bytes that are written are read.
@@ -97,7 +103,7 @@ template <class Decoder>
         uint32_t length;
         if (!decoder.Bit(table[kIsRepeat + state])) {
             length = DecodeLength(decoder, table + kMatchLength, positionState);
-            const uint32_t distance = DecodeDistance(decoder, table, length);
+            const uint32_t distance = DecodeDistance(decoder, table, length, out);
             if constexpr (Decoder::kIsTrial) {
                 result = kSymbolsEndMark;
                 break;
@@ -150,7 +156,7 @@ template <class Decoder>
             pending = length - count;
         }
         out = CopyMatch(symbols, out, distance0, count);
-        previous = out[-1];
+        previous = *FindMatch(symbols, out - 1, distance0); // what out[-1] is, without waiting for the copy
     } while (out < outLimit && decoder.in < inLimit);
 
     decoder.Normalise();
@@ -174,7 +180,10 @@ template <class Decoder>
 } // namespace
 
 SymbolResult DecodeSymbols(SymbolState& symbols, const uint8_t* inLimit, uint8_t* outLimit) {
-    const RangeDecoder decoder = {symbols.range, symbols.code, symbols.in};
+    BitDecoder decoder;
+    decoder.range = symbols.range;
+    decoder.code = symbols.code;
+    decoder.in = symbols.in;
     return static_cast<SymbolResult>(DecodeWith(decoder, symbols, inLimit, outLimit, &symbols));
 }
 
