@@ -39,7 +39,10 @@ Bytes MakeData(LzmaRandom& random, size_t size, const std::vector<Bytes>& files)
     while (data.size() < size) {
         size_t run = 1 + random.Below(1 + random.Below(static_cast<uint32_t>(size)));
         const uint8_t byte = static_cast<uint8_t>(random.Next());
-        const uint32_t distance = random.OneIn(2) ? 1 + random.Below(20) : 1 + random.Next() % 100'000;
+        // Near, up to the whole of a dictionary, or anywhere.
+        uint32_t distance = 1 + random.Below(20);
+        if (random.OneIn(3)) distance = (4096u << random.Below(3)) - random.Below(20);
+        if (random.OneIn(3)) distance = 1 + random.Below(100'000);
         const Bytes* const file = files.empty() ? nullptr : &files[random.Below(static_cast<uint32_t>(files.size()))];
         const uint32_t kind = random.Below(file != nullptr && !file->empty() ? 6 : 4);
         size_t place = kind >= 4 ? random.Below(static_cast<uint32_t>(file->size())) : 0;
@@ -73,7 +76,7 @@ Bytes Encode(LzmaRandom& random, const Bytes& data) {
         properties.lp /= 2;
     }
     properties.pb = static_cast<int>(random.Below(5));
-    properties.dictSize = 1u << (12 + random.Below(10));
+    properties.dictSize = 1u << (12 + random.Below(1 + random.Below(10)));
     properties.fb = static_cast<int>(5 + random.Below(269));
     properties.algo = static_cast<int>(random.Below(2));
     properties.numThreads = 1;
@@ -96,7 +99,7 @@ Bytes Damage(LzmaRandom& random, const Bytes& whole) {
     Bytes stored = whole;
     const auto size = static_cast<uint32_t>(whole.size());
     const auto streamPlace = [&] { return LZMA_PROPS_SIZE + random.Below(size - LZMA_PROPS_SIZE); };
-    switch (random.Below(9)) {
+    switch (random.Below(10)) {
     case 0: break;
     case 1: stored.resize(LZMA_PROPS_SIZE + random.Below(size - LZMA_PROPS_SIZE)); break;
     case 2: stored.insert(stored.end(), 1 + random.Below(40), static_cast<uint8_t>(random.Next())); break;
@@ -116,6 +119,10 @@ Bytes Damage(LzmaRandom& random, const Bytes& whole) {
             stored[place] = 0xFF;
         for (uint32_t flips = random.Below(4); flips != 0; --flips)
             stored[streamPlace()] = static_cast<uint8_t>(random.Next());
+        break;
+    case 9: // a smaller dictionary than the encoder's
+        stored[2] = static_cast<uint8_t>(random.Below(64));
+        stored[3] = stored[4] = 0;
         break;
     case 7:
         // Others of about the same size of table, or any, or none that is valid.

@@ -1,4 +1,5 @@
 #include "Library/Lzma/Lzma.h"
+#include "Library/Lzma/BitDecoder.h"
 #include "Tools/ArchiveWriter/Compressors.h"
 
 #include <algorithm>
@@ -223,5 +224,47 @@ TEST(LzmaBlock, DistanceBeyondTheDictionaryIsDamage) {
         std::string stored = CompressLzma(plain, {.level = 9, .dictionarySize = 65'536});
         stored.replace(1, 4, "\0\0\0\0"s);
         EXPECT_EQ(DecodeWhole(stored, plain.size()).result, distance == 4'096 ? kMayBeEnded : kDamaged) << distance;
+    }
+}
+
+// Matches that reach nearly as far as the dictionary does, each of them followed by a byte that is not of the match:
+// copies that write more than they should would spoil what the next one reads.
+TEST(LzmaStream, RingHoldsTheWholeDictionary) {
+    std::mt19937 random(9);
+    std::string plain(40'000, '\0');
+    for (size_t i = 0; i < plain.size(); ++i)
+        plain[i] = i < 4'090 || i % 21 == 0 ? static_cast<char>(random()) : plain[i - 4'090];
+    const std::string stored = CompressLzma(plain, {.level = 9, .dictionarySize = 4'096});
+    CountingMemory memory;
+    Stream stream(memory);
+    ASSERT_EQ(stream.Start(stored.data(), kHistoryOwn), kRoomFilled);
+    EXPECT_TRUE(DecodeStep(stream, stored.substr(kPropertiesSize), plain.size()).output == plain); // too long to print
+}
+
+// Damage can bring any code, also one that is not below the range, which no stream of random damage comes upon.
+TEST(LzmaBits, TrialAndDecoderAgreeOnAnyCode) {
+    std::mt19937 engine(3);
+    const auto random = [&] { return static_cast<uint32_t>(engine()); };
+    std::vector<Probability> table(kLiteralProbabilities);
+    const uint8_t input[kLongestSymbol] = {0x00, 0xFF, 0x80, 0x7F, 0x01};
+    for (int round = 0; round < 20'000; ++round) {
+        for (Probability& probability : table)
+            probability = static_cast<Probability>(31 + random() % 1'987);
+        BitDecoder decoder;
+        decoder.range = kLeastRange + random() % (0xFFFFFFFF - kLeastRange);
+        decoder.code = round % 2 != 0 ? random() : decoder.range - 2 + random() % 5;
+        decoder.in = input;
+        TrialDecoder trial = {decoder.range, decoder.code, input, std::end(input), false};
+        const int bits = 1 + static_cast<int>(random() % 26);
+        const uint32_t match = random() % 256;
+        // The trial first, as the decoder learns.
+        const uint32_t direct = trial.DirectBits(2, bits);
+        EXPECT_EQ(decoder.DirectBits(2, bits), direct) << round;
+        const uint32_t align = trial.AlignTree(table.data());
+        EXPECT_EQ(decoder.AlignTree(table.data()), align) << round;
+        const uint32_t literal = trial.MatchedLiteral(table.data(), match);
+        EXPECT_EQ(decoder.MatchedLiteral(table.data(), match), literal) << round;
+        EXPECT_EQ(trial.range, decoder.range) << round;
+        EXPECT_EQ(trial.code, decoder.code) << round;
     }
 }
