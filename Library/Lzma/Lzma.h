@@ -72,8 +72,8 @@ struct Answer {
 
 // Decodes until the room is full or an end mark is met, whichever comes first; the properties are not counted as input.
 // Input that ends before both is answered kNeedsInput, and is a failure as well: only after kRoomFilled,
-// kMayBeEnded and kEnded are there bytes. Allocates 2 bytes for each of 2,000 + 768 * 2^(lc + lp)
-// probabilities: 18 KB for the usual 3 and 0, 6.3 MB at most.
+// kMayBeEnded and kEnded are there bytes. Allocates 2 bytes for each of 2,052 + 768 * 2^(lc + lp)
+// probabilities: 16 KB for the usual 3 and 0, 6.3 MB at most.
 Answer DecodeBlock(const void* properties, const void* input, size_t inputSize, void* output, size_t room,
                    const Memory& memory);
 
