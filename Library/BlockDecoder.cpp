@@ -136,11 +136,11 @@ zarvo_code StreamCursor::Start(Failure* failure) {
         m_IsStarted = false;
         return code;
     }
-    if (m_Input.size() < kLzmaPropertiesSize) return ZARVO_OK;
+    if (m_Input.size() < lzma::kPropertiesSize) return ZARVO_OK;
     const LzmaResult result = m_Lzma.Begin(m_Input.data(), m_Block.size);
     m_IsStarted = result != kLzmaNoMemory;
     if (result == kLzmaNoMemory) return failure->SetMemory();
-    m_InputUsed = kLzmaPropertiesSize;
+    m_InputUsed = lzma::kPropertiesSize;
     m_IsBroken = result != kLzmaOk;
     return ZARVO_OK;
 }

@@ -56,11 +56,11 @@ zarvo_code Extraction::AddEntries(Failure* failure) {
 int Extraction::FindFolder(Worker* worker, UInt32 entry, Failure* failure) {
     const core::string_ref path = m_Plan.PathOnDisk(entry);
     const core::string_ref name = LastComponent(path);
-    worker->name = name;
-    if (worker->name.size() != name.size()) {
+    if (worker->name.grow(name.size()) == nullptr) {
         (void)failure->SetMemory();
         return -1;
     }
+    worker->name = name;
     return worker->folders.Get(WithoutLastComponent(path), failure);
 }
 

@@ -37,15 +37,14 @@ OutputFolder::~OutputFolder() {
 }
 
 zarvo_code OutputFolder::Open(const char* path, Failure* failure) {
-    const core::string whole(path, kMemLabelGeneral);
-    if (whole.size() != strlen(path)) return failure->SetMemory();
     // From the outermost on: what is there already says so.
+    const core::string_ref whole(path);
     core::string start(kMemLabelGeneral);
+    if (start.grow(whole.size()) == nullptr) return failure->SetMemory();
     int error = 0;
     for (size_t end = 1; end <= whole.size(); ++end) {
         if (end != whole.size() && whole[end] != '/') continue;
-        start = core::string_ref(whole).substr(0, end);
-        if (start.size() != end) return failure->SetMemory();
+        start = whole.substr(0, end);
         error = mkdir(start.c_str(), 0777) == 0 ? 0 : errno;
     }
     m_Descriptor = open(path, O_PATH | O_DIRECTORY | O_CLOEXEC);
@@ -91,12 +90,14 @@ bool FolderCache::Keep(core::string_ref path, int descriptor) {
     const size_t index = m_Folders.size();
     if (!m_Folders.resize_initialized(index + 1)) return false;
     Folder& folder = m_Folders[index];
+    if (folder.path.grow(path.size()) == nullptr) {
+        m_Folders.truncate(index);
+        return false;
+    }
     folder.path = path;
     folder.descriptor = descriptor;
     folder.lastUse = ++m_Uses;
-    if (folder.path.size() == path.size()) return true;
-    (void)m_Folders.resize_initialized(index); // never grows
-    return false;
+    return true;
 }
 
 int FolderCache::Get(core::string_ref path, Failure* failure) {

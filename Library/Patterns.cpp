@@ -57,8 +57,8 @@ zarvo_code zarvo_patterns::Add(core::string_ref text, Failure* failure) {
     text = StripEnds(text);
     bool isOk = count < kNone && m_Patterns.resize_initialized(count + 1);
     if (isOk) {
-        m_Patterns[count].text = text;
-        isOk = m_Patterns[count].text.size() == text.size() && MakeRoomForLiteral();
+        isOk = m_Patterns[count].text.grow(text.size()) != nullptr && MakeRoomForLiteral();
+        if (isOk) m_Patterns[count].text = text;
         if (isOk && IsGlob(text)) isOk = m_Globs.resize_uninitialized(globCount + 1);
     }
     if (!isOk) {

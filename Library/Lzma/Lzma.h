@@ -19,13 +19,13 @@
 //   kMayBeEnded    as far as the room reached                       the same, or no more, where the size is known
 //   kEnded         up to the end mark, it included                  answers the same
 //   kNeedsInput    all input; up to 20 bytes of it are remembered   more input
-//   kDamaged       nothing is counted                               answers the same, until it is started again
+//   kDamaged       produced: up to the broken symbol                nothing, until it is started again
 //   kUnsupported   nothing                                          start with other properties
 //   kNoMemory      nothing                                          start again
 //
 // Damage is found as soon as the symbol that shows it has been read whole: a distance to before the first byte or
 // beyond the dictionary, an end mark that is not where the encoder's last byte is, a first byte that is not 0. Other
-// damage yields other bytes. What a call has written before it fails is not meaningful.
+// damage yields other bytes. How many bytes come before damage does not depend on the pieces.
 //
 // Nothing is allocated but by the caller's functions, and nothing throws. Any thread; a stream is one thread's at a
 // time.
@@ -71,9 +71,8 @@ struct Answer {
 };
 
 // Decodes until the room is full or an end mark is met, whichever comes first; the properties are not counted as input.
-// Input that ends before both is answered kNeedsInput, and is a failure as well: only after kRoomFilled,
-// kMayBeEnded and kEnded are there bytes. Allocates 2 bytes for each of 2,052 + 768 * 2^(lc + lp)
-// probabilities: 16 KB for the usual 3 and 0, 6.3 MB at most.
+// Input that ends before both is answered kNeedsInput, with what it holds whole symbols of. Allocates 2 bytes for each
+// of 2,052 + 768 * 2^(lc + lp) probabilities: 16 KB for the usual 3 and 0, 6.3 MB at most.
 Answer DecodeBlock(const void* properties, const void* input, size_t inputSize, void* output, size_t room,
                    const Memory& memory);
 
@@ -87,6 +86,9 @@ public:
     // Starts a stream, at any time; properties are its kPropertiesSize bytes. Memory of the last stream is used
     // again where it is large enough. Answers kRoomFilled, kUnsupported or kNoMemory.
     Result Start(const void* properties, History history);
+
+    // Bytes that it has allocated, and keeps.
+    size_t MemoryUsed() const { return m_TableCapacity + m_DictionaryCapacity; }
 
     // Decodes as far as input and room reach. Both may be empty, and null then.
     Answer Decode(const void* input, size_t inputSize, void* output, size_t room, Finish finish);

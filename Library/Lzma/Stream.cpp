@@ -184,10 +184,7 @@ Answer Stream::Decode(const void* input, size_t inputSize, void* output, size_t 
             if (isLastSpan || (result != kRoomFilled && result != kMayBeEnded)) break;
         }
     }
-    if (result == kDamaged) {
-        m_Phase = Phase::kFailed;
-        return {kDamaged, 0, 0};
-    }
+    if (result == kDamaged) m_Phase = Phase::kFailed;
     return {result, inputSize - left.size, produced};
 }
 
@@ -197,9 +194,7 @@ Answer DecodeBlock(const void* properties, const void* input, size_t inputSize, 
     Stream stream(memory);
     const Result started = stream.Start(properties, kHistoryInOutput);
     if (started != kRoomFilled) return {started, 0, 0};
-    const Answer answer = stream.Decode(input, inputSize, output, room, kFinishAny);
-    if (answer.result == kNeedsInput) return {kNeedsInput, 0, 0};
-    return answer;
+    return stream.Decode(input, inputSize, output, room, kFinishAny);
 }
 
 } // namespace lzma

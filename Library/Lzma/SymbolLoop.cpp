@@ -62,6 +62,12 @@ template <class Decoder>
     return end;
 }
 
+// Damage: what came before it is there.
+inline SymbolResult StopAt(uint8_t* out, SymbolState* after) {
+    after->out = out;
+    return kSymbolsDamaged;
+}
+
 // DecodeSymbols, or TrySymbol, with which after is null and outLimit is not looked at.
 template <class Decoder>
 [[gnu::always_inline]] inline int DecodeWith(Decoder decoder, const SymbolState& symbols, const uint8_t* inLimit,
@@ -113,18 +119,18 @@ template <class Decoder>
                 break;
             }
             const size_t reach = position < symbols.dictionarySize ? position : symbols.dictionarySize;
-            if (distance >= reach) return kSymbolsDamaged;
+            if (distance >= reach) return StopAt(out, after);
             distance3 = distance2;
             distance2 = distance1;
             distance1 = distance0;
             distance0 = distance + 1;
             state = kAfterMatch[state];
         } else {
-            if (!Decoder::kIsTrial && position == 0) return kSymbolsDamaged;
+            if (!Decoder::kIsTrial && position == 0) return StopAt(out, after);
             if (!decoder.Bit(table[kIsNotLatest + state])) {
                 if (!decoder.Bit(table[kIsLong + state * kPositionStates + positionState])) {
                     if constexpr (Decoder::kIsTrial) break;
-                    if (out == outLimit) return kSymbolsDamaged;
+                    if (out == outLimit) return StopAt(out, after);
                     previous = *FindMatch(symbols, out, distance0);
                     *out++ = static_cast<uint8_t>(previous);
                     state = kAfterShortRepeat[state];
@@ -149,7 +155,7 @@ template <class Decoder>
         }
 
         const size_t room = static_cast<size_t>(outLimit - out);
-        if (room == 0) return kSymbolsDamaged;
+        if (room == 0) return StopAt(out, after);
         uint32_t count = length;
         if (count > room) {
             count = static_cast<uint32_t>(room);

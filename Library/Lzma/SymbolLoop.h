@@ -42,7 +42,7 @@ enum SymbolResult : int { kSymbolsDone, kSymbolsEndMark, kSymbolsDamaged };
 
 // Decodes at least one symbol, and goes on while out is below outLimit and in below inLimit; kLongestSymbol + 1 bytes
 // from inLimit on can be read. The room needs to be empty for the first symbol only if it is an end mark: anything else
-// is damage then. After damage the state is as it was, but for the table.
+// is damage then. After damage out is where the broken symbol would have begun, and nothing else is meaningful.
 SymbolResult DecodeSymbols(SymbolState& symbols, const uint8_t* inLimit, uint8_t* outLimit);
 
 enum TrialResult : int { kTrialNeedsInput, kTrialMatch, kTrialOther };

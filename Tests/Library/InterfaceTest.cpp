@@ -10,7 +10,9 @@
 
 namespace {
 
-// What the library asks for; the request that requestsLeft counts down to is refused.
+// What the library asks for; the request that requestsLeft counts down to is refused. Those of a few hundred bytes are
+// not counted: without them the process may end.
+constexpr size_t kSmall = 512;
 int s_RequestsLeft = -1;         // none
 bool s_IsRefusalLasting = false; // those after it, too
 
@@ -34,7 +36,7 @@ std::string OutputOf(const std::string& command) {
 } // namespace
 
 extern "C" int posix_memalign(void** pointer, size_t align, size_t size) {
-    if (s_RequestsLeft > 0 && --s_RequestsLeft == 0) {
+    if (size > kSmall && s_RequestsLeft > 0 && --s_RequestsLeft == 0) {
         if (s_IsRefusalLasting) s_RequestsLeft = 1;
         return ENOMEM;
     }

@@ -95,13 +95,13 @@ TEST(LzmaBlock, RoomAndEndMarkDecideTheAnswer) {
         {"no mark, exact room", kBare, 24, {kMayBeEnded, 14, kPlain}},
         {"no mark, bytes behind", kBare + "!", 24, {kMayBeEnded, 14, kPlain}},
         {"no mark, small room", kBare, 10, {kRoomFilled, 13, kPlain.substr(0, 10)}},
-        {"no mark, large room", kBare, 25, {kNeedsInput, 0, ""}},
+        {"no mark, large room", kBare, 25, {kNeedsInput, 14, kPlain}},
         {"no mark, no room", kBare, 0, {kRoomFilled, 5, ""}},
         {"mark, exact room", kMarked, 24, {kRoomFilled, 14, kPlain}},
         {"mark, large room", kMarked, 99, {kEnded, 19, kPlain}},
         {"mark, bytes behind", kMarked + "!", 99, {kEnded, 19, kPlain}},
-        {"first byte not 0", kBare.substr(0, 5) + "\1" + kBare.substr(6), 24, {kDamaged, 0, ""}},
-        {"mark at the wrong code", kMarked.substr(0, 23) + "\1", 99, {kDamaged, 0, ""}},
+        {"first byte not 0", kBare.substr(0, 5) + "\1" + kBare.substr(6), 24, {kDamaged, 5, ""}},
+        {"mark at the wrong code", kMarked.substr(0, 23) + "\1", 99, {kDamaged, 19, kPlain}},
         {"properties beyond all", "\xe1" + kBare.substr(1), 24, {kUnsupported, 0, ""}},
         {"fewer than 5 bytes", kBare.substr(0, 9), 0, {kNeedsInput, 0, ""}},
     };
@@ -110,8 +110,42 @@ TEST(LzmaBlock, RoomAndEndMarkDecideTheAnswer) {
 }
 
 TEST(LzmaBlock, EveryTruncationNeedsInput) {
-    for (size_t size = kPropertiesSize; size < kMarked.size(); ++size)
-        EXPECT_EQ(DecodeWhole(kMarked.substr(0, size), 99), (Outcome{kNeedsInput, 0, ""})) << size;
+    size_t produced = 0;
+    for (size_t size = kPropertiesSize; size < kMarked.size(); ++size) {
+        const Outcome outcome = DecodeWhole(kMarked.substr(0, size), 99);
+        EXPECT_EQ(outcome.result, kNeedsInput) << size;
+        EXPECT_EQ(outcome.output, kPlain.substr(0, outcome.output.size())) << size;
+        EXPECT_GE(outcome.output.size(), produced) << size;
+        produced = outcome.output.size();
+    }
+    EXPECT_EQ(produced, kPlain.size());
+}
+
+// However a broken stream is cut into pieces, the same bytes come before the damage.
+TEST(LzmaBlock, BytesBeforeDamageDoNotDependOnPieces) {
+    const std::string plain = MakeLongText();
+    const std::string stored = CompressLzma(plain, {.endMark = true});
+    std::mt19937 random(3);
+    for (int round = 0; round < 40; ++round) {
+        SCOPED_TRACE(round);
+        std::string broken = stored;
+        broken[kPropertiesSize + 1 + random() % (broken.size() - 6)] ^= static_cast<char>(1 + random() % 255);
+        const Outcome whole = DecodeWhole(broken, plain.size() + 1);
+        CountingMemory memory;
+        Stream stream(memory);
+        ASSERT_EQ(stream.Start(broken.data(), kHistoryOwn), kRoomFilled);
+        std::string output;
+        size_t consumed = kPropertiesSize;
+        Outcome step = {kRoomFilled, 0, ""};
+        while (step.result <= kNeedsInput && (step.consumed != 0 || !step.output.empty() || output.empty())) {
+            step = DecodeStep(stream, broken.substr(consumed, random() % 5'000), random() % 9'000);
+            consumed += step.consumed;
+            output += step.output;
+            output.resize(std::min(output.size(), plain.size() + 1));
+            if (consumed == broken.size() && step.result == kNeedsInput) break;
+        }
+        EXPECT_EQ(whole.output, output.substr(0, whole.output.size()));
+    }
 }
 
 TEST(LzmaBlock, RefusedMemoryIsNotDamage) {
@@ -176,7 +210,7 @@ TEST(LzmaStream, DamageLastsUntilItIsStartedAgain) {
     Stream stream(memory);
     EXPECT_EQ(DecodeStep(stream, kBare.substr(5), 24).result, kDamaged); // never started
     ASSERT_EQ(stream.Start(kBare.data(), kHistoryOwn), kRoomFilled);
-    EXPECT_EQ(DecodeStep(stream, "\1\2\3\4\5", 24), (Outcome{kDamaged, 0, ""}));
+    EXPECT_EQ(DecodeStep(stream, "\1\2\3\4\5", 24), (Outcome{kDamaged, 5, ""}));
     EXPECT_EQ(DecodeStep(stream, kBare.substr(5), 24), (Outcome{kDamaged, 0, ""}));
     ASSERT_EQ(stream.Start(kBare.data(), kHistoryOwn), kRoomFilled);
     EXPECT_EQ(DecodeStep(stream, kBare.substr(5), 24), (Outcome{kMayBeEnded, 14, kPlain}));
