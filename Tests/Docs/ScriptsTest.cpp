@@ -41,7 +41,7 @@ TEST_F(Scripts, AskForAllTheirPackagesAtOnce) {
     Replace("id", "echo 1000");
     const std::string build = "g++ cmake ninja-build liblz4-dev lzma-dev libcli11-dev nlohmann-json3-dev ",
                       test = build + "libgtest-dev clang libclang-rt-14-dev llvm",
-                      lint = build + "libgtest-dev libbenchmark-dev clang clang-tidy-14 gcovr git python3";
+                      lint = build + "libgtest-dev libbenchmark-dev liblzma-dev clang clang-tidy-14 gcovr git python3";
     struct Row {
         std::string script;
         std::vector<std::string> arguments;
