@@ -14,7 +14,6 @@
 #pragma once
 
 #include "Library/Failure.h"
-#include "Library/PathRules.h"
 #include "Runtime/Core/Containers/DynamicArray.h"
 #include "Runtime/Core/Containers/String.h"
 #include "Runtime/Core/NonCopyable.h"
