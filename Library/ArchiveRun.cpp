@@ -76,7 +76,7 @@ void ArchiveRun::SetKept(size_t entry) {
     m_Results.fetch_add(1, std::memory_order_relaxed); // for progress only
 }
 
-void ArchiveRun::SetFailed(size_t entry, const Failure& failure) {
+void ArchiveRun::SetFailed(size_t entry, const Failure& failure, State state) {
     bool isKept = false;
     {
         std::lock_guard lock(m_Lock);
@@ -94,7 +94,7 @@ void ArchiveRun::SetFailed(size_t entry, const Failure& failure) {
         m_Data.StopFor(noMemory);
         return;
     }
-    SetState(entry, kFailed);
+    SetState(entry, state);
     m_Results.fetch_add(1, std::memory_order_relaxed); // for progress only
 }
 
@@ -151,10 +151,10 @@ void ArchiveRun::TellReports() {
         report.text = "";
         const Node& node = Nodes()[m_Reported];
         Failure failure;
-        if (state == kFailed) {
+        if (state == kFailed || state == kBroken) {
             std::lock_guard lock(m_Lock);
             failure = m_Failures[m_FailureOf[m_Reported]].failure;
-            report.outcome = ZARVO_OUTCOME_FAILED;
+            report.outcome = state == kBroken ? ZARVO_OUTCOME_BROKEN : ZARVO_OUTCOME_FAILED;
             report.code = failure.code;
             report.system_code = failure.systemCode;
             report.text = failure.text;

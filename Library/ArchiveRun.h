@@ -37,7 +37,8 @@ protected:
     // The result of an entry, once. Any thread.
     void SetDone(size_t entry);
     void SetKept(size_t entry);
-    void SetFailed(size_t entry, const Failure& failure);
+    void SetFailed(size_t entry, const Failure& failure) { SetFailed(entry, failure, kFailed); }
+    void SetBroken(size_t entry, const Failure& damage) { SetFailed(entry, damage, kBroken); }
 
     // Called for each result in the archive's order, on the calling thread.
     virtual void Report(const zarvo_report& report) = 0;
@@ -46,13 +47,14 @@ protected:
     bool IsOutsideData(const Node& node) const { return node.offset >= m_Archive->Info().data_size; }
 
 private:
-    enum State : UInt8 { kNoResult, kPending, kDone, kKept, kFailed };
+    enum State : UInt8 { kNoResult, kPending, kDone, kKept, kFailed, kBroken };
 
     void Work(UInt32 number) override;
     void Watch(UInt32 count) override;
     void TellReports();
     bool TellProgress(); // false: to be stopped
     void SetState(size_t entry, State state);
+    void SetFailed(size_t entry, const Failure& failure, State state);
     State GetState(size_t entry);
 
     zarvo_archive* m_Archive;

@@ -95,7 +95,7 @@ void Extraction::Settle(UInt32 entry, const Failure& failure, const Failure* dam
     else if (failure.code != ZARVO_OK)
         SetFailed(entry, failure);
     else if (damage != nullptr)
-        SetFailed(entry, *damage);
+        SetBroken(entry, *damage);
     else
         SetDone(entry);
 }

@@ -386,9 +386,10 @@ typedef struct zarvo_run_options {
 
 /* What became of an entry. */
 enum {
-    ZARVO_OUTCOME_DONE = 0,  /* put in place */
-    ZARVO_OUTCOME_KEPT = 1,  /* what was there was left (ZARVO_OVERWRITE_NEVER) */
-    ZARVO_OUTCOME_FAILED = 2 /* see code and text */
+    ZARVO_OUTCOME_DONE = 0,   /* put in place */
+    ZARVO_OUTCOME_KEPT = 1,   /* what was there was left (ZARVO_OVERWRITE_NEVER) */
+    ZARVO_OUTCOME_FAILED = 2, /* see code and text */
+    ZARVO_OUTCOME_BROKEN = 3  /* the same, but what lies before the damage was put in place (keep_broken) */
 };
 typedef struct zarvo_report {
     size_t struct_size;
@@ -426,7 +427,7 @@ typedef struct zarvo_summary {
     uint64_t files;    /* put in place (of a test: looked at) */
     uint64_t folders;  /* entries that are folders, put in place */
     uint64_t kept;     /* left as they were */
-    uint64_t failures; /* entries that failed (of a test: entries with unreadable bytes) */
+    uint64_t failures; /* entries that failed, also broken ones (of a test: entries with unreadable bytes) */
     uint64_t bytes;    /* of the files */
     uint64_t damaged_blocks;
 } zarvo_summary;

@@ -7,14 +7,15 @@
 //         if (entry.is_file()) use(entry.path(), entry.size());
 //
 // Nothing of it throws, and programs without exceptions may use it. Where there are exceptions, one that leaves a
-// callback (a source, a log function) is caught before it can reach the library, and is thrown again when the call that
-// met it returns; a source that throws has failed to read.
+// callback (a source, a log function, one of a run) is caught before it can reach the library, and is thrown again when
+// the call that met it returns; a source that throws has failed to read, and a run whose callback throws is stopped.
 //
 // Threads: as zarvo.h says of the handles. Views of texts are valid until their archive is destroyed.
 #pragma once
 
 #include "zarvo.h"
 
+#include <atomic>
 #include <cerrno>
 #include <cstddef>
 #include <exception>
@@ -230,6 +231,137 @@ private:
     std::unique_ptr<zarvo_stream, free_stream> m_Stream;
 };
 
+// See zarvo_patterns. When memory is refused, a pattern is not added and nothing matches.
+class patterns {
+public:
+    patterns() {
+        zarvo_patterns* made = nullptr;
+        (void)zarvo_patterns_new(&made, nullptr);
+        m_Patterns.reset(made);
+    }
+
+    error add(std::string_view pattern) {
+        return detail::check([&](zarvo_error** why) {
+            return zarvo_patterns_add(m_Patterns.get(), pattern.data(), pattern.size(), why);
+        });
+    }
+    bool match(std::string_view path) { return zarvo_patterns_match(m_Patterns.get(), path.data(), path.size()) == 1; }
+    bool is_used(size_t index) const { return zarvo_patterns_used(m_Patterns.get(), index) == 1; }
+
+    // For the operations of zarvo.h. Stays this object's.
+    zarvo_patterns* get() const { return m_Patterns.get(); }
+
+private:
+    struct free_patterns {
+        void operator()(zarvo_patterns* patterns) const { zarvo_patterns_free(patterns); }
+    };
+    std::unique_ptr<zarvo_patterns, free_patterns> m_Patterns;
+};
+
+// See zarvo_run_options; 0 is the default of each.
+struct run_options {
+    uint32_t threads = 0;
+    uint64_t memory = 0;
+    patterns* wanted = nullptr;
+    patterns* excluded = nullptr;
+    std::function<bool(const zarvo_progress& progress)> progress = {}; // false stops the run
+};
+
+// See zarvo_extract_options.
+struct extract_options {
+    int32_t overwrite = ZARVO_OVERWRITE_ALWAYS;
+    bool keep_broken = false;
+    bool dry_run = false;
+    uint64_t strip = 0;
+    uint64_t max_bytes = 0; // 0: no limit
+    std::function<void(const zarvo_report& report)> report = {};
+};
+
+// See zarvo_test_options.
+struct test_options {
+    std::function<void(uint64_t block_index, std::string_view text)> block = {};
+    std::function<void(uint64_t index, uint64_t readable)> entry = {};
+};
+
+// See zarvo_visit_options. bytes is called by many threads at once, for different files.
+struct visit_options {
+    uint64_t strip = 0;
+    std::function<void(uint64_t index, uint64_t offset, std::span<const std::byte> bytes)> bytes = {};
+    std::function<void(const zarvo_report& report)> report = {};
+};
+
+// What a run has done, also one that failed.
+struct [[nodiscard]] run_result {
+    zarvo_summary summary = ZARVO_SUMMARY_INIT;
+    zarvo::error error;
+};
+
+namespace detail {
+
+// What a run calls back. Once something of it has thrown, in whatever thread, nothing is called any more, and the run
+// stops when it next tells its progress.
+template <typename Options>
+class run_callbacks {
+public:
+    run_callbacks(const run_options& options, const Options& own) : m_Options(options), m_Own(own) {}
+
+    // Makes the run; call: (run options, summary, error) -> code.
+    template <typename Call>
+    run_result make(Call&& call) {
+        zarvo_run_options plain = ZARVO_RUN_OPTIONS_INIT;
+        plain.threads = m_Options.threads;
+        plain.memory = m_Options.memory;
+        plain.wanted = m_Options.wanted != nullptr ? m_Options.wanted->get() : nullptr;
+        plain.excluded = m_Options.excluded != nullptr ? m_Options.excluded->get() : nullptr;
+        plain.progress = [](void* context, const zarvo_progress* progress) {
+            auto* const self = static_cast<run_callbacks*>(context);
+            const auto tell = [&] { return !self->m_Options.progress || self->m_Options.progress(*progress); };
+            return self->guard(tell) ? 0 : 1;
+        };
+        plain.context = this;
+        run_result result;
+        result.error = check([&](zarvo_error** why) { return call(&plain, &result.summary, why); });
+#if defined(__cpp_exceptions)
+        if (m_Exception) pending = m_Exception;
+#endif
+        rethrow();
+        return result;
+    }
+
+    // In a callback of the run: calls use with the caller's options.
+    template <typename Use>
+    static void call(void* context, Use&& use) noexcept {
+        auto* const self = static_cast<run_callbacks*>(context);
+        (void)self->guard([&] {
+            use(self->m_Own);
+            return true;
+        });
+    }
+
+private:
+    template <typename Call>
+    bool guard(Call&& call) noexcept {
+#if defined(__cpp_exceptions)
+        if (m_HasThrown) return false;
+        try {
+            return call();
+        } catch (...) {
+            if (!m_HasThrown.exchange(true)) m_Exception = std::current_exception();
+            return false;
+        }
+#else
+        return call();
+#endif
+    }
+
+    const run_options& m_Options;
+    const Options& m_Own;
+    std::atomic<bool> m_HasThrown = false;
+    std::exception_ptr m_Exception; // the first one's, for after the run
+};
+
+} // namespace detail
+
 // An open archive.
 class archive {
 public:
@@ -336,6 +468,62 @@ public:
         return read;
     }
 
+    // Writes entries below a folder: see zarvo_extract.
+    run_result extract(const char* folder, const run_options& options = {}, const extract_options& how = {}) {
+        using calls = detail::run_callbacks<extract_options>;
+        zarvo_extract_options plain = ZARVO_EXTRACT_OPTIONS_INIT;
+        plain.overwrite = how.overwrite;
+        plain.keep_broken = how.keep_broken ? 1 : 0;
+        plain.dry_run = how.dry_run ? 1 : 0;
+        plain.strip = how.strip;
+        plain.max_bytes = how.max_bytes;
+        if (how.report)
+            plain.report = [](void* context, const zarvo_report* report) {
+                calls::call(context, [&](const extract_options& own) { own.report(*report); });
+            };
+        return calls(options, how).make([&](zarvo_run_options* run, zarvo_summary* summary, zarvo_error** why) {
+            return zarvo_extract(get(), folder, run, &plain, summary, why);
+        });
+    }
+    run_result extract(const std::string& folder, const run_options& options = {}, const extract_options& how = {}) {
+        return extract(folder.c_str(), options, how);
+    }
+    // Decodes every block, and tells what can't be read: see zarvo_test.
+    run_result test(const run_options& options = {}, const test_options& what = {}) {
+        using calls = detail::run_callbacks<test_options>;
+        zarvo_test_options plain = ZARVO_TEST_OPTIONS_INIT;
+        if (what.block)
+            plain.block = [](void* context, uint64_t block_index, const char* text) {
+                calls::call(context, [&](const test_options& own) { own.block(block_index, text); });
+            };
+        if (what.entry)
+            plain.entry = [](void* context, uint64_t index, uint64_t readable) {
+                calls::call(context, [&](const test_options& own) { own.entry(index, readable); });
+            };
+        return calls(options, what).make([&](zarvo_run_options* run, zarvo_summary* summary, zarvo_error** why) {
+            return zarvo_test(get(), run, &plain, summary, why);
+        });
+    }
+    // Hands over the bytes of files: see zarvo_visit.
+    run_result visit(const run_options& options = {}, const visit_options& what = {}) {
+        using calls = detail::run_callbacks<visit_options>;
+        zarvo_visit_options plain = ZARVO_VISIT_OPTIONS_INIT;
+        plain.strip = what.strip;
+        if (what.bytes)
+            plain.bytes = [](void* context, uint64_t index, uint64_t offset, const void* bytes, size_t size) {
+                calls::call(context, [&](const visit_options& own) {
+                    own.bytes(index, offset, {static_cast<const std::byte*>(bytes), size});
+                });
+            };
+        if (what.report)
+            plain.report = [](void* context, const zarvo_report* report) {
+                calls::call(context, [&](const visit_options& own) { own.report(*report); });
+            };
+        return calls(options, what).make([&](zarvo_run_options* run, zarvo_summary* summary, zarvo_error** why) {
+            return zarvo_visit(get(), run, &plain, summary, why);
+        });
+    }
+
 private:
     // What the library calls back, at an address that stays.
     struct callbacks {
@@ -387,29 +575,5 @@ inline std::string normalize_path(std::string_view path) {
     normal.resize(zarvo_normalize_path(path.data(), path.size(), normal.data()));
     return normal;
 }
-
-// See zarvo_patterns. When memory is refused, a pattern is not added and nothing matches.
-class patterns {
-public:
-    patterns() {
-        zarvo_patterns* made = nullptr;
-        (void)zarvo_patterns_new(&made, nullptr);
-        m_Patterns.reset(made);
-    }
-
-    error add(std::string_view pattern) {
-        return detail::check([&](zarvo_error** why) {
-            return zarvo_patterns_add(m_Patterns.get(), pattern.data(), pattern.size(), why);
-        });
-    }
-    bool match(std::string_view path) { return zarvo_patterns_match(m_Patterns.get(), path.data(), path.size()) == 1; }
-    bool is_used(size_t index) const { return zarvo_patterns_used(m_Patterns.get(), index) == 1; }
-
-private:
-    struct free_patterns {
-        void operator()(zarvo_patterns* patterns) const { zarvo_patterns_free(patterns); }
-    };
-    std::unique_ptr<zarvo_patterns, free_patterns> m_Patterns;
-};
 
 } // namespace zarvo

@@ -65,7 +65,7 @@ void AddReport(void* given, const zarvo_report* report) {
     auto& context = *static_cast<ReportContext*>(given);
     zarvo_entry entry = ZARVO_ENTRY_INIT;
     EXPECT_EQ(ZARVO_OK, zarvo_get_entry(context.archive, report->index, &entry));
-    const char* const words[] = {"", " kept", ": "};
+    const char* const words[] = {"", " kept", ": ", " broken: "};
     context.lines += std::string(entry.path) + words[report->outcome] + report->text + "\n";
 }
 
@@ -448,4 +448,56 @@ TEST(Extraction, ProgressStopsTheRun) {
               zarvo_extract(archive.get(), (folder / "out").c_str(), &run, nullptr, nullptr, nullptr));
     for (const auto& [name, text] : TreeOf(folder / "out"))
         EXPECT_EQ(std::string::npos, name.find(".zarvo-")) << name;
+}
+
+TEST(Extraction, FileKeptBrokenIsReportedAsSuch) {
+    std::string damaged(3, '\xFF');
+    const std::string bytes =
+        BuildArchive({.entries = {{.path = "a", .bytes = "12345678"}},
+                      .blocks = {{.size = 4}, {.size = 4, .type = kCompressionLz4, .stored = damaged}}})
+            .bytes;
+    const TemporaryFolder folder;
+    EXPECT_EQ((Outcome{"a: block 1 is damaged\n", ZARVO_OK, 0, 1}), Extract(bytes, folder.Path()));
+    EXPECT_EQ((Outcome{"a broken: block 1 is damaged\n", ZARVO_OK, 0, 1}),
+              Extract(bytes, folder.Path(), {.keepBroken = 1}));
+    EXPECT_EQ((Tree{{"a", "1234"}}), TreeOf(folder.Path()));
+}
+
+// What a callback of C++ throws ends the run, and comes out of the call, also from other threads.
+TEST(Extraction, ExceptionsOfCallbacksAreThrownAgain) {
+    const std::string damaged =
+        BuildArchive({.entries = ManyFiles(11),
+                      .blocks = {{.size = 4, .type = kCompressionLz4, .stored = std::string(3, '\xFF')}}})
+            .bytes;
+    const TemporaryFolder folder;
+    const auto fail = [](auto&&...) { throw std::runtime_error("from the callback"); };
+    const auto failSaying = [](auto&&...) -> bool { throw std::runtime_error("from the callback"); };
+    const std::pair<const char*, std::function<zarvo::run_result(zarvo::archive&)>> kRuns[] = {
+        {"progress", [&](zarvo::archive& archive) { return archive.test({.progress = failSaying}); }},
+        {"extract", [&](zarvo::archive& archive) { return archive.extract(folder / "out", {}, {.report = fail}); }},
+        {"block", [&](zarvo::archive& archive) { return archive.test({}, {.block = fail}); }},
+        {"entry", [&](zarvo::archive& archive) { return archive.test({}, {.entry = fail}); }},
+        {"bytes", [&](zarvo::archive& archive) { return archive.visit({.threads = 8}, {.bytes = fail}); }},
+        {"report", [&](zarvo::archive& archive) { return archive.visit({}, {.report = fail}); }},
+    };
+    for (const auto& [callback, run] : kRuns) {
+        zarvo::archive archive = OpenBytes(damaged);
+        EXPECT_THROW((void)run(archive), std::runtime_error) << callback;
+        EXPECT_FALSE(archive.test().error) << "after " << callback;
+    }
+}
+
+TEST(Extraction, NothingIsCalledAfterAnException) {
+    const std::string bytes = Archive(ManyFiles(11));
+    zarvo::archive archive = OpenBytes(bytes);
+    size_t calls = 0, reports = 0;
+    zarvo::visit_options what;
+    what.bytes = [&](auto&&...) {
+        ++calls;
+        throw std::runtime_error("once");
+    };
+    what.report = [&](const zarvo_report&) { ++reports; };
+    EXPECT_THROW((void)archive.visit({.threads = 1}, what), std::runtime_error);
+    EXPECT_EQ(1u, calls);
+    EXPECT_EQ(0u, reports);
 }
