@@ -44,7 +44,8 @@ if(TARGET ZarvoProgram)
     set(CPACK_DEBIAN_ZARVO_PACKAGE_SHLIBDEPS ON)
     set(CPACK_DEBIAN_PACKAGE_SHLIBDEPS_PRIVATE_DIRS ${PROJECT_BINARY_DIR}) # where libzarvo is found
     set(CPACK_DEBIAN_ZARVO_PACKAGE_DEPENDS "libzarvo0 (= ${PROJECT_VERSION})")
-    set(CPACK_COMPONENT_ZARVO_DESCRIPTION "The command zarvo lists, describes and prints what an archive holds.
+    set(CPACK_COMPONENT_ZARVO_DESCRIPTION "The command zarvo lists, prints, tests, sums up and extracts what an archive
+holds, on all processors.
 It reads the layouts ZarvoFS, ZarvoWeb, ZarvoRaw and ZarvoArchive.")
 endif()
 

@@ -92,11 +92,12 @@ std::string CheckValue(const Option& option, const std::string& value) {
     const std::string name = DescribeOption(option);
     if (option.kind == ValueKind::kSize && !ParseSize(value))
         return MakeMessage("%: '%' is no size, such as 64M", {name, value});
-    if (option.kind == ValueKind::kCount) {
+    if (option.kind == ValueKind::kCount || option.kind == ValueKind::kNumber) {
+        const unsigned least = option.kind == ValueKind::kCount ? 1 : 0;
         unsigned count = 0;
         const auto [end, error] = std::from_chars(value.data(), value.data() + value.size(), count);
-        if (error != std::errc() || end != value.data() + value.size() || count == 0)
-            return MakeMessage("%: '%' is no number from 1 on", {name, value});
+        if (error != std::errc() || end != value.data() + value.size() || count < least)
+            return MakeMessage("%: '%' is no number from % on", {name, value, std::to_string(least)});
     }
     const std::string choices = '|' + std::string(option.choices) + '|';
     if (option.kind == ValueKind::kChoice &&

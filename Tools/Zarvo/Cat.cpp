@@ -4,6 +4,7 @@
 #include "Tools/Zarvo/Text.h"
 
 #include <algorithm>
+#include <functional>
 #include <span>
 #include <unordered_map>
 #include <utility>
@@ -102,14 +103,13 @@ std::string GetRefusal(const zarvo::entry& entry) {
 
 // Writes one file. Returns what stopped that before its end; what lies before has been written.
 zarvo::error WriteFile(zarvo::archive& archive, const zarvo::entry& entry, std::span<std::byte> buffer,
-                       OutputBuffer& output, Amount& done, Progress& progress) {
+                       OutputBuffer& output, const std::function<void(size_t)>& tell) {
     zarvo::result<zarvo::stream> stream = archive.open_stream(entry.index());
     if (!stream) return std::move(stream).error();
     while (!output.IsClosed()) {
         zarvo::read_result read = stream->read(buffer);
         output.Write({reinterpret_cast<const char*>(buffer.data()), read.count});
-        done.bytes += read.count;
-        progress.Update(done);
+        tell(read.count);
         if (read.error || read.count == 0) return std::move(read.error);
     }
     return {};
@@ -141,7 +141,11 @@ int RunCat(const Run& run) {
     Amount total = {.bytes = 0, .files = files.size()}, done;
     for (const uint64_t index : files)
         total.bytes += archive->entries()[index].size();
-    Progress progress(run.arguments, run.console, total, !run.output.IsTerminal());
+    Progress progress(run.arguments, run.console, !run.output.IsTerminal());
+    const auto tell = [&](size_t count) {
+        done.bytes += count;
+        progress.Update(done, total);
+    };
     constexpr size_t kPieceSize = 1 << 20;
     std::vector<std::byte> buffer(kPieceSize);
     for (const uint64_t index : files) {
@@ -150,7 +154,7 @@ int RunCat(const Run& run) {
         if (const std::string refusal = GetRefusal(entry); !refusal.empty()) {
             run.SayOfEntry(path, entry.path(), refusal);
             status = kSomethingWrong;
-        } else if (const zarvo::error error = WriteFile(*archive, entry, buffer, run.output, done, progress)) {
+        } else if (const zarvo::error error = WriteFile(*archive, entry, buffer, run.output, tell)) {
             run.SayOfEntry(path, entry.path(), error.text());
             status = kSomethingWrong;
         }

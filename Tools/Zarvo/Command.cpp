@@ -11,7 +11,7 @@ namespace {
 
 constexpr int kWrongUsage = 2;
 
-int RunSubcommand(const World& world, OutputBuffer& output, Console& console) {
+int RunSubcommand(const World& world, OutputBuffer& output, Console& console, std::string& done) {
     const Subcommand* subcommand = nullptr;
     std::string complaint;
     const std::optional<Arguments> arguments = Arguments::Parse(world.arguments, &subcommand, &complaint);
@@ -30,10 +30,13 @@ int RunSubcommand(const World& world, OutputBuffer& output, Console& console) {
         return kAllDone;
     }
 
-    const Run run = {.arguments = *arguments, .input = world.input, .output = output, .console = console};
+    const Run run = {.arguments = *arguments, .input = world.input, .output = output, .console = console, .done = done};
     if (subcommand == &kList) return RunList(run);
     if (subcommand == &kInfo) return RunInfo(run);
-    return RunCat(run);
+    if (subcommand == &kExtract) return RunExtract(run);
+    if (subcommand == &kCat) return RunCat(run);
+    if (subcommand == &kTest) return RunTest(run);
+    return RunSum(run);
 }
 
 } // namespace
@@ -42,16 +45,17 @@ Ending RunZarvo(const World& world) {
     OutputBuffer output(world.output, world.isOutputTerminal, world.signal);
     Console console(world.error, world.isErrorTerminal, output);
     int status = kSomethingWrong;
+    std::string done;
     try {
-        status = RunSubcommand(world, output, console);
+        status = RunSubcommand(world, output, console, done);
     } catch (const std::bad_alloc&) {
         console.Say(MakeMessage("Cannot allocate memory"));
     }
     output.Flush();
     if (output.HasSignal()) {
         const int signal = *world.signal;
-        console.Say(MakeMessage("ended by SIG% after % bytes of results",
-                                {sigabbrev_np(signal), std::to_string(output.GetWritten())}));
+        if (done.empty()) done = std::to_string(output.GetWritten()) + " bytes of results";
+        console.Say(MakeMessage("ended by SIG% after %", {sigabbrev_np(signal), done}));
         return {.status = kSomethingWrong, .signal = signal};
     }
     if (output.GetError() == EPIPE) return {.status = kSomethingWrong, .signal = SIGPIPE};

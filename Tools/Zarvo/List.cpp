@@ -45,11 +45,7 @@ int RunList(const Run& run) {
     if (!archive) return kNoArchive;
     const PatternList list = ReadPatterns(run);
     zarvo::patterns patterns;
-    for (const std::string& pattern : list.patterns)
-        if (const zarvo::error error = patterns.add(pattern)) {
-            run.SayOfEntry(path, pattern, error.text());
-            return kSomethingWrong;
-        }
+    if (!AddPatterns(run, path, list.patterns, patterns)) return kSomethingWrong;
 
     const bool isJson = run.arguments.Has(kJson);
     const std::string_view end = run.arguments.Has(kNul) ? std::string_view("\0", 1) : "\n";
@@ -65,16 +61,9 @@ int RunList(const Run& run) {
         if (isLong)
             run.output.Write((entry.is_folder() ? "d " : "f ") + AlignRight(entry.size(), widths.size) + " " +
                              AlignRight(entry.offset(), widths.offset) + " ");
-        run.output.WriteText(entry.path());
-        if (entry.is_folder() && !entry.path().ends_with('/')) run.output.Write("/");
-        run.output.Write(end);
+        run.WritePath(entry, end);
     }
 
-    int status = list.isComplete ? kAllDone : kSomethingWrong;
-    for (size_t index = 0; index < list.patterns.size() && !run.output.IsClosed(); ++index)
-        if (!patterns.is_used(index)) {
-            SayUnmatched(run, path, list.patterns[index]);
-            status = kSomethingWrong;
-        }
-    return status;
+    const bool areUsed = SayUnused(run, path, list, patterns);
+    return list.isComplete && areUsed ? kAllDone : kSomethingWrong;
 }

@@ -5,11 +5,32 @@
 const Option kLong = {.letter = 'l', .help = "show kind (f or d), size, offset in the data, and path"};
 const Option kNul = {.letter = '0', .help = "end each path with NUL instead of a newline, also in --files-from"};
 const Option kNulInput = {.letter = '0', .help = "patterns in --files-from end with NUL instead of a newline"};
+const Option kNulOutput = {.letter = '0', .help = "end each path with NUL instead of a newline"};
 const Option kJson = {.name = "json", .help = "print JSON Lines, one object a line"};
 const Option kFilesFrom = {.name = "files-from",
                            .value = "FILE",
                            .kind = ValueKind::kFile,
                            .help = "take more patterns from FILE, one a line (-: standard input)"};
+const Option kOutputFolder = {.letter = 'o',
+                              .value = "DIR",
+                              .kind = ValueKind::kFile,
+                              .help = "write into DIR, made where it is missing (default: ARCHIVE_data)"};
+const Option kExclude = {.letter = 'x', .value = "PATTERN", .help = "leave out what matches; may be given repeatedly"};
+const Option kOverwrite = {.name = "overwrite",
+                           .value = "WHEN",
+                           .kind = ValueKind::kChoice,
+                           .choices = "always|never|fail",
+                           .help = "replace what is there (always, the default), leave it, or fail for it"};
+const Option kStrip = {
+    .name = "strip", .value = "N", .kind = ValueKind::kNumber, .help = "leave out the first N components of each path"};
+const Option kKeepBroken = {.name = "keep-broken", .help = "keep what lies before the damage of damaged files"};
+const Option kDryRun = {.name = "dry-run", .help = "print what -v would, and write nothing"};
+const Option kVerbose = {.letter = 'v', .help = "print the path of each entry that is put in place"};
+const Option kAlgorithm = {.letter = 'a',
+                           .value = "NAME",
+                           .kind = ValueKind::kChoice,
+                           .choices = "sha256|sha1|md5|sha512|blake2b512",
+                           .help = "sha256 (the default), sha1, md5, sha512 or blake2b512"};
 const Option kMemory = {.name = "memory",
                         .value = "SIZE",
                         .kind = ValueKind::kSize,
@@ -34,18 +55,30 @@ constexpr const Option* kListOptions[] = {&kLong,  &kNul,     &kJson,     &kFile
                                           &kQuiet, &kThreads, &kProgress, &kHelp};
 constexpr const Option* kInfoOptions[] = {&kJson, &kMemory, &kQuiet, &kThreads, &kProgress, &kHelp};
 constexpr const Option* kCatOptions[] = {&kNulInput, &kFilesFrom, &kMemory, &kQuiet, &kThreads, &kProgress, &kHelp};
+constexpr const Option* kExtractOptions[] = {&kOutputFolder, &kExclude,  &kOverwrite, &kStrip,  &kKeepBroken,
+                                             &kDryRun,       &kNulInput, &kFilesFrom, &kMemory, &kQuiet,
+                                             &kVerbose,      &kThreads,  &kProgress,  &kHelp};
+constexpr const Option* kTestOptions[] = {&kNulOutput, &kJson, &kMemory, &kQuiet, &kThreads, &kProgress, &kHelp};
+constexpr const Option* kSumOptions[] = {&kAlgorithm, &kNulInput, &kFilesFrom, &kMemory,
+                                         &kQuiet,     &kThreads,  &kProgress,  &kHelp};
 constexpr const Option* kOptions[] = {&kQuiet, &kThreads, &kProgress, &kHelp, &kVersion};
 
-constexpr std::string_view kPatterns = "A PATTERN is a path, or a glob over whole paths: * and ? and [...] stop at "
-                                       "\"/\", ** takes everything, and \\ takes\n"
-                                       "the next character as it is. One that matches a folder takes all below it.\n";
+constexpr std::string_view kAboutPatterns =
+    "A PATTERN is a path, or a glob over whole paths: * and ? and [...] stop at \"/\", ** takes everything, and \\ "
+    "takes\n"
+    "the next character as it is. One that matches a folder takes all below it.\n";
+constexpr std::string_view kAboutExtract =
+    "Nothing is written outside of DIR. A new file gets its name when it is whole; a damaged one is left out.\n";
+constexpr std::string_view kAboutTest =
+    "The formats hold no checksums: damage that can be decoded is not seen. To see it, keep what 'zarvo sum' prints.\n";
+constexpr std::string_view kAboutSum = "'cd DIR && sha256sum -c' checks what was extracted into DIR against this.\n";
 
 } // namespace
 
 const Subcommand kList = {.name = "list",
                           .operands = "ARCHIVE [PATTERN...]",
                           .summary = "print the paths of the entries",
-                          .about = kPatterns,
+                          .about = {},
                           .options = kListOptions,
                           .minOperands = 1};
 const Subcommand kInfo = {.name = "info",
@@ -54,12 +87,30 @@ const Subcommand kInfo = {.name = "info",
                           .about = {},
                           .options = kInfoOptions,
                           .minOperands = 1};
+const Subcommand kExtract = {.name = "extract",
+                             .operands = "ARCHIVE [PATTERN...]",
+                             .summary = "write files and folders to disk",
+                             .about = kAboutExtract,
+                             .options = kExtractOptions,
+                             .minOperands = 1};
 const Subcommand kCat = {.name = "cat",
                          .operands = "ARCHIVE PATTERN...",
                          .summary = "print the contents of files",
-                         .about = kPatterns,
+                         .about = {},
                          .options = kCatOptions,
                          .minOperands = 2};
+const Subcommand kTest = {.name = "test",
+                          .operands = "ARCHIVE...",
+                          .summary = "decode everything, and print the paths of damaged files",
+                          .about = kAboutTest,
+                          .options = kTestOptions,
+                          .minOperands = 1};
+const Subcommand kSum = {.name = "sum",
+                         .operands = "ARCHIVE [PATTERN...]",
+                         .summary = "print checksums, as sha256sum does of the extracted files",
+                         .about = kAboutSum,
+                         .options = kSumOptions,
+                         .minOperands = 1};
 const Subcommand kNoSubcommand = {.name = {},
                                   .operands = "SUBCOMMAND [OPTION...] ARCHIVE [ARGUMENT...]",
                                   .summary = "read archives of the Zarvo engine's formats",
@@ -68,7 +119,7 @@ const Subcommand kNoSubcommand = {.name = {},
                                   .minOperands = 0};
 
 std::span<const Subcommand* const> GetSubcommands() {
-    static constexpr const Subcommand* kSubcommands[] = {&kList, &kInfo, &kCat};
+    static constexpr const Subcommand* kSubcommands[] = {&kList, &kInfo, &kExtract, &kCat, &kTest, &kSum};
     return kSubcommands;
 }
 
@@ -103,7 +154,10 @@ std::string DescribeSubcommand(const Subcommand& subcommand) {
     ((text += subcommand.operands) += "\n\n") += subcommand.summary;
     text += ".\n";
     text[text.find("\n\n") + 2] -= 'a' - 'A';
-    if (!subcommand.about.empty()) (text += '\n') += subcommand.about;
+    const bool hasPatterns = subcommand.operands.find("PATTERN") != std::string_view::npos;
+    if (!subcommand.about.empty() || hasPatterns) text += '\n';
+    text += subcommand.about;
+    if (hasPatterns) text += kAboutPatterns;
 
     std::vector<std::pair<std::string, std::string_view>> rows;
     if (isNone) {

@@ -8,14 +8,15 @@
 #include <string_view>
 #include <vector>
 
-// What an option's value has to be. Of kChoice, Option::choices has the values.
-enum class ValueKind { kNone, kFile, kCount, kSize, kChoice };
+// What an option's value has to be: any text, a path, a number from 1 on, one from 0 on, bytes ("64M"), or one of
+// Option::choices.
+enum class ValueKind { kText, kFile, kCount, kNumber, kSize, kChoice };
 
 struct Option {
     char letter = 0;             // 'j' for "-j"; 0: none
     std::string_view name = {};  // "threads" for "--threads"; empty: none
     std::string_view value = {}; // what help calls the value, "N"; empty: it takes none
-    ValueKind kind = ValueKind::kNone;
+    ValueKind kind = ValueKind::kText;
     std::string_view choices = {}; // with "|" between them
     std::string_view help = {};    // half a sentence
 };
@@ -29,9 +30,10 @@ struct Subcommand {
     size_t minOperands;
 };
 
-extern const Option kLong, kNul, kNulInput, kJson, kFilesFrom, kMemory, kQuiet, kThreads, kProgress, kHelp, kVersion;
+extern const Option kLong, kNul, kNulInput, kNulOutput, kJson, kFilesFrom, kOutputFolder, kExclude, kOverwrite, kStrip,
+    kKeepBroken, kDryRun, kVerbose, kAlgorithm, kMemory, kQuiet, kThreads, kProgress, kHelp, kVersion;
 
-extern const Subcommand kList, kInfo, kCat;
+extern const Subcommand kList, kInfo, kExtract, kCat, kTest, kSum;
 
 // What zarvo itself takes when no subcommand is named.
 extern const Subcommand kNoSubcommand;

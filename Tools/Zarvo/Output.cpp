@@ -37,6 +37,8 @@ void OutputBuffer::WriteMore(std::string_view bytes) {
 
 void OutputBuffer::WriteEscaped(std::string_view text) { Write(EscapeControls(text)); }
 
+bool OutputBuffer::IsAbandoned() const { return HasSignal() || m_Error == EPIPE; }
+
 void OutputBuffer::Flush() {
     WriteNow(std::string_view(m_Buffer).substr(0, m_Used));
     m_Used = 0;
@@ -67,9 +69,10 @@ void Console::Say(std::string_view text) {
 
 void Console::ShowProgress(std::string_view text) {
     winsize window = {};
-    // A line that goes on in the next one could not be wiped.
-    if (m_IsTerminal && ioctl(m_Descriptor, TIOCGWINSZ, &window) == 0 && window.ws_col > 1)
-        text = text.substr(0, window.ws_col - 1u);
+    // A line that goes on in the next one could not be wiped. The terminal itself adds "^C".
+    constexpr unsigned kKeptFree = 3;
+    if (m_IsTerminal && ioctl(m_Descriptor, TIOCGWINSZ, &window) == 0 && window.ws_col > kKeptFree)
+        text = text.substr(0, window.ws_col - kKeptFree);
     if (m_IsTerminal)
         Write(kWipe + std::string(text));
     else

@@ -39,6 +39,9 @@ public:
 
     bool HasSignal() const { return m_Signal != nullptr && *m_Signal != 0; }
 
+    // Nobody waits for the run any more: a signal has come, or whoever read the results has gone.
+    bool IsAbandoned() const;
+
     // The errno of the write that failed, or 0.
     int GetError() const { return m_Error; }
 

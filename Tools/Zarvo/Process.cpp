@@ -27,8 +27,9 @@ void CatchSignals() {
 
 int RunProcess(int argumentCount, char** arguments) {
     CatchSignals();
-    // So that a write to a pipe that nobody reads returns.
+    // So that writes that can go no further return: to a pipe that nobody reads, or past the limit of a file's size.
     const bool isPipeSignalIgnored = signal(SIGPIPE, SIG_IGN) == SIG_IGN;
+    (void)signal(SIGXFSZ, SIG_IGN);
 
     World world;
     if (argumentCount > 0) world.arguments.assign(arguments + 1, arguments + argumentCount);

@@ -14,31 +14,39 @@ bool IsShown(const Arguments& arguments, const Console& console, bool canShow) {
 
 } // namespace
 
-Progress::Progress(const Arguments& arguments, Console& console, Amount total, bool canShow)
-    : m_Console(console), m_Total(total), m_IsShown(IsShown(arguments, console, canShow)) {}
+Progress::Progress(const Arguments& arguments, Console& console, bool canShow)
+    : m_Console(console), m_IsShown(IsShown(arguments, console, canShow)) {}
 
-void Progress::Update(Amount done) {
+void Progress::Update(Amount done, Amount total) {
     if (!m_IsShown) return;
     const Clock::time_point now = Clock::now();
     if (now - m_Shown < std::chrono::milliseconds(m_Console.IsTerminal() ? 100 : 1'000)) return;
     m_Shown = now;
-    m_Console.ShowProgress(DescribeProgress(done, m_Total, std::chrono::duration<double>(now - m_Start).count()));
+    m_Console.ShowProgress(DescribeProgress(done, total, std::chrono::duration<double>(now - m_Start).count()));
 }
 
 std::string DescribeProgress(Amount done, Amount total, double seconds) {
     const auto bytes = static_cast<double>(done.bytes), all = static_cast<double>(total.bytes);
     const double rate = seconds > 0 ? bytes / seconds : 0;
+    // A file costs time beside its bytes, about as much as so many bytes do.
+    constexpr double kFileCost = 16'384;
+    const double work = bytes + kFileCost * static_cast<double>(done.files);
+    const double allWork = all + kFileCost * static_cast<double>(total.files);
     std::string left = "?";
-    if (rate > 0 && all >= bytes && (all - bytes) / rate < 1e6) {
-        const auto secondsLeft = static_cast<unsigned>((all - bytes) / rate + 0.5);
+    if (work > 0 && allWork >= work && (allWork - work) / work * seconds < 1e6) {
+        const auto secondsLeft = static_cast<unsigned>((allWork - work) / work * seconds + 0.5);
         char text[32];
         (void)snprintf(text, sizeof(text), "%u:%02u", secondsLeft / 60, secondsLeft % 60);
         left = text;
     }
+    char files[64] = "";
+    if (total.files > 0)
+        (void)snprintf(files, sizeof(files), "%llu of %llu files, ", static_cast<unsigned long long>(done.files),
+                       static_cast<unsigned long long>(total.files));
+    // Of files that are all empty, their share.
+    const double share = all > 0 ? bytes / all : allWork > 0 ? work / allWork : 0;
     char line[192];
-    (void)snprintf(line, sizeof(line), "%3.0f%%  %s of %s, %llu of %llu files, %s/s, %s left",
-                   all > 0 ? 100 * bytes / all : 0, DescribeBytes(bytes).c_str(), DescribeBytes(all).c_str(),
-                   static_cast<unsigned long long>(done.files), static_cast<unsigned long long>(total.files),
-                   DescribeBytes(rate).c_str(), left.c_str());
+    (void)snprintf(line, sizeof(line), "%3.0f%%  %s of %s, %s%s/s, %s left", 100 * share, DescribeBytes(bytes).c_str(),
+                   DescribeBytes(all).c_str(), files, DescribeBytes(rate).c_str(), left.c_str());
     return line;
 }

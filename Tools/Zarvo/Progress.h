@@ -18,20 +18,19 @@ struct Amount {
 
 class Progress {
 public:
-    // total: what there is to do. canShow: whether --progress=auto shows anything on a terminal.
-    Progress(const Arguments& arguments, Console& console, Amount total, bool canShow);
+    // canShow: whether --progress=auto shows anything on a terminal.
+    Progress(const Arguments& arguments, Console& console, bool canShow);
     ~Progress() { m_Console.WipeProgress(); }
     Progress(const Progress&) = delete;
     Progress& operator=(const Progress&) = delete;
 
-    // Called as often as is convenient.
-    void Update(Amount done);
+    // Called as often as is convenient, with what has been done of all there is.
+    void Update(Amount done, Amount total);
 
 private:
     using Clock = std::chrono::steady_clock;
 
     Console& m_Console;
-    const Amount m_Total;
     const bool m_IsShown;
     const Clock::time_point m_Start = Clock::now();
     Clock::time_point m_Shown = m_Start; // when the last line was

@@ -21,17 +21,20 @@ unsigned long long GetDefaultMemory() {
 
 } // namespace
 
+unsigned long long Run::GetMemory() const {
+    const std::string* const memory = arguments.Find(kMemory);
+    return memory != nullptr ? *ParseSize(*memory) : GetDefaultMemory();
+}
+
 std::optional<zarvo::archive> Run::OpenArchive(const std::string& path) const {
     if (path == "-") {
         console.Say(
             path, MakeMessage("an archive must be a file that can be read at any place (a file of this name is ./-)"));
         return std::nullopt;
     }
-    const std::string* const memory = arguments.Find(kMemory);
-    const unsigned long long budget = memory != nullptr ? *ParseSize(*memory) : GetDefaultMemory();
     zarvo::open_options options;
     // A block in memory is held twice: as it is stored and as it is decoded.
-    options.max_block_bytes = std::max(budget / 2, 1ull);
+    options.max_block_bytes = std::max(GetMemory() / 2, 1ull);
     options.log = [this, path](std::string_view text) { console.Say(path, text); };
     zarvo::result<zarvo::archive> archive = zarvo::archive::open(path, std::move(options));
     if (!archive) {
@@ -39,6 +42,26 @@ std::optional<zarvo::archive> Run::OpenArchive(const std::string& path) const {
         return std::nullopt;
     }
     return *std::move(archive);
+}
+
+zarvo::run_options Run::MakeOptions(Progress& progress) const {
+    zarvo::run_options options;
+    if (const std::string* const threads = arguments.Find(kThreads))
+        options.threads = static_cast<uint32_t>(std::stoul(*threads));
+    options.memory = GetMemory();
+    options.progress = [this, &progress](const zarvo_progress& at) {
+        output.Flush(); // a reader gets results while they come, and one that has gone is missed
+        progress.Update({.bytes = at.bytes, .files = at.files}, {.bytes = at.bytes_total, .files = at.files_total});
+        return !output.IsAbandoned();
+    };
+    return options;
+}
+
+void Run::WritePath(const zarvo::entry& entry, std::string_view end) const {
+    if (output.IsTerminal()) console.WipeProgress(); // which is there, too
+    output.WriteText(entry.path());
+    if (entry.is_folder() && !entry.path().ends_with('/')) output.Write("/");
+    output.Write(end);
 }
 
 void Run::SayOfEntry(const std::string& archive, std::string_view entry, std::string_view text) const {

@@ -4,6 +4,7 @@
 
 #include "Tools/Zarvo/Arguments.h"
 #include "Tools/Zarvo/Output.h"
+#include "Tools/Zarvo/Progress.h"
 #include <zarvo.hpp>
 
 #include <optional>
@@ -16,6 +17,7 @@ struct Run {
     int input; // descriptor of standard input
     OutputBuffer& output;
     Console& console;
+    std::string& done; // what was done, for the message of a run that a signal has ended; empty: results were printed
 
     const std::vector<std::string>& GetOperands() const { return arguments.GetOperands(); }
 
@@ -23,8 +25,18 @@ struct Run {
     // reports meanwhile and later becomes messages.
     std::optional<zarvo::archive> OpenArchive(const std::string& path) const;
 
+    // The options of a run on a whole archive: those that all subcommands take, and progress, which is shown and stops
+    // a run that nobody waits for. This object and progress must outlive them.
+    zarvo::run_options MakeOptions(Progress& progress) const;
+
+    // A path as list shows it, and its end: a newline, or NUL.
+    void WritePath(const zarvo::entry& entry, std::string_view end = "\n") const;
+
     // A message on an entry of an archive, or on a pattern.
     void SayOfEntry(const std::string& archive, std::string_view entry, std::string_view text) const;
+
+private:
+    unsigned long long GetMemory() const;
 };
 
 constexpr int kAllDone = 0;
@@ -33,4 +45,7 @@ constexpr int kNoArchive = 2;
 
 int RunList(const Run& run);
 int RunInfo(const Run& run);
+int RunExtract(const Run& run);
 int RunCat(const Run& run);
+int RunTest(const Run& run);
+int RunSum(const Run& run);

@@ -63,6 +63,26 @@ PatternList ReadPatterns(const Run& run) {
     return list;
 }
 
+bool AddPatterns(const Run& run, const std::string& archive, const std::vector<std::string>& list,
+                 zarvo::patterns& patterns) {
+    for (const std::string& pattern : list)
+        if (const zarvo::error error = patterns.add(pattern)) {
+            run.SayOfEntry(archive, pattern, error.text());
+            return false;
+        }
+    return true;
+}
+
+bool SayUnused(const Run& run, const std::string& archive, const PatternList& list, const zarvo::patterns& patterns) {
+    bool areUsed = true;
+    for (size_t index = 0; index < list.patterns.size() && !run.output.IsClosed(); ++index)
+        if (!patterns.is_used(index)) {
+            SayUnmatched(run, archive, list.patterns[index]);
+            areUsed = false;
+        }
+    return areUsed;
+}
+
 void SayUnmatched(const Run& run, const std::string& archive, const std::string& pattern) {
     run.SayOfEntry(archive, pattern, MakeMessage("matches nothing"));
 }

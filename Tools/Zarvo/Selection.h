@@ -15,5 +15,14 @@ struct PatternList {
 
 PatternList ReadPatterns(const Run& run);
 
+// Adds patterns for an archive. False, and a message, when memory is refused.
+[[nodiscard]] bool AddPatterns(const Run& run, const std::string& archive, const std::vector<std::string>& list,
+                               zarvo::patterns& patterns);
+
+// Says which patterns of a list, all added in their order, have matched nothing, unless the output is closed. Whether
+// all have matched.
+[[nodiscard]] bool SayUnused(const Run& run, const std::string& archive, const PatternList& list,
+                             const zarvo::patterns& patterns);
+
 // Says that a pattern matches nothing in an archive.
 void SayUnmatched(const Run& run, const std::string& archive, const std::string& pattern);

@@ -92,6 +92,15 @@ TEST(ZarvoProgress, DescribesAnyAmount) {
     EXPECT_EQ("  0%  0 bytes of 0 bytes, 0 of 1 files, 0 bytes/s, ? left", DescribeProgress({}, {.files = 1}, 0));
     EXPECT_EQ("  0%  1 bytes of 16.0 EiB, 0 of 1 files, 0 bytes/s, ? left",
               DescribeProgress({.bytes = 1}, {.bytes = UINT64_MAX, .files = 1}, 10));
+    EXPECT_EQ(" 50%  1.0 MiB of 2.0 MiB, 1.0 MiB/s, 0:01 left",
+              DescribeProgress({.bytes = 1 << 20}, {.bytes = 2 << 20}, 1))
+        << "of a run that counts no files";
+    EXPECT_EQ(" 25%  0 bytes of 0 bytes, 1000 of 4000 files, 0 bytes/s, 0:30 left",
+              DescribeProgress({.files = 1'000}, {.files = 4'000}, 10))
+        << "of empty files";
+    EXPECT_EQ("100%  9 bytes of 9 bytes, 1 of 11 files, 1 bytes/s, 1:30 left",
+              DescribeProgress({.bytes = 9, .files = 1}, {.bytes = 9, .files = 11}, 9))
+        << "of files that cost more than their bytes";
 }
 
 } // namespace

@@ -31,6 +31,10 @@ TEST_F(ZarvoProcess, FailsWhereItsDescriptorsDo) {
         {"$Z list a.zarvo >&-", {1, "zarvo: standard output: Bad file descriptor\n"}},
         {"$Z cat a.zarvo a >&-", {1, "zarvo: standard output: Bad file descriptor\n"}},
         {"$Z info a.zarvo <&- >/dev/full", {1, "zarvo: standard output: No space left on device\n"}},
+        {"$Z extract -qv a.zarvo >/dev/full", {1, "zarvo: standard output: No space left on device\n"}},
+        {"$Z extract -q a.zarvo >&-", {0, ""}},
+        {"$Z sum a.zarvo >/dev/full", {1, "zarvo: standard output: No space left on device\n"}},
+        {"$Z test a.zarvo >&-", {0, ""}},
         {"$Z --help >/dev/full", {1, "zarvo: standard output: No space left on device\n"}},
         {"$Z list --files-from=- a.zarvo <&-", {1, "zarvo: standard input: Bad file descriptor\n"}},
         {"$Z cat a.zarvo d >&-", {0, ""}},
@@ -43,9 +47,19 @@ TEST_F(ZarvoProcess, FailsWhereItsDescriptorsDo) {
         EXPECT_EQ(heard, Shell(line)) << line;
 }
 
+TEST_F(ZarvoProcess, ExtractsWhatAFileSizeLimitLets) {
+    MakeArchive("a.zarvo", Archive("large:z3000 small:x"));
+    EXPECT_EQ(Transcript(1, "zarvo: a.zarvo: large: File too large\nsmall\n"),
+              Shell("ulimit -f 1; $Z extract -qv a.zarvo"));
+    EXPECT_EQ((FolderTree{{"small", "x"}}), ReadFolderTree("a.zarvo_data"));
+}
+
 TEST_F(ZarvoProcess, EndsSilentlyWhenNobodyReadsOn) {
     MakeLongArchive();
-    EXPECT_EQ(Transcript(141, ""), Shell("$Z list long.zarvo | true; exit ${PIPESTATUS[0]}"));
+    for (const char* const subcommand : {"list", "sum", "extract --dry-run"})
+        EXPECT_EQ(Transcript(141, ""),
+                  Shell("$Z " + std::string(subcommand) + " long.zarvo | true; exit ${PIPESTATUS[0]}"))
+            << subcommand;
     EXPECT_EQ(Transcript(1, ""), Shell("trap '' PIPE; $Z list long.zarvo | true; exit ${PIPESTATUS[0]}"));
 }
 
@@ -53,14 +67,16 @@ TEST_F(ZarvoProcess, EndsByTheSignalThatEndsIt) {
     MakeLongArchive();
     // A shell's background processes ignore SIGINT. The signal comes when the pipe is full and the command waits.
     const std::string
-        start = "mkfifo pipe; exec 9<>pipe; env --default-signal $Z list long.zarvo >&9 9>&- & ",
+        start = "mkfifo pipe; exec 9<>pipe; env --default-signal $Z ",
+        to = " long.zarvo >&9 9>&- & ",
         wait = "until [[ $(</proc/$!/comm) == zarvo && $(cut -d' ' -f3 /proc/$!/stat) == S ]]; do sleep 0.01; "
                "done; ";
-    for (const char* const name : {"INT", "TERM"}) {
-        const auto [status, text] =
-            Shell(start + wait + "sleep 0.1; kill -" + name + " $!; wait $!; status=$?; rm pipe; exit $status");
-        EXPECT_EQ(128 + (std::string(name) == "INT" ? SIGINT : SIGTERM), status) << text;
-        EXPECT_EQ("zarvo: ended by SIG" + std::string(name) + " after 65536 bytes of results\n", text);
+    const std::pair<std::string, std::string> kRuns[] = {{"INT", "list"}, {"TERM", "list"}, {"INT", "sum"}};
+    for (const auto& [name, subcommand] : kRuns) {
+        const auto [status, text] = Shell(start + subcommand + to + wait + "sleep 0.1; kill -" + name +
+                                          " $!; wait $!; status=$?; rm pipe; exit $status");
+        EXPECT_EQ(128 + (name == "INT" ? SIGINT : SIGTERM), status) << text;
+        EXPECT_EQ("zarvo: ended by SIG" + name + " after 65536 bytes of results\n", text);
     }
 }
 

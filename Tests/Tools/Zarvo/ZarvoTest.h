@@ -9,6 +9,7 @@
 #include "Tools/Zarvo/Command.h"
 
 #include <csignal>
+#include <gmock/gmock-matchers.h>
 #include <ostream>
 
 struct Heard {
@@ -50,6 +51,7 @@ struct Stage {
     std::string input = {};
     bool isOutputTerminal = false;
     bool isErrorTerminal = false;
+    int signal = 0; // that has come
 };
 
 inline Heard Zarvo(const std::vector<std::string>& arguments, const Stage& stage = {}) {
@@ -61,6 +63,8 @@ inline Heard Zarvo(const std::vector<std::string>& arguments, const Stage& stage
     world.error = error.Descriptor();
     world.isOutputTerminal = stage.isOutputTerminal;
     world.isErrorTerminal = stage.isErrorTerminal;
+    const std::atomic<int> signal = stage.signal;
+    world.signal = &signal;
     const int status = RunZarvo(world).status;
     return {status, output.Read(), error.Read()};
 }

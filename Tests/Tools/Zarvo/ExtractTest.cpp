@@ -1,0 +1,129 @@
+#include "Tests/Tools/Zarvo/ZarvoTest.h"
+
+namespace {
+
+class ZarvoExtract : public ZarvoTest {
+protected:
+    // The command without its summary, which names a time.
+    static Heard Extract(std::vector<std::string> arguments, const Stage& stage = {}) {
+        arguments.insert(arguments.begin(), {"extract", "-q"});
+        return Zarvo(arguments, stage);
+    }
+
+    // An archive whose file "bad" can't be read after its first 4 bytes.
+    static void MakeDamagedArchive() {
+        ArchiveDescription archive = Archive("good:wxyz bad:abcdefgh");
+        archive.blocks = {{.size = 8}, {.size = 4, .type = kCompressionLz4, .stored = std::string(3, '\xFF')}};
+        MakeArchive("a.zarvo", archive);
+    }
+};
+
+TEST_F(ZarvoExtract, WritesBesideTheArchiveByDefault) {
+    fs::create_directory("in");
+    MakeArchive("in/a.zarvo", Archive("d/a:1 d/b| c:c70000"));
+    EXPECT_EQ((Heard{0, "", ""}), Extract({"in/a.zarvo"}));
+    EXPECT_EQ((FolderTree{{"d/a", "1"}, {"d/b", kFolder}, {"c", Brief(Bytes("c70000"))}}),
+              ReadFolderTree("in/a.zarvo_data"));
+}
+
+TEST_F(ZarvoExtract, MakesTheFolderThatIsAskedFor) {
+    MakeArchive("a.zarvo", Archive("a:1"));
+    EXPECT_EQ((Heard{0, "", ""}), Extract({"-o", "new/out", "a.zarvo"}));
+    EXPECT_EQ((FolderTree{{"a", "1"}}), ReadFolderTree("new/out"));
+}
+
+TEST_F(ZarvoExtract, TakesWhatIsWantedAndNotExcluded) {
+    MakeArchive("a.zarvo", Archive("d/a:1 d/b:2 e/a:3 e/b:4 f:5"));
+    EXPECT_EQ(
+        (Heard{1, "d/a\nf\n", "zarvo: a.zarvo: none: matches nothing\n"}),
+        Extract({"-v", "-x", "**/b", "-x", "nothing", "--files-from=-", "a.zarvo", "d", "none"}, {.input = "f\n"}));
+    EXPECT_EQ((FolderTree{{"d/a", "1"}, {"f", "5"}}), ReadFolderTree("a.zarvo_data"));
+}
+
+TEST_F(ZarvoExtract, TakesNothingFromAnEmptyListOfNames) {
+    MakeArchive("a.zarvo", Archive("a:1"));
+    EXPECT_EQ((Heard{0, "", ""}), Extract({"-v", "--files-from=-", "a.zarvo"}));
+}
+
+TEST_F(ZarvoExtract, StripsComponents) {
+    MakeArchive("a.zarvo", Archive("/d//a:1 b:2 e/a:3 d\\c/d:4"));
+    EXPECT_EQ((Heard{0, "e/a\nd\\c/d\n", ""}), Extract({"-v", "--strip", "1", "a.zarvo"}));
+    EXPECT_EQ((FolderTree{{"a", "3"}, {"c/d", "4"}}), ReadFolderTree("a.zarvo_data"));
+}
+
+TEST_F(ZarvoExtract, ListsWhatItPutsInPlaceForAnyThreads) {
+    MakeArchive("a.zarvo", Archive("lz4 chunk=1000 b:c70000 a:1 d/|  a:2 e/f:c3000 empty:"));
+    for (const char* const threads : {"1", "2", "8"}) {
+        EXPECT_EQ((Heard{0, "b\nd/\na\ne/f\nempty\n", ""}), Extract({"-v", "-j", threads, "-o", threads, "a.zarvo"}))
+            << threads;
+        EXPECT_EQ("2", ReadFile(std::string(threads) + "/a")) << threads;
+    }
+}
+
+TEST_F(ZarvoExtract, WritesNothingInADryRun) {
+    MakeArchive("a.zarvo", Archive("a:1 ../b:2 d|"));
+    EXPECT_EQ((Heard{1, "a\nd/\n", "zarvo: a.zarvo: ../b: the path has a component \"..\"\n"}),
+              Extract({"--dry-run", "a.zarvo"}));
+    EXPECT_FALSE(fs::exists("a.zarvo_data"));
+}
+
+TEST_F(ZarvoExtract, OverwritesAsAsked) {
+    MakeArchive("a.zarvo", Archive("a:new b:2"));
+    const struct {
+        const char* when;
+        Heard heard;
+        const char* left;
+    } kCases[] = {
+        {"--overwrite=never", {0, "b\n", ""}, "old"},
+        {"--overwrite=fail", {1, "b\n", "zarvo: a.zarvo: a: File exists\n"}, "old"},
+        {"--overwrite=always", {0, "a\nb\n", ""}, "new"},
+    };
+    for (const auto& [when, heard, left] : kCases) {
+        fs::create_directory("out");
+        WriteFile("out/a", "old");
+        EXPECT_EQ(heard, Extract({when, "-v", "-o", "out", "a.zarvo"})) << when;
+        EXPECT_EQ((FolderTree{{"a", left}, {"b", "2"}}), ReadFolderTree("out")) << when;
+        fs::remove_all("out");
+    }
+}
+
+TEST_F(ZarvoExtract, LeavesOutDamagedFiles) {
+    MakeDamagedArchive();
+    EXPECT_EQ((Heard{1, "good\n", "zarvo: a.zarvo: bad: block 1 is damaged\n"}), Extract({"-v", "a.zarvo"}));
+    EXPECT_EQ((FolderTree{{"good", "wxyz"}}), ReadFolderTree("a.zarvo_data"));
+}
+
+TEST_F(ZarvoExtract, KeepsBrokenFilesOnRequest) {
+    MakeDamagedArchive();
+    EXPECT_EQ((Heard{1, "good\nbad\n", "zarvo: a.zarvo: bad: block 1 is damaged\n"}),
+              Extract({"-v", "--keep-broken", "a.zarvo"}));
+    EXPECT_EQ((FolderTree{{"good", "wxyz"}, {"bad", "abcd"}}), ReadFolderTree("a.zarvo_data"));
+}
+
+TEST_F(ZarvoExtract, NamesTheFolderThatCannotBeMade) {
+    MakeArchive("a.zarvo", Archive("a:1 b:2"));
+    WriteFile("file", "");
+    EXPECT_EQ((Heard{1, "", "zarvo: file/out: Not a directory\n"}), Extract({"-o", "file/out", "a.zarvo"}));
+}
+
+TEST_F(ZarvoExtract, NamesTheSizeOfABlockOverTheBudget) {
+    MakeArchive("a.zarvo", Archive("lz4 chunk=4096 a:c4096 b:x"));
+    EXPECT_EQ((Heard{1, "b\n", "zarvo: a.zarvo: a: block 0 takes 4096 bytes of memory, and the limit is 1024\n"}),
+              Extract({"-v", "--memory=2K", "a.zarvo"}));
+}
+
+TEST_F(ZarvoExtract, EndsWithASummary) {
+    MakeDamagedArchive();
+    const Heard heard = Zarvo({"extract", "a.zarvo"});
+    EXPECT_EQ(1, heard.status);
+    EXPECT_THAT(heard.error, testing::MatchesRegex("zarvo: a.zarvo: bad: block 1 is damaged\n"
+                                                   "zarvo: a.zarvo: 1 files, 4 bytes, 1 failures, [0-9.]+ seconds\n"));
+}
+
+TEST_F(ZarvoExtract, SaysWhatWasDoneBeforeASignal) {
+    MakeArchive("a.zarvo", Archive("a:1 b:22"));
+    EXPECT_EQ((Heard{1, "", "zarvo: ended by SIGTERM after 2 files, 3 bytes, 0 failures\n"}),
+              Zarvo({"extract", "a.zarvo"}, {.signal = SIGTERM}));
+}
+
+} // namespace
