@@ -47,11 +47,13 @@ TEST_F(ZarvoProcess, FailsWhereItsDescriptorsDo) {
         EXPECT_EQ(heard, Shell(line)) << line;
 }
 
-TEST_F(ZarvoProcess, ExtractsWhatAFileSizeLimitLets) {
+TEST_F(ZarvoProcess, SurvivesALimitOfFileSizes) {
     MakeArchive("a.zarvo", Archive("large:z3000 small:x"));
     EXPECT_EQ(Transcript(1, "zarvo: a.zarvo: large: File too large\nsmall\n"),
               Shell("ulimit -f 1; $Z extract -qv a.zarvo"));
     EXPECT_EQ((FolderTree{{"small", "x"}}), ReadFolderTree("a.zarvo_data"));
+    EXPECT_EQ(Transcript(1, "zarvo: standard output: File too large\n"),
+              Shell("ulimit -f 1; $Z cat a.zarvo large >printed"));
 }
 
 TEST_F(ZarvoProcess, EndsSilentlyWhenNobodyReadsOn) {
