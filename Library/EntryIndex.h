@@ -8,6 +8,7 @@
 #pragma once
 
 #include "Library/Failure.h"
+#include "Library/PathTable.h"
 #include "Runtime/Core/Containers/DynamicArray.h"
 #include "Runtime/VirtualFileSystem/ArchiveFileSystem/ArchiveStorageHeader.h"
 
@@ -15,7 +16,7 @@ class EntryIndex {
 public:
     using Nodes = dynamic_array<ArchiveStorageHeader::Node>;
 
-    static constexpr UInt32 kNoItem = ~UInt32{0};
+    static constexpr UInt32 kNoItem = PathTable::kNoItem;
     static constexpr UInt32 kRoot = kNoItem - 1;
 
     // nodes outlives the index.
@@ -44,24 +45,15 @@ private:
         UInt32 entry;
         UInt32 length; // of its path; longer paths make no implied folders
     };
-    // Empty where item is kNoItem.
-    struct Slot {
-        UInt32 hash;
-        UInt32 item;
-    };
 
-    UInt64 HashOf(core::string_ref path) const;
-    // Where the search for a hash begins: as far into the table as the hash is into its range.
-    size_t StartOf(UInt32 hash) const { return static_cast<size_t>((UInt64{hash} * m_Slots.size()) >> 32); }
-    Slot& FindSlot(UInt64 hash, core::string_ref path);
-    [[nodiscard]] bool ReserveSlots(size_t count);
+    UInt32* FindSlot(UInt64 hash, core::string_ref path);
     [[nodiscard]] bool LinkIntoFolders(UInt32 item, dynamic_array<UInt64>* hashes);
-    [[nodiscard]] bool AddImpliedFolder(UInt32 entry, size_t length, Slot* slot, UInt64 hash);
+    [[nodiscard]] bool AddImpliedFolder(UInt32 entry, size_t length, UInt32* slot);
     void PutInFront(UInt32 item, UInt32* first);
 
     const Nodes& m_Nodes;
     dynamic_array<ImpliedFolder> m_Implied;
-    dynamic_array<Slot> m_Slots;
+    PathTable m_Table;
     dynamic_array<UInt32> m_FirstChild;
     dynamic_array<UInt32> m_NextSibling;
     UInt32 m_FirstInRoot = kNoItem;

@@ -67,14 +67,7 @@ void OutputPlan::SetRefusal(size_t entry, Failure* failure) const {
 bool OutputPlan::Settle(UInt32 entry, dynamic_array<UInt64>* hashes) {
     const core::string_ref path = PathOnDisk(entry);
     const bool isFolder = IsFolderItem(entry);
-    hashes->clear();
-    UInt64 hash = m_Seed;
-    for (PathComponents at(path); at.Next();) {
-        hash = HashComponent(hash, at.Name());
-        const size_t index = hashes->size();
-        if (!hashes->resize_uninitialized(index + 1)) return false;
-        (*hashes)[index] = hash;
-    }
+    if (!HashFolders(path, m_Seed, hashes)) return false;
     const size_t depth = hashes->size();
     if (!m_Table.Reserve(m_Nodes.size() + m_Implied.size() + depth)) return false;
 
@@ -89,7 +82,7 @@ bool OutputPlan::Settle(UInt32 entry, dynamic_array<UInt64>* hashes) {
         m_Verdicts[entry] = kClash;
         return true;
     }
-    UInt32* const own = Find(hash, path);
+    UInt32* const own = Find((*hashes)[depth - 1], path);
     if (*own != PathTable::kNoItem && IsFolderItem(*own) != isFolder) {
         m_Verdicts[entry] = kClash;
         return true;

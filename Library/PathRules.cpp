@@ -4,6 +4,7 @@
 #include "Runtime/Utilities/SpookyHash.h"
 
 #include <cstring>
+#include <ctime>
 #include <sys/random.h>
 
 bool PathComponents::Next() {
@@ -77,12 +78,29 @@ UInt64 HashComponent(UInt64 folderHash, core::string_ref name) {
     return folderHash;
 }
 
+UInt64 HashPath(core::string_ref path, UInt64 seed) {
+    for (PathComponents at(path); at.Next();)
+        seed = HashComponent(seed, at.Name());
+    return seed;
+}
+
+bool HashFolders(core::string_ref path, UInt64 seed, dynamic_array<UInt64>* hashes) {
+    hashes->clear();
+    for (PathComponents at(path); at.Next();) {
+        seed = HashComponent(seed, at.Name());
+        const size_t index = hashes->size();
+        if (!hashes->resize_uninitialized(index + 1)) return false;
+        (*hashes)[index] = seed;
+    }
+    return true;
+}
+
 UInt64 RandomHashSeed() {
     UInt64 seed;
-    // Without a random number an address of this process is the seed.
-    if (getrandom(&seed, sizeof(seed), GRND_NONBLOCK) != static_cast<ssize_t>(sizeof(seed)))
-        seed = reinterpret_cast<UInt64>(&seed);
-    return seed;
+    if (getrandom(&seed, sizeof(seed), GRND_NONBLOCK) == static_cast<ssize_t>(sizeof(seed))) return seed;
+    timespec now = {}; // without a random number, the time is the seed
+    (void)clock_gettime(CLOCK_MONOTONIC, &now);
+    return static_cast<UInt64>(now.tv_sec) << 32 ^ static_cast<UInt64>(now.tv_nsec);
 }
 
 size_t zarvo_normalize_path(const char* path, size_t length, char* out) {

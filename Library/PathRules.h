@@ -2,6 +2,7 @@
 // components are dropped. Any thread.
 #pragma once
 
+#include "Runtime/Core/Containers/DynamicArray.h"
 #include "Runtime/Core/Containers/StringRef.h"
 #include "Runtime/Core/Types.h"
 
@@ -41,6 +42,12 @@ SInt32 GetPathProblem(core::string_ref path, bool isFile);
 // The hash of a normal form, component by component: a folder's hash is on the way to those of what it holds. The hash
 // of the root is a seed, which nobody who makes an archive should know.
 UInt64 HashComponent(UInt64 folderHash, core::string_ref name);
+
+// The hash of a path's normal form.
+UInt64 HashPath(core::string_ref path, UInt64 seed);
+
+// The hashes of the folders above a path, from the outermost in, and last the path's own. False when memory is refused.
+[[nodiscard]] bool HashFolders(core::string_ref path, UInt64 seed, dynamic_array<UInt64>* hashes);
 
 // A seed for such hashes that differs from run to run.
 UInt64 RandomHashSeed();

@@ -1,7 +1,7 @@
 // A hash table that finds items by the normal form of their paths. It holds numbers of items only: whoever owns it says
-// which path an item has. A slot takes 8 bytes, and four fifths of the slots are used at most.
+// which path an item has. A slot takes 8 bytes, and at most four fifths of the slots are used.
 //
-// An owner is a callable: core::string_ref pathOf(UInt32 item). One thread at a time; any number for Find.
+// pathOf is a callable, core::string_ref(UInt32 item). One thread at a time; any number for looks only.
 #pragma once
 
 #include "Library/PathRules.h"
@@ -11,7 +11,7 @@ class PathTable {
 public:
     static constexpr UInt32 kNoItem = ~UInt32{0};
 
-    // Makes room for count items. What is in the table stays; places of items that Find has returned do not.
+    // Makes room for count items. What is in the table stays; where Find found it does not.
     [[nodiscard]] bool Reserve(size_t count) {
         const size_t wanted = count + count / 4 + 8;
         if (wanted <= m_Slots.size()) return true;
@@ -25,16 +25,21 @@ public:
         return true;
     }
 
-    // Where the item with that path is, or kNoItem is to be replaced by it. The table must have room.
+    void Clear() { m_Slots = dynamic_array<Slot>(kMemLabelFileSystem); }
+
+    // Where the item with that path is; where there is none, kNoItem, in whose place it may be put. The table must have
+    // room.
     template <typename PathOf>
     UInt32* Find(UInt64 hash, core::string_ref path, PathOf&& pathOf) {
-        const UInt32 shortHash = static_cast<UInt32>(hash);
-        for (size_t index = StartOf(shortHash);; index = Next(index)) {
-            Slot& slot = m_Slots[index];
-            if (slot.item == kNoItem) slot.hash = shortHash;
-            if (slot.item == kNoItem || (slot.hash == shortHash && IsSamePath(pathOf(slot.item), path)))
-                return &slot.item;
-        }
+        Slot& slot = m_Slots[IndexOf(hash, path, pathOf)];
+        if (slot.item == kNoItem) slot.hash = static_cast<UInt32>(hash);
+        return &slot.item;
+    }
+
+    // The item with that path, or kNoItem.
+    template <typename PathOf>
+    UInt32 Get(UInt64 hash, core::string_ref path, PathOf&& pathOf) const {
+        return m_Slots.empty() ? kNoItem : m_Slots[IndexOf(hash, path, pathOf)].item;
     }
 
 private:
@@ -46,6 +51,17 @@ private:
     // As far into the table as the hash is into its range.
     size_t StartOf(UInt32 hash) const { return static_cast<size_t>((UInt64{hash} * m_Slots.size()) >> 32); }
     size_t Next(size_t index) const { return index + 1 == m_Slots.size() ? 0 : index + 1; }
+
+    // Of the slot with the path's item, or of the first free one on the way to it.
+    template <typename PathOf>
+    size_t IndexOf(UInt64 hash, core::string_ref path, PathOf&& pathOf) const {
+        const UInt32 shortHash = static_cast<UInt32>(hash);
+        size_t index = StartOf(shortHash);
+        for (; m_Slots[index].item != kNoItem; index = Next(index))
+            if (m_Slots[index].hash == shortHash && IsSamePath(pathOf(m_Slots[index].item), path)) break;
+        return index;
+    }
+
     Slot* FirstFree(UInt32 hash) {
         size_t index = StartOf(hash);
         while (m_Slots[index].item != kNoItem)

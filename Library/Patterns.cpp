@@ -22,13 +22,6 @@ static core::string_ref StripEnds(core::string_ref text) {
     return text;
 }
 
-static UInt64 HashOf(core::string_ref path) {
-    UInt64 hash = kHashSeed;
-    for (PathComponents at(path); at.Next();)
-        hash = HashComponent(hash, at.Name());
-    return hash;
-}
-
 // The slot of the patterns that name a path, or the empty one where they belong.
 UInt32* zarvo_patterns::FindSlot(UInt64 hash, core::string_ref path) {
     size_t index = static_cast<size_t>(hash % m_Slots.size());
@@ -47,7 +40,7 @@ bool zarvo_patterns::MakeRoomForLiteral() {
     }
     std::fill(m_Slots.begin(), m_Slots.end(), kNone);
     for (const UInt32 head : old)
-        if (head != kNone) *FindSlot(HashOf(m_Patterns[head].text), m_Patterns[head].text) = head;
+        if (head != kNone) *FindSlot(HashPath(m_Patterns[head].text, kHashSeed), m_Patterns[head].text) = head;
     return true;
 }
 
@@ -68,7 +61,7 @@ zarvo_code zarvo_patterns::Add(core::string_ref text, Failure* failure) {
     const UInt32 index = static_cast<UInt32>(count);
     if (m_Globs.size() != globCount) m_Globs[globCount] = index;
     const bool isEverything = LastComponent(text).empty();
-    UInt32* const head = isEverything ? &m_Everything : FindSlot(HashOf(text), text);
+    UInt32* const head = isEverything ? &m_Everything : FindSlot(HashPath(text, kHashSeed), text);
     m_Patterns[count].nextEqual = *head;
     *head = index;
     return ZARVO_OK;

@@ -115,6 +115,7 @@ Result Stream::DecodeOneSymbol(uint8_t* limit, Input& input, bool isMarkExpected
         used = static_cast<size_t>(m_Symbols.in - bytes) - m_HeadSize;
         m_HeadSize = 0;
     }
+    m_Symbols.in = nullptr; // bytes goes
     input.data += used;
     input.size -= used;
     return trial == kTrialNeedsInput ? kNeedsInput : kRoomFilled;
