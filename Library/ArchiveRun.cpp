@@ -102,7 +102,7 @@ zarvo_code ArchiveRun::Run(Failure* failure) {
     m_Data.Prepare();
     RunOnThreads(m_ThreadCount, this);
     m_Data.DropUnended();
-    TellReports();
+    TellReports(true);
     (void)TellProgress(); // too late to stop anything
     m_Messages.TellAll(m_Archive->Messages());
     if (m_Data.FatalFailure().code != ZARVO_OK) {
@@ -126,7 +126,7 @@ void ArchiveRun::Watch(UInt32 count) {
     std::unique_lock lock(m_Lock);
     while (!m_HasEnded.wait_for(lock, kProgressInterval, [&] { return m_Ended == count; })) {
         lock.unlock();
-        TellReports();
+        TellReports(false);
         if (!TellProgress()) {
             m_IsStopped = true;
             m_Data.Stop();
@@ -136,14 +136,13 @@ void ArchiveRun::Watch(UInt32 count) {
 }
 
 // Tells the results that have no missing one before them.
-void ArchiveRun::TellReports() {
+void ArchiveRun::TellReports(bool areAllWorkersDone) {
     for (; m_Reported < m_States.size(); ++m_Reported) {
         const State state = GetState(m_Reported);
         if (state == kNoResult) continue;
         if (state == kPending) {
-            // A run that was stopped leaves gaps.
-            if (!m_Data.IsStopped() || m_Ended == 0) return;
-            continue;
+            if (!areAllWorkersDone) return;
+            continue; // a run that was stopped leaves gaps
         }
         zarvo_report report = {};
         report.struct_size = sizeof(report);

@@ -51,7 +51,7 @@ private:
 
     void Work(UInt32 number) override;
     void Watch(UInt32 count) override;
-    void TellReports();
+    void TellReports(bool areAllWorkersDone);
     bool TellProgress(); // false: to be stopped
     void SetState(size_t entry, State state);
     void SetFailed(size_t entry, const Failure& failure, State state);

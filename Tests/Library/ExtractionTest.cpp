@@ -501,3 +501,36 @@ TEST(Extraction, NothingIsCalledAfterAnException) {
     EXPECT_EQ(1u, calls);
     EXPECT_EQ(0u, reports);
 }
+
+// An entry that is under way when the run is stopped is still told.
+TEST(Extraction, StoppedRunTellsWhatWasUnderWay) {
+    struct State {
+        std::atomic<int> looks = 0;
+        std::string reports = {};
+    };
+    const std::string text = SampleText(1'500'000);
+    const std::string bytes = Archive({{.path = "a", .bytes = text.substr(0, 10)}, {.path = "b", .bytes = text}});
+    const zarvo::archive archive = OpenBytes(bytes);
+    State state;
+    zarvo_run_options run = ZARVO_RUN_OPTIONS_INIT;
+    run.threads = 2;
+    run.context = &state;
+    run.progress = [](void* context, const zarvo_progress*) {
+        std::atomic<int>& looks = static_cast<State*>(context)->looks;
+        ++looks;
+        looks.notify_all();
+        return 1;
+    };
+    zarvo_visit_options visit = ZARVO_VISIT_OPTIONS_INIT;
+    visit.bytes = [](void* context, uint64_t index, uint64_t, const void*, size_t) {
+        // The other thread has ended by the third look, or soon after.
+        std::atomic<int>& looks = static_cast<State*>(context)->looks;
+        for (int seen = 0; index == 0 && seen < 3; seen = looks)
+            looks.wait(seen);
+    };
+    visit.report = [](void* context, const zarvo_report* report) {
+        static_cast<State*>(context)->reports += std::to_string(report->index) + report->text + "\n";
+    };
+    EXPECT_EQ(ZARVO_ERROR_STOPPED, zarvo_visit(archive.get(), &run, &visit, nullptr, nullptr));
+    EXPECT_EQ("0\n", state.reports);
+}
