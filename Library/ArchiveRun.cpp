@@ -34,7 +34,7 @@ UInt32 CountThreads(zarvo_archive* archive, const zarvo_run_options& options, UI
         const BlockDecoder::Block block = archive->Blocks().GetBlock(index);
         const bool isHeldWhole = !BlockDecoder::IsStoredAsIs(block) && block.size <= maxBlockBytes &&
                                  !BlockDecoder::IsReadInPieces(block, maxBlockBytes);
-        if (isHeldWhole) largest = std::max<UInt64>(largest, block.size);
+        if (isHeldWhole) largest = std::max(largest, archive->Blocks().BytesToHold(block));
     }
     const UInt64 wanted = options.threads != 0 ? options.threads : ProcessorCount();
     const UInt64 affordable = memory / (2 * largest);
@@ -80,13 +80,8 @@ void ArchiveRun::SetFailed(size_t entry, const Failure& failure, State state) {
     bool isKept = false;
     {
         std::lock_guard lock(m_Lock);
-        const size_t index = m_Failures.size();
         isKept = (!m_FailureOf.empty() || m_FailureOf.resize_uninitialized(m_States.size(), kResizeExact)) &&
-                 m_Failures.resize_uninitialized(index + 1);
-        if (isKept) {
-            m_Failures[index] = {entry, failure};
-            m_FailureOf[entry] = static_cast<UInt32>(index);
-        }
+                 m_Failures.Add(failure, &m_FailureOf[entry]);
     }
     if (!isKept) {
         Failure noMemory;
@@ -152,7 +147,7 @@ void ArchiveRun::TellReports(bool areAllWorkersDone) {
         Failure failure;
         if (state == kFailed || state == kBroken) {
             std::lock_guard lock(m_Lock);
-            failure = m_Failures[m_FailureOf[m_Reported]].failure;
+            failure = m_Failures.Get(m_FailureOf[m_Reported]);
             report.outcome = state == kBroken ? ZARVO_OUTCOME_BROKEN : ZARVO_OUTCOME_FAILED;
             report.code = failure.code;
             report.system_code = failure.systemCode;

@@ -6,6 +6,7 @@
 
 #include "Library/Archive.h"
 #include "Library/DataRun.h"
+#include "Library/FailureList.h"
 #include "Library/Threads.h"
 
 class ArchiveRun : protected DataRun::Sink, private ThreadedWork {
@@ -74,10 +75,6 @@ private:
     std::mutex m_Lock;
     std::condition_variable m_HasEnded;
     UInt32 m_Ended = 0; // workers
-    struct FailedEntry {
-        UInt64 entry;
-        Failure failure;
-    };
-    dynamic_array<FailedEntry> m_Failures{kMemLabelFileSystem}; // in the order in which they came
-    dynamic_array<UInt32> m_FailureOf{kMemLabelFileSystem};     // by entry; empty until there is one
+    FailureList m_Failures;
+    dynamic_array<UInt32> m_FailureOf{kMemLabelFileSystem}; // by entry; empty until there is one
 };

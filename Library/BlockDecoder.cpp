@@ -16,9 +16,9 @@ zarvo_code SetOutsideData(Failure* failure) {
     return failure->Set(ZARVO_ERROR_DAMAGED, "lies outside the archive's data");
 }
 
-zarvo_code SetTooLarge(UInt32 index, const Block& block, UInt64 maxBlockBytes, Failure* failure) {
-    return failure->Set(ZARVO_ERROR_LIMIT, "block %u takes %u bytes of memory, and the limit is %llu", index,
-                        block.size, static_cast<unsigned long long>(maxBlockBytes));
+zarvo_code SetTooLarge(UInt32 index, UInt64 bytes, UInt64 maxBlockBytes, Failure* failure) {
+    return failure->Set(ZARVO_ERROR_LIMIT, "block %u takes %llu bytes of memory, and the limit is %llu", index,
+                        static_cast<unsigned long long>(bytes), static_cast<unsigned long long>(maxBlockBytes));
 }
 
 static bool HasLz4(const Block& block) { return block.type == kCompressionLz4 || block.type == kCompressionLz4HC; }
@@ -52,6 +52,17 @@ UInt32 BlockDecoder::FindBlock(UInt64 position) const {
             high = middle;
     }
     return low;
+}
+
+bool BlockDecoder::IsThere(const Block& block, UInt64 offset) const {
+    const UInt64 start = block.pieces[0].offset;
+    return start < m_Source->Size() && offset < m_Source->Size() - start;
+}
+
+// No more than the archive can have: a header's word alone is no reason to ask for 4 GiB.
+UInt64 BlockDecoder::StoredBytesThere(const Block& block) const {
+    const UInt64 start = block.pieces[0].offset;
+    return std::min<UInt64>(block.storedSize, start < m_Source->Size() ? m_Source->Size() - start : 0);
 }
 
 zarvo_code BlockDecoder::ReadStored(const Block& block, UInt64 from, void* out, size_t size, size_t* count,
@@ -95,11 +106,8 @@ zarvo_code BlockDecoder::DecodeWhole(UInt32 index, UInt8* out, size_t* count, Fa
                             static_cast<UInt32>(block.type));
     }
 
-    // No more than the archive can have: a header's word alone is no reason to ask for 4 GiB.
-    const UInt64 start = block.pieces[0].offset;
-    const UInt64 there = start < m_Source->Size() ? m_Source->Size() - start : 0;
     dynamic_array<UInt8> stored(kMemLabelReadBatch);
-    if (!stored.resize_uninitialized(static_cast<size_t>(std::min<UInt64>(block.storedSize, there)), kResizeExact))
+    if (!stored.resize_uninitialized(static_cast<size_t>(StoredBytesThere(block)), kResizeExact))
         return failure->SetMemory();
     size_t loaded = 0;
     const zarvo_code code = ReadStored(block, 0, stored.data(), stored.size(), &loaded, failure);

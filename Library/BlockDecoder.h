@@ -16,6 +16,8 @@
 #include "Runtime/Core/Containers/DynamicArray.h"
 #include "Runtime/VirtualFileSystem/ArchiveFileSystem/ArchiveStorageReader.h"
 
+#include <algorithm>
+
 class BlockDecoder : private NonCopyable {
 public:
     using Block = ArchiveStorageReader::Block;
@@ -36,6 +38,12 @@ public:
     // Smaller streams are decoded whole, as other blocks are, so that reading in them can jump.
     static bool IsReadInPieces(const Block& block, UInt64 maxBlockBytes);
 
+    // Whether the archive has the byte at an offset of a block that is stored as is.
+    bool IsThere(const Block& block, UInt64 offset) const;
+
+    // What decoding a block whole holds of it at a time: its decoded bytes, or its stored ones where they are more.
+    UInt64 BytesToHold(const Block& block) const { return std::max<UInt64>(block.size, StoredBytesThere(block)); }
+
     // Reads bytes [offset, offset + size) of a block that is stored as is. *count is how many are there.
     zarvo_code ReadStoredAsIs(UInt32 index, UInt64 offset, void* out, size_t size, size_t* count,
                               Failure* failure) const;
@@ -49,6 +57,8 @@ private:
 
     static constexpr UInt64 kLargestWholeStream = 1'048'576;
 
+    UInt64 StoredBytesThere(const Block& block) const;
+
     // Reads stored bytes [from, from + size) of a block; *count is how many the archive has.
     zarvo_code ReadStored(const Block& block, UInt64 from, void* out, size_t size, size_t* count,
                           Failure* failure) const;
@@ -61,7 +71,7 @@ private:
 
 // The failure of an entry that leaves the data, and that of a block that may not be held in memory.
 zarvo_code SetOutsideData(Failure* failure);
-zarvo_code SetTooLarge(UInt32 index, const BlockDecoder::Block& block, UInt64 maxBlockBytes, Failure* failure);
+zarvo_code SetTooLarge(UInt32 index, UInt64 bytes, UInt64 maxBlockBytes, Failure* failure);
 
 // A place inside an LZMA block from which decoding can go on.
 class StreamCursor : private NonCopyable {

@@ -31,7 +31,7 @@ zarvo_code DataReader::ReadInBlock(UInt32 blockIndex, UInt64 offset, UInt8* out,
         return m_Decoder->ReadStoredAsIs(blockIndex, offset, out, size, count, failure);
     if (BlockDecoder::IsReadInPieces(block, m_MaxBlockBytes))
         return ReadFromCursor(blockIndex, offset, out, size, count, kept, failure);
-    if (block.size > m_MaxBlockBytes) return SetTooLarge(blockIndex, block, m_MaxBlockBytes, failure);
+    if (block.size > m_MaxBlockBytes) return SetTooLarge(blockIndex, block.size, m_MaxBlockBytes, failure);
     if (size == block.size && !m_Cache->Has(blockIndex)) return m_Decoder->DecodeWhole(blockIndex, out, count, failure);
 
     BlockCache::Use use(m_Cache);

@@ -95,7 +95,8 @@ UInt64 DataRun::FindUnitEnd(const Unit& unit, UInt64 begin) const {
         reach = std::max(reach, active.file->end);
     size_t file = m_NextFile;
     UInt64 end = begin;
-    for (UInt32 index = unit.firstBlock; index < m_Decoder->BlockCount(); ++index) {
+    UInt32 count = 0; // of blocks with bytes
+    for (UInt32 index = unit.firstBlock; index < m_Decoder->BlockCount() && count < kMaxUnitBlocks; ++index) {
         const Block block = m_Decoder->GetBlock(index);
         const bool isFirst = index == unit.firstBlock;
         const UInt64 blockEnd = block.position + block.size;
@@ -103,7 +104,10 @@ UInt64 DataRun::FindUnitEnd(const Unit& unit, UInt64 begin) const {
             reach = std::max(reach, m_Files[file].end);
         if (!isFirst && BlockDecoder::IsReadInPieces(block, m_MaxBlockBytes)) break;
         if (!isFirst && reach <= block.position && !m_TakesAllBlocks) break;
+        if (block.size != 0) ++count;
         if (BlockDecoder::IsStoredAsIs(block)) {
+            if (!m_Decoder->IsThere(block, std::max(begin, block.position) - block.position))
+                return isFirst ? blockEnd : end;
             end = std::min(blockEnd, begin + kUnitSize);
             if (end < blockEnd) break;
         } else {
@@ -148,6 +152,7 @@ DataRun::UnitAnswer DataRun::NextUnit(Unit* unit) {
     unit->begin = BlockDecoder::IsStoredAsIs(block) ? begin : block.position;
     unit->isStream = BlockDecoder::IsReadInPieces(block, m_MaxBlockBytes);
     unit->end = unit->isStream ? block.position + block.size : FindUnitEnd(*unit, unit->begin);
+    unit->isMissing = BlockDecoder::IsStoredAsIs(block) && !m_Decoder->IsThere(block, unit->begin - block.position);
     m_Position = unit->end;
     return ListFiles(unit) ? kUnit : kNoMemoryForUnit;
 }
@@ -224,9 +229,9 @@ void DataRun::AddHole(Piece* piece, UInt64 begin, UInt64 end, const Failure& fai
 
 void DataRun::Decode(const Unit& unit, Piece* piece) {
     piece->holes.clear();
-    UInt64 biggest = piece->end - piece->begin;
-    if (biggest > std::max(m_MaxBlockBytes, kUnitSize)) biggest = 0; // one block, which is refused below
-    if (!piece->bytes.resize_uninitialized(static_cast<size_t>(biggest), kResizeExact)) return StopWithoutMemory();
+    UInt64 room = piece->end - piece->begin;
+    if (unit.isMissing || room > std::max(m_MaxBlockBytes, kUnitSize)) room = 0; // one block, which fails below
+    if (!piece->bytes.resize_uninitialized(static_cast<size_t>(room), kResizeExact)) return StopWithoutMemory();
     UInt64 position = unit.begin;
     for (UInt32 index = unit.firstBlock; position < unit.end && !IsStopped(); ++index) {
         const Block block = m_Decoder->GetBlock(index);
@@ -239,13 +244,13 @@ void DataRun::Decode(const Unit& unit, Piece* piece) {
         if (BlockDecoder::IsStoredAsIs(block))
             code = m_Decoder->ReadStoredAsIs(index, offset, piece->bytes.data() + (position - unit.begin), size, &count,
                                              &failure);
-        else if (block.size > m_MaxBlockBytes)
-            code = SetTooLarge(index, block, m_MaxBlockBytes, &failure);
+        else if (m_Decoder->BytesToHold(block) > m_MaxBlockBytes)
+            code = SetTooLarge(index, m_Decoder->BytesToHold(block), m_MaxBlockBytes, &failure);
         else
             code = m_Decoder->DecodeWhole(index, piece->bytes.data() + (position - unit.begin), &count, &failure);
         if (code != ZARVO_OK) {
             AddHole(piece, position + count, position + size, failure);
-            m_Sink->TakeDamage(index, offset + count, failure);
+            m_Sink->TakeDamage(index, position + count, position + size, failure);
         }
         position += size;
     }
@@ -298,7 +303,7 @@ void DataRun::WorkOnStream(UInt32 worker, const Unit& unit, Piece** piece) {
         const zarvo_code code = cursor.Read(begin - unit.begin, (*piece)->bytes.data(), size, &count, &failure);
         if (code != ZARVO_OK) {
             AddHole(*piece, begin + count, (*piece)->end, failure);
-            if (!isBroken) m_Sink->TakeDamage(unit.firstBlock, begin - unit.begin + count, failure);
+            if (!isBroken) m_Sink->TakeDamage(unit.firstBlock, begin + count, unit.end, failure);
             isBroken = true;
         }
         if (!PassOn(piece)) Deliver(worker, **piece);
@@ -336,8 +341,9 @@ void DataRun::Deliver(UInt32 worker, const Piece& piece) {
         const Hole* hole = std::lower_bound(piece.holes.begin(), piece.holes.end(), begin,
                                             [](const Hole& at, UInt64 place) { return at.end <= place; });
         if (hole == piece.holes.end() || hole->begin >= end) hole = nullptr;
-        DeliverPart(worker, part, begin - part.file->begin, piece.bytes.data() + (begin - piece.begin), end - begin,
-                    hole);
+        // A piece that has no bytes is all hole.
+        const UInt8* const bytes = piece.bytes.empty() ? nullptr : piece.bytes.data() + (begin - piece.begin);
+        DeliverPart(worker, part, begin - part.file->begin, bytes, end - begin, hole);
         if (!m_TakesAllBlocks) taken += end - begin;
     }
     m_BytesTaken.fetch_add(taken, std::memory_order_relaxed); // for progress only

@@ -2,7 +2,8 @@
 // the processor's cache.
 //
 // The data is cut into units: a run of whole blocks of about 1 MiB, a piece of that size of data that is stored as it
-// is, or one block that is decoded piece by piece. A thread takes the next unit, decodes it, and hands over all that
+// is, or one block that is decoded piece by piece. Data that is stored as it is and lies past the archive's end is one
+// unit a block. A thread takes the next unit, decodes it, and hands over all that
 // lies in it: files that lie in it whole at once, parts of others. Files are looked at in the order of their places,
 // not of the directory, so that nothing is decoded twice however the directory is sorted. A thread that decodes a block
 // piece by piece passes its pieces on to threads that have nothing to do.
@@ -60,8 +61,8 @@ public:
         // An entry that was added without data.
         virtual void TakeOther(UInt32 worker, UInt32 entry) = 0;
 
-        // A block that can't be decoded after its first readable bytes.
-        virtual void TakeDamage(UInt32 blockIndex, UInt64 readable, const Failure& damage) = 0;
+        // Data [begin, end) of a block that can't be read.
+        virtual void TakeDamage(UInt32 blockIndex, UInt64 begin, UInt64 end, const Failure& damage) = 0;
     };
 
     // All outlive the run. Blocks of more than maxBlockBytes are not decoded whole.
@@ -120,6 +121,7 @@ private:
         UInt64 end = 0;
         UInt32 firstBlock = 0;
         bool isStream = false;
+        bool isMissing = false;
         size_t firstFile = 0; // [firstFile, endFile) begin in it
         size_t endFile = 0;
         dynamic_array<PieceFile> carried{kMemLabelFileSystem}; // begin before it
@@ -127,6 +129,7 @@ private:
     };
 
     static constexpr UInt64 kUnitSize = 1'048'576;
+    static constexpr UInt32 kMaxUnitBlocks = 1'024; // each may have a failure of its own
     static constexpr size_t kOthersAtOnce = 64;
 
     // With m_Lock held.

@@ -38,7 +38,7 @@ private:
     void EndFile(UInt32 worker, SharedFile* file) override;
     void DropFile(SharedFile* file) override;
     void TakeOther(UInt32 worker, UInt32 entry) override;
-    void TakeDamage(UInt32, UInt64, const Failure&) override {}
+    void TakeDamage(UInt32, UInt64, UInt64, const Failure&) override {}
     void Report(const zarvo_report& report) override;
 
     int FindFolder(Worker* worker, UInt32 entry, Failure* failure);

@@ -14,7 +14,8 @@ zarvo_code TestRun::Test(const zarvo_test_options& what, zarvo_summary* summary,
         if (damage.blockIndex == last) continue;
         last = damage.blockIndex;
         ++summary->damaged_blocks;
-        if (what.block != nullptr) what.block(Options().context, damage.blockIndex, damage.failure.text);
+        if (what.block != nullptr)
+            what.block(Options().context, damage.blockIndex, m_Failures.Get(damage.failure).text);
     }
     for (size_t entry = 0; entry < Nodes().size(); ++entry) {
         const UInt64 size = zarvo_archive::SizeOf(Nodes()[entry]);
@@ -40,12 +41,12 @@ UInt64 TestRun::ReadableBytes(const Node& node) const {
     return end - node.offset;
 }
 
-void TestRun::TakeDamage(UInt32 blockIndex, UInt64 readable, const Failure& damage) {
-    const BlockDecoder::Block block = Archive()->Blocks().GetBlock(blockIndex);
+void TestRun::TakeDamage(UInt32 blockIndex, UInt64 begin, UInt64 end, const Failure& damage) {
+    UInt32 place = 0;
     Mutex::AutoLock lock(m_DamageLock);
     const size_t index = m_Damages.size();
-    if (m_Damages.resize_uninitialized(index + 1)) {
-        m_Damages[index] = {blockIndex, block.position + readable, block.position + block.size, damage};
+    if (m_Failures.Add(damage, &place) && m_Damages.resize_uninitialized(index + 1)) {
+        m_Damages[index] = {blockIndex, place, begin, end};
         return;
     }
     Failure noMemory;

@@ -14,9 +14,9 @@ public:
 private:
     struct Damage {
         UInt32 blockIndex;
-        UInt64 begin; // in the data, of what can't be read of the block
+        UInt32 failure; // in m_Failures
+        UInt64 begin;   // in the data, of what can't be read of the block
         UInt64 end;
-        Failure failure;
     };
 
     UInt64 ReadableBytes(const Node& node) const;
@@ -27,12 +27,13 @@ private:
     void EndFile(UInt32, SharedFile*) override {}
     void DropFile(SharedFile*) override {}
     void TakeOther(UInt32, UInt32) override {}
-    void TakeDamage(UInt32 blockIndex, UInt64 readable, const Failure& damage) override;
+    void TakeDamage(UInt32 blockIndex, UInt64 begin, UInt64 end, const Failure& damage) override;
     void Report(const zarvo_report&) override {}
 
+    // Under the lock until the run has ended.
     Mutex m_DamageLock;
-    dynamic_array<Damage> m_Damages{
-        kMemLabelFileSystem}; // under the lock until the run has ended; then by their places
+    dynamic_array<Damage> m_Damages{kMemLabelFileSystem}; // after the run in the order of their places
+    FailureList m_Failures;
 };
 
 // Hands the bytes of files to the caller, in order.
@@ -52,7 +53,7 @@ private:
     void EndFile(UInt32 worker, SharedFile* file) override;
     void DropFile(SharedFile* file) override;
     void TakeOther(UInt32 worker, UInt32 entry) override;
-    void TakeDamage(UInt32, UInt64, const Failure&) override {}
+    void TakeDamage(UInt32, UInt64, UInt64, const Failure&) override {}
     void Report(const zarvo_report& report) override;
 
     const zarvo_visit_options m_What;

@@ -534,3 +534,45 @@ TEST(Extraction, StoppedRunTellsWhatWasUnderWay) {
     EXPECT_EQ(ZARVO_ERROR_STOPPED, zarvo_visit(archive.get(), &run, &visit, nullptr, nullptr));
     EXPECT_EQ("0\n", state.reports);
 }
+
+// A file that begins inside a block that may not be held fails alone.
+TEST(Extraction, FilesInsideARefusedBlockFail) {
+    const TemporaryFolder folder;
+    const std::string text = SampleText(3'000'000);
+    const std::string bytes = BuildArchive({.entries = {{.path = "a", .bytes = text}, {.path = "b", .bytes = "2"}},
+                                            .chunkSize = 0,
+                                            .type = kCompressionLz4})
+                                  .bytes;
+    const std::string refusal = ": block 0 takes 3000001 bytes of memory, and the limit is 2000000\n";
+    EXPECT_EQ("a" + refusal + "b" + refusal, Extract(bytes, folder / "out", {.memory = 4'000'000}).reports);
+}
+
+// Stored bytes count, too: a small block can claim, and have, many.
+TEST(Extraction, StoredBytesBeyondTheBudgetAreRefused) {
+    const TemporaryFolder folder;
+    ArchiveDescription description = {.entries = {{.path = "a", .bytes = "text"}}, .type = kCompressionLz4};
+    description.blocks = {{.size = 4, .stored = std::string(3'000'000, 'x')}};
+    const Outcome outcome = Extract(BuildArchive(description).bytes, folder / "out", {.memory = 4'000'000});
+    EXPECT_EQ("a: block 0 takes 3000000 bytes of memory, and the limit is 2000000\n", outcome.reports);
+}
+
+// Blocks that claim 4 GiB each, all past the archive's end.
+TEST(Extraction, MissingBlocksCostNextToNothing) {
+    constexpr size_t kBlocks = 1'000;
+    ArchiveDescription description = {.entries = {{.path = "a", .bytes = std::string(kBlocks, 'x')}}, .chunkSize = 1};
+    for (size_t index = 0; index < kBlocks; ++index)
+        description.fields["block[" + std::to_string(index) + "].uncompressedSize"] = 0xFFFF'FFFF;
+    description.fields["node[0].size"] = kBlocks * UINT64_C(0xFFFF'FFFF);
+    const std::string bytes = BuildArchive(description).bytes;
+    const zarvo::archive archive = OpenBytes(bytes);
+    zarvo_summary summary = ZARVO_SUMMARY_INIT;
+    rusage before = {};
+    ASSERT_EQ(0, getrusage(RUSAGE_SELF, &before));
+    EXPECT_EQ(ZARVO_OK, zarvo_test(archive.get(), nullptr, nullptr, &summary, nullptr));
+    rusage after = {};
+    ASSERT_EQ(0, getrusage(RUSAGE_SELF, &after));
+    EXPECT_EQ(kBlocks, summary.damaged_blocks);
+    EXPECT_GT(1, after.ru_utime.tv_sec - before.ru_utime.tv_sec);
+    const TemporaryFolder folder;
+    EXPECT_EQ("a: block 0 ends after the archive's last byte\n", Extract(bytes, folder.Path()).reports);
+}
