@@ -28,6 +28,7 @@ protected:
     zarvo_archive* Archive() const { return m_Archive; }
     const zarvo_run_options& Options() const { return m_Options; }
     UInt32 ThreadCount() const { return m_ThreadCount; }
+    void LimitThreads(UInt32 count) { m_ThreadCount = std::min(m_ThreadCount, count); } // before Run
 
     // Asks for the memory of results, one an entry. Before the functions below.
     [[nodiscard]] bool MakeResults();

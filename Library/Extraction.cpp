@@ -2,7 +2,9 @@
 
 #include "Runtime/Allocator/Allocator.h"
 
+#include <algorithm>
 #include <cerrno>
+#include <sys/resource.h>
 
 Extraction::~Extraction() {
     for (Worker* worker : m_Workers)
@@ -17,12 +19,25 @@ zarvo_code Extraction::Extract(const char* folder, Failure* failure) {
     if (m_How.dry_run == 0) {
         if (const zarvo_code code = m_Output.Open(folder, failure); code != ZARVO_OK) return code;
     }
+    const size_t maxFolders = ShareDescriptors();
     if (!m_Workers.resize_uninitialized(ThreadCount(), kResizeExact)) return failure->SetMemory();
     for (Worker*& worker : m_Workers)
-        worker = New<Worker>(kMemLabelFileSystem, &m_Output);
+        worker = New<Worker>(kMemLabelFileSystem, &m_Output, maxFolders);
     for (const Worker* worker : m_Workers)
         if (worker == nullptr) return failure->SetMemory();
     return Run(failure);
+}
+
+// Lets as few threads work as the process has descriptors for. How many folders each may keep open.
+size_t Extraction::ShareDescriptors() {
+    constexpr UInt64 kOthers = 8;    // the program's, the archive and the folder to extract to
+    constexpr UInt64 kPerThread = 3; // a file, its folder, and one more on the way to it
+    constexpr UInt64 kMaxFolders = 16;
+    rlimit limit = {};
+    if (getrlimit(RLIMIT_NOFILE, &limit) != 0) return kMaxFolders;
+    const UInt64 free = std::max<UInt64>(limit.rlim_cur, kOthers + kPerThread + 1) - kOthers;
+    LimitThreads(static_cast<UInt32>(std::min<UInt64>(ThreadCount(), free / (kPerThread + 1))));
+    return static_cast<size_t>(std::clamp<UInt64>(free / ThreadCount() - kPerThread, 1, kMaxFolders));
 }
 
 zarvo_code Extraction::AddEntries(Failure* failure) {
@@ -70,8 +85,7 @@ zarvo_code Extraction::MakeFile(Worker* worker, UInt32 entry, NewFile* file, Fai
         *failure = {};
         const int folder = FindFolder(worker, entry, failure);
         const zarvo_code code = folder >= 0 ? file->Create(folder, failure) : failure->code;
-        const bool isShort = failure->systemCode == EMFILE || failure->systemCode == ENFILE;
-        if (code == ZARVO_OK || isSecondTry || !isShort || !worker->folders.Close()) return code;
+        if (code == ZARVO_OK || isSecondTry || !IsOutOfDescriptors(*failure) || !worker->folders.Close()) return code;
     }
 }
 

@@ -23,12 +23,13 @@ private:
         Failure failure VARNEX_GUARDED_BY(lock); // of making or writing it
     };
     struct Worker {
-        explicit Worker(const OutputFolder* output) : folders(output) {}
+        Worker(const OutputFolder* output, size_t maxFolders) : folders(output, maxFolders) {}
 
         FolderCache folders;
         core::string name{kMemLabelGeneral}; // of the entry at hand
     };
 
+    size_t ShareDescriptors();
     zarvo_code AddEntries(Failure* failure);
     void Refuse(size_t entry);
 

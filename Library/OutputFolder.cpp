@@ -27,6 +27,8 @@ std::atomic<UInt64> s_NextName{0};
 
 } // namespace
 
+bool IsOutOfDescriptors(const Failure& failure) { return failure.systemCode == EMFILE || failure.systemCode == ENFILE; }
+
 bool IsDiskFailure(const Failure& failure) {
     const int error = failure.systemCode;
     return error == ENOSPC || error == EDQUOT || error == EROFS;
@@ -65,11 +67,11 @@ bool FolderCache::Close() {
 
 // Opens a folder in another one, and makes it where it is missing.
 int FolderCache::Enter(int above, const char* name, Failure* failure) {
-    if (mkdirat(above, name, 0777) != 0 && errno != EEXIST) {
+    if (RepeatOnInterrupt([&] { return mkdirat(above, name, 0777); }) != 0 && errno != EEXIST) {
         (void)failure->SetSystem(errno);
         return -1;
     }
-    const int descriptor = openat(above, name, kFolderFlags);
+    const int descriptor = RepeatOnInterrupt([&] { return openat(above, name, kFolderFlags); });
     if (descriptor >= 0) return descriptor;
     const int error = errno;
     struct stat status;
@@ -79,13 +81,13 @@ int FolderCache::Enter(int above, const char* name, Failure* failure) {
 }
 
 bool FolderCache::Keep(core::string_ref path, int descriptor) {
-    if (m_Folders.size() == kMaxFolders) {
+    if (m_Folders.size() == m_MaxFolders) {
         Folder* oldest = m_Folders.begin();
         for (Folder& folder : m_Folders)
             if (folder.lastUse < oldest->lastUse) oldest = &folder;
         close(oldest->descriptor);
-        *oldest = std::move(m_Folders[kMaxFolders - 1]);
-        (void)m_Folders.resize_initialized(kMaxFolders - 1); // never grows
+        *oldest = std::move(m_Folders[m_MaxFolders - 1]);
+        (void)m_Folders.resize_initialized(m_MaxFolders - 1); // never grows
     }
     const size_t index = m_Folders.size();
     if (!m_Folders.resize_initialized(index + 1)) return false;
@@ -101,6 +103,13 @@ bool FolderCache::Keep(core::string_ref path, int descriptor) {
 }
 
 int FolderCache::Get(core::string_ref path, Failure* failure) {
+    const int descriptor = Walk(path, m_MaxFolders, failure);
+    if (descriptor >= 0 || !IsOutOfDescriptors(*failure) || !Close()) return descriptor;
+    *failure = {};
+    return Walk(path, 1, failure);
+}
+
+int FolderCache::Walk(core::string_ref path, size_t maxKept, Failure* failure) {
     char* const buffer = m_Normal.grow(path.size() + 1);
     if (buffer == nullptr) {
         (void)failure->SetMemory();
@@ -121,19 +130,25 @@ int FolderCache::Get(core::string_ref path, Failure* failure) {
         folder.lastUse = ++m_Uses;
         begin = size;
     }
-    while (begin < normal.size()) {
+    if (begin == normal.size()) return descriptor;
+    size_t left = 1 + static_cast<size_t>(std::count(normal.begin() + begin + (begin != 0), normal.end(), '/'));
+    bool isKept = true; // the descriptor at hand
+    while (left != 0) {
         if (normal[begin] == '/') ++begin;
         const size_t end = std::min(normal.find('/', begin), normal.size());
         buffer[end] = '\0';
-        descriptor = Enter(descriptor, buffer + begin, failure);
+        const int inner = Enter(descriptor, buffer + begin, failure);
         if (end != normal.size()) buffer[end] = '/';
-        if (descriptor < 0) return -1;
-        if (!Keep(normal.substr(0, end), descriptor)) {
+        if (!isKept) close(descriptor);
+        if (inner < 0) return -1;
+        descriptor = inner;
+        begin = end;
+        isKept = left-- <= maxKept; // those around them would soon give way to these
+        if (isKept && !Keep(normal.substr(0, end), descriptor)) {
             close(descriptor);
             (void)failure->SetMemory();
             return -1;
         }
-        begin = end;
     }
     return descriptor;
 }
@@ -161,7 +176,14 @@ static void MakeName(char (&name)[32]) {
                    static_cast<unsigned long long>(s_NextName.fetch_add(1, std::memory_order_relaxed)));
 }
 
+// Whether files without a name can get one: not where only the superuser can do it directly, and /proc is missing.
+static bool CanNameFiles() {
+    static const bool s_HasProc = access("/proc/self/fd", X_OK) == 0;
+    return s_HasProc;
+}
+
 zarvo_code NewFile::Create(int folder, Failure* failure) {
+    if (!CanNameFiles()) return CreateNamed(folder, failure);
     m_Descriptor = RepeatOnInterrupt([&] { return openat(folder, ".", O_TMPFILE | O_WRONLY | O_CLOEXEC, 0666); });
     if (m_Descriptor >= 0) return ZARVO_OK;
     // File systems, and kernels, that can't make a file without a name.
@@ -178,8 +200,11 @@ zarvo_code NewFile::CreateNamed(int folder, Failure* failure) {
             [&] { return openat(m_Folder, m_Name, O_WRONLY | O_CREAT | O_EXCL | O_NOFOLLOW | O_CLOEXEC, 0666); });
     } while (m_Descriptor < 0 && errno == EEXIST);
     if (m_Descriptor >= 0) return ZARVO_OK;
+    const int error = errno;
     m_Name[0] = '\0';
-    return failure->SetSystem(errno);
+    close(m_Folder); // another try may follow
+    m_Folder = -1;
+    return failure->SetSystem(error);
 }
 
 zarvo_code NewFile::Write(UInt64 offset, const UInt8* bytes, UInt64 size, Failure* failure) {
@@ -208,44 +233,58 @@ static int LinkFile(int descriptor, int folder, const char* name) {
     return linkat(AT_FDCWD, path, folder, name, AT_SYMLINK_FOLLOW);
 }
 
-zarvo_code NewFile::Place(int folder, const char* name, bool replaces, Failure* failure) {
-    const bool isNamed = m_Name[0] != '\0';
-    if (isNamed && m_Descriptor >= 0) {
-        // The last word on whether the bytes are there; on some file systems it is said only now.
-        const int descriptor = m_Descriptor;
-        m_Descriptor = -1;
-        if (close(descriptor) != 0 && errno != EINTR) return failure->SetSystem(errno);
+// Gives a temporary file its last name; EEXIST where something has it.
+static int RenameToNew(int folder, const char* from, const char* to) {
+    if (renameat2(folder, from, folder, to, RENAME_NOREPLACE) == 0) return 0;
+    if (errno != EINVAL && errno != ENOSYS) return -1;
+    // The file system can't refuse what is there when it renames, but when it links.
+    if (linkat(folder, from, folder, to, 0) == 0) {
+        (void)unlinkat(folder, from, 0);
+        return 0;
     }
-    int answer =
-        isNamed ? renameat2(folder, m_Name, folder, name, RENAME_NOREPLACE) : LinkFile(m_Descriptor, folder, name);
-    const bool canNotRefuse = isNamed && answer != 0 && (errno == EINVAL || errno == ENOSYS);
-    if (canNotRefuse) answer = linkat(folder, m_Name, folder, name, 0); // refuses what is there, and leaves both names
-    if (answer == 0) {
-        if (isNamed && !canNotRefuse) m_Name[0] = '\0';
-    } else if (errno == EEXIST && replaces) {
-        if (!isNamed) {
-            MakeName(m_Name);
-            if (LinkFile(m_Descriptor, folder, m_Name) != 0) {
-                m_Name[0] = '\0';
-                return failure->SetSystem(errno);
-            }
-            m_Folder = fcntl(folder, F_DUPFD_CLOEXEC, 0);
-        }
-        if (renameat(folder, m_Name, folder, name) != 0) {
-            const int error = errno;
-            if (unlinkat(folder, m_Name, 0) == 0) m_Name[0] = '\0';
-            return failure->SetSystem(error);
-        }
-        m_Name[0] = '\0';
-    } else {
-        return failure->SetSystem(errno);
-    }
-    if (m_Descriptor < 0) return ZARVO_OK;
+    if (errno == EEXIST) return -1;
+    // It has no links.
+    if (!LookAt(folder, to).isThere) return renameat(folder, from, folder, to);
+    errno = EEXIST;
+    return -1;
+}
+
+// The last word on whether the bytes are there: on some file systems it is said only when the file is closed.
+int NewFile::Close() {
     const int descriptor = m_Descriptor;
     m_Descriptor = -1;
-    if (close(descriptor) == 0 || errno == EINTR) return ZARVO_OK;
+    return descriptor < 0 || close(descriptor) == 0 || errno == EINTR ? 0 : -1;
+}
+
+zarvo_code NewFile::Place(int folder, const char* name, bool replaces, Failure* failure) {
+    const bool isNamed = m_Name[0] != '\0';
+    if (isNamed && Close() != 0) return failure->SetSystem(errno);
+    const int answer = isNamed ? RenameToNew(folder, m_Name, name) : LinkFile(m_Descriptor, folder, name);
+    if (answer == 0) {
+        m_Name[0] = '\0';
+        if (Close() == 0) return ZARVO_OK;
+        const int error = errno;
+        unlinkat(folder, name, 0); // our own, and not whole
+        return failure->SetSystem(error);
+    }
+    if (errno != EEXIST || !replaces) return failure->SetSystem(errno);
+    if (!isNamed) {
+        int linked = 0;
+        do {
+            MakeName(m_Name); // may be one that a killed process has left
+            linked = LinkFile(m_Descriptor, folder, m_Name);
+        } while (linked != 0 && errno == EEXIST);
+        if (linked != 0) {
+            m_Name[0] = '\0';
+            return failure->SetSystem(errno);
+        }
+    }
+    if (Close() == 0 && renameat(folder, m_Name, folder, name) == 0) {
+        m_Name[0] = '\0';
+        return ZARVO_OK;
+    }
     const int error = errno;
-    unlinkat(folder, name, 0); // our own, and not whole
+    if (unlinkat(folder, m_Name, 0) == 0) m_Name[0] = '\0';
     return failure->SetSystem(error);
 }
 

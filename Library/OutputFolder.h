@@ -38,11 +38,13 @@ private:
 // The folders that a thread has used lately, open. One thread.
 class FolderCache : private NonCopyable {
 public:
-    explicit FolderCache(const OutputFolder* output) : m_Output(output) {}
+    // Keeps up to maxFolders open, at least 1.
+    FolderCache(const OutputFolder* output, size_t maxFolders) : m_Output(output), m_MaxFolders(maxFolders) {}
     ~FolderCache();
 
     // The descriptor of a folder, which is made with those above it where it is missing; -1 after a failure. It stays
-    // the cache's, and is good until the next call. path in any form, without "..".
+    // the cache's, and is good until the next call. path in any form, without "..". Folders that are kept open give way
+    // where descriptors run out.
     int Get(core::string_ref path, Failure* failure);
 
     // Closes the folders, for whoever finds no descriptor left. Whether there were any.
@@ -56,16 +58,21 @@ private:
         int descriptor = -1;
         UInt64 lastUse = 0;
     };
-    static constexpr size_t kMaxFolders = 16;
 
+    // As Get, and keeps the last maxKept folders of the path open.
+    int Walk(core::string_ref path, size_t maxKept, Failure* failure);
     int Enter(int above, const char* name, Failure* failure);
     [[nodiscard]] bool Keep(core::string_ref path, int descriptor);
 
     const OutputFolder* m_Output;
+    const size_t m_MaxFolders;
     dynamic_array<Folder> m_Folders{kMemLabelFileSystem};
     core::string m_Normal{kMemLabelGeneral};
     UInt64 m_Uses = 0;
 };
+
+// Whether the failure is that no descriptor is left.
+bool IsOutOfDescriptors(const Failure& failure);
 
 // Whether the failure is of the disk, so that no other file will fare better: it is full, or can't be written.
 bool IsDiskFailure(const Failure& failure);
@@ -96,6 +103,7 @@ public:
 
 private:
     zarvo_code CreateNamed(int folder, Failure* failure);
+    int Close();
 
     int m_Descriptor = -1;
     int m_Folder = -1;    // of the temporary name; a copy of the caller's

@@ -1,7 +1,9 @@
 #include "Tests/Library/LibraryTest.h"
+#include "Tests/Library/SystemFaults.h"
 #include "Tests/Support/TemporaryFolder.h"
 #include "Tools/ArchiveWriter/ArchiveWriter.h"
 
+#include <deque>
 #include <fcntl.h>
 #include <map>
 #include <mutex>
@@ -575,4 +577,91 @@ TEST(Extraction, MissingBlocksCostNextToNothing) {
     EXPECT_GT(1, after.ru_utime.tv_sec - before.ru_utime.tv_sec);
     const TemporaryFolder folder;
     EXPECT_EQ("a: block 0 ends after the archive's last byte\n", Extract(bytes, folder.Path()).reports);
+}
+
+// Every call fails once, on file systems of all abilities: what has a name is whole, nothing else is left, and the next
+// run completes it.
+TEST(Extraction, FailingCallsLeaveNothingHalfDone) {
+    const std::string text = SampleText(1'200'000);
+    const std::string bytes =
+        Archive({{.path = "a/b", .bytes = text.substr(0, 100)}, {.path = "c/d", .bytes = text}, {.path = "e"}});
+    const Tree whole = {{"a", "/"}, {"a/b", text.substr(0, 100)}, {"c", "/"}, {"c/d", text}, {"e", ""}};
+    const struct {
+        const char* what;
+        std::vector<FaultDescription> lacks;
+    } fileSystems[] = {
+        {.what = "with everything", .lacks = {}},
+        {.what = "without files without names", .lacks = {{.call = "O_TMPFILE", .error = EOPNOTSUPP}}},
+        {.what = "without a direct way to name files", .lacks = {{.call = "AT_EMPTY_PATH", .error = ENOENT}}},
+        {.what = "without RENAME_NOREPLACE",
+         .lacks = {{.call = "O_TMPFILE", .error = EOPNOTSUPP}, {.call = "RENAME_NOREPLACE", .error = EINVAL}}},
+        {.what = "without links",
+         .lacks = {{.call = "O_TMPFILE", .error = EOPNOTSUPP},
+                   {.call = "RENAME_NOREPLACE", .error = EINVAL},
+                   {.call = "link of a name", .error = EPERM}}},
+    };
+    const FaultDescription faults[] = {
+        {.call = "openat", .error = EMFILE}, {.call = "openat", .error = EINTR},  {.call = "mkdirat", .error = EIO},
+        {.call = "linkat", .error = EIO},    {.call = "renameat2", .error = EIO}, {.call = "pwrite", .error = EIO},
+        {.call = "pwrite", .error = EINTR},  {.call = "pwrite", .error = ENOSPC}, {.call = "pthread_create"},
+    };
+    for (const auto& fileSystem : fileSystems) {
+        std::deque<SystemFault> lacking;
+        for (const FaultDescription& lack : fileSystem.lacks)
+            lacking.emplace_back(lack);
+        for (FaultDescription description : faults) {
+            bool hasStruck = true;
+            for (description.number = 1; hasStruck; ++description.number) {
+                SCOPED_TRACE(std::string(fileSystem.what) + ": " + description.call + " " +
+                             std::to_string(description.number) + " fails with " + std::to_string(description.error));
+                const TemporaryFolder folder;
+                const size_t descriptors = CountOpenDescriptors();
+                {
+                    const SystemFault fault(description);
+                    const Outcome outcome = Extract(bytes, folder / "out");
+                    hasStruck = fault.HasStruck();
+                    EXPECT_EQ(true, hasStruck || outcome.files == 3) << outcome;
+                }
+                EXPECT_EQ(descriptors, CountOpenDescriptors());
+                for (const auto& [name, there] : TreeOf(folder / "out"))
+                    EXPECT_EQ(true, whole.contains(name) && whole.at(name) == there) << name;
+                EXPECT_EQ(0u, Extract(bytes, folder / "out").failures);
+                EXPECT_EQ(true, whole == TreeOf(folder / "out"));
+            }
+        }
+    }
+}
+
+// A name that a killed process with this one's number has left is passed over.
+TEST(Extraction, TemporariesOfAKilledRunAreInNobodysWay) {
+    const TemporaryFolder folder;
+    for (int number = 0; number < 2'000; ++number) {
+        char name[32];
+        snprintf(name, sizeof(name), ".zarvo-%x-%x", static_cast<unsigned>(getpid()), number);
+        WriteFile(folder / name, "");
+    }
+    WriteFile(folder / "a", "old");
+    EXPECT_EQ((Outcome{.reports = "a\n", .files = 1}), Extract(Archive({{.path = "a", .bytes = "1"}}), folder.Path()));
+    EXPECT_EQ("1", ReadFile(folder / "a"));
+}
+
+// Many threads, deep folders, and hardly a descriptor.
+TEST(Extraction, FewDescriptorsAreEnough) {
+    std::vector<ArchiveEntry> entries;
+    for (int number = 0; number < 200; ++number) {
+        std::string path;
+        for (int level = 0; level < 12; ++level)
+            path += std::to_string(number % (level + 2)) + "/";
+        entries.push_back({.path = path + std::to_string(number), .bytes = std::string(number * 30, 'x')});
+    }
+    const std::string bytes = Archive(entries);
+    const TemporaryFolder folder;
+    rlimit before = {};
+    ASSERT_EQ(0, getrlimit(RLIMIT_NOFILE, &before));
+    const rlimit few = {16, before.rlim_max};
+    ASSERT_EQ(0, setrlimit(RLIMIT_NOFILE, &few));
+    const Outcome outcome = Extract(bytes, folder / "out", {.threads = 8});
+    ASSERT_EQ(0, setrlimit(RLIMIT_NOFILE, &before));
+    EXPECT_EQ(0u, outcome.failures) << outcome;
+    EXPECT_EQ(entries.size(), outcome.files);
 }

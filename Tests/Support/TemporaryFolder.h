@@ -10,6 +10,7 @@
 #include <filesystem>
 #include <fstream>
 #include <gtest/gtest.h>
+#include <sstream>
 #include <string>
 
 class TemporaryFolder : private NonCopyable {
@@ -52,7 +53,9 @@ inline void WriteFile(const std::string& path, const std::string& text) {
 inline std::string ReadFile(const std::string& path) {
     std::ifstream file(path, std::ios::binary);
     EXPECT_TRUE(file.is_open()) << path;
-    return {std::istreambuf_iterator<char>(file), {}};
+    std::ostringstream text;
+    text << file.rdbuf();
+    return std::move(text).str();
 }
 
 // How many descriptors this process has open.

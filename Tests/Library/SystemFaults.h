@@ -1,0 +1,28 @@
+// Lets system calls of the library fail in a test: this program's own functions of their names come before the C
+// library's, and call the system unless a fault is wanted. One test's; any thread may call them meanwhile.
+//
+//   const SystemFault fault({.call = "openat", .number = 3, .error = EMFILE});   // the third openat from now on fails
+//   const SystemFault fault({.call = "O_TMPFILE", .error = EOPNOTSUPP});         // every one fails
+#pragma once
+
+#include "Runtime/Core/NonCopyable.h"
+
+#include <cerrno>
+
+struct FaultDescription {
+    const char* call = ""; // openat, mkdirat, linkat, renameat2, pwrite, pthread_create; or a kind of one:
+                           // O_TMPFILE, AT_EMPTY_PATH, RENAME_NOREPLACE, "link of a name", "/proc"
+    int number = 0;        // which call from now on, from 1; 0: every one
+    int error = EIO;
+};
+
+class SystemFault : private NonCopyable {
+public:
+    explicit SystemFault(const FaultDescription& fault); // several may be there at once
+    ~SystemFault();
+
+    bool HasStruck() const;
+
+private:
+    int m_Index;
+};
