@@ -648,9 +648,9 @@ TEST(Extraction, TemporariesOfAKilledRunAreInNobodysWay) {
 // Many threads, deep folders, and hardly a descriptor.
 TEST(Extraction, FewDescriptorsAreEnough) {
     std::vector<ArchiveEntry> entries;
-    for (int number = 0; number < 200; ++number) {
+    for (size_t number = 0; number < 200; ++number) {
         std::string path;
-        for (int level = 0; level < 12; ++level)
+        for (size_t level = 0; level < 12; ++level)
             path += std::to_string(number % (level + 2)) + "/";
         entries.push_back({.path = path + std::to_string(number), .bytes = std::string(number * 30, 'x')});
     }
