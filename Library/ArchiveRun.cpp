@@ -48,7 +48,7 @@ ArchiveRun::ArchiveRun(zarvo_archive* archive, const zarvo_run_options& options)
       m_Options(options),
       m_MaxBlockBytes(MaxBlockBytes(archive, MemoryOf(options))),
       m_ThreadCount(CountThreads(archive, options, MemoryOf(options), m_MaxBlockBytes)),
-      m_Data(&archive->Blocks(), archive->Nodes(), m_MaxBlockBytes, this) {}
+      m_Data(&archive->Blocks(), archive->Nodes(), m_MaxBlockBytes, m_ThreadCount, this) {}
 
 bool ArchiveRun::MakeResults() {
     if (!m_States.resize_uninitialized(Nodes().size(), kResizeExact)) return false;

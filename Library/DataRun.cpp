@@ -6,10 +6,11 @@
 
 using Block = BlockDecoder::Block;
 
-DataRun::DataRun(const BlockDecoder* decoder, const Nodes& nodes, UInt64 maxBlockBytes, Sink* sink)
+DataRun::DataRun(const BlockDecoder* decoder, const Nodes& nodes, UInt64 maxBlockBytes, UInt32 threads, Sink* sink)
     : m_Decoder(decoder),
       m_Nodes(nodes),
       m_MaxBlockBytes(maxBlockBytes),
+      m_UnitSize(std::min(kMaxUnitSize, kAllUnits / threads)),
       m_DataSize(decoder->DataSize()),
       m_Sink(sink) {}
 
@@ -88,7 +89,7 @@ void DataRun::Unshare(SharedFile* shared) {
     (void)m_Shared.resize_uninitialized(m_Shared.size() - 1); // never grows
 }
 
-// Where the unit that begins at a place ends: after about kUnitSize bytes, or before a block that no file needs.
+// Where the unit that begins at a place ends: after about m_UnitSize bytes, or before a block that no file needs.
 UInt64 DataRun::FindUnitEnd(const Unit& unit, UInt64 begin) const {
     UInt64 reach = 0; // of the files that begin before the place looked at
     for (const PieceFile& active : m_Active)
@@ -108,13 +109,13 @@ UInt64 DataRun::FindUnitEnd(const Unit& unit, UInt64 begin) const {
         if (BlockDecoder::IsStoredAsIs(block)) {
             if (!m_Decoder->IsThere(block, std::max(begin, block.position) - block.position))
                 return isFirst ? blockEnd : end;
-            end = std::min(blockEnd, begin + kUnitSize);
+            end = std::min(blockEnd, begin + m_UnitSize);
             if (end < blockEnd) break;
         } else {
-            if (!isFirst && blockEnd - begin > kUnitSize) break;
+            if (!isFirst && blockEnd - begin > m_UnitSize) break;
             end = blockEnd;
         }
-        if (end - begin >= kUnitSize) break;
+        if (end - begin >= m_UnitSize) break;
     }
     return end;
 }
@@ -230,7 +231,7 @@ void DataRun::AddHole(Piece* piece, UInt64 begin, UInt64 end, const Failure& fai
 void DataRun::Decode(const Unit& unit, Piece* piece) {
     piece->holes.clear();
     UInt64 room = piece->end - piece->begin;
-    if (unit.isMissing || room > std::max(m_MaxBlockBytes, kUnitSize)) room = 0; // one block, which fails below
+    if (unit.isMissing || room > std::max(m_MaxBlockBytes, m_UnitSize)) room = 0; // one block, which fails below
     if (!piece->bytes.resize_uninitialized(static_cast<size_t>(room), kResizeExact)) return StopWithoutMemory();
     UInt64 position = unit.begin;
     for (UInt32 index = unit.firstBlock; position < unit.end && !IsStopped(); ++index) {
@@ -270,9 +271,9 @@ void DataRun::WorkOnStream(UInt32 worker, const Unit& unit, Piece** piece) {
     size_t file = unit.firstFile;
     size_t leaving = 0;
     bool isBroken = false;
-    for (UInt64 begin = unit.begin; begin < end && !IsStopped(); begin += kUnitSize) {
+    for (UInt64 begin = unit.begin; begin < end && !IsStopped(); begin += m_UnitSize) {
         (*piece)->begin = begin;
-        (*piece)->end = std::min(end, begin + kUnitSize);
+        (*piece)->end = std::min(end, begin + m_UnitSize);
         (*piece)->files.clear();
         (*piece)->holes.clear();
         const size_t size = static_cast<size_t>((*piece)->end - begin);

@@ -1,14 +1,14 @@
 // Decodes an archive's blocks in all threads, each block once, and hands the files' bytes to a sink while they are in
 // the processor's cache.
 //
-// The data is cut into units: a run of whole blocks of about 1 MiB, a piece of that size of data that is stored as it
-// is, or one block that is decoded piece by piece. Data that is stored as it is and lies past the archive's end is one
-// unit a block. A thread takes the next unit, decodes it, and hands over all that
-// lies in it: files that lie in it whole at once, parts of others. Files are looked at in the order of their places,
-// not of the directory, so that nothing is decoded twice however the directory is sorted. A thread that decodes a block
-// piece by piece passes its pieces on to threads that have nothing to do.
+// The data is cut into units: a run of whole blocks of about 1 MiB (less for many threads), a piece of that size of
+// data that is stored as it is, or one block that is decoded piece by piece. Data that is stored as it is and lies past
+// the archive's end is one unit a block. A thread takes the next unit, decodes it, and hands over all that lies in it:
+// files that lie in it whole at once, parts of others. Files are looked at in the order of their places, not of the
+// directory, so that nothing is decoded twice however the directory is sorted. A thread that decodes a block piece by
+// piece passes its pieces on to threads that have nothing to do.
 //
-//   DataRun run(decoder, nodes, maxBlockBytes, &sink);
+//   DataRun run(decoder, nodes, maxBlockBytes, threads, &sink);
 //   run.AddFile(entry) ..., or run.AddAllBlocks(); run.AddOther(entry) ...
 //   run.Prepare();
 //   run.Work(worker);   // in each thread, each with a number of its own
@@ -65,8 +65,8 @@ public:
         virtual void TakeDamage(UInt32 blockIndex, UInt64 begin, UInt64 end, const Failure& damage) = 0;
     };
 
-    // All outlive the run. Blocks of more than maxBlockBytes are not decoded whole.
-    DataRun(const BlockDecoder* decoder, const Nodes& nodes, UInt64 maxBlockBytes, Sink* sink);
+    // All outlive the run. Blocks of more than maxBlockBytes are not decoded whole. threads: that may work.
+    DataRun(const BlockDecoder* decoder, const Nodes& nodes, UInt64 maxBlockBytes, UInt32 threads, Sink* sink);
     ~DataRun();
 
     // Before Prepare. False when memory is refused. A file needs bytes, and its start must lie in the data.
@@ -128,8 +128,9 @@ private:
         dynamic_array<PieceFile> leaving{kMemLabelFileSystem}; // begin in it and end after it, in order
     };
 
-    static constexpr UInt64 kUnitSize = 1'048'576;
-    static constexpr UInt32 kMaxUnitBlocks = 1'024; // each may have a failure of its own
+    static constexpr UInt64 kMaxUnitSize = 1'048'576;
+    static constexpr UInt64 kAllUnits = 8 * kMaxUnitSize; // of all threads together, where blocks are small
+    static constexpr UInt32 kMaxUnitBlocks = 1'024;       // each may have a failure of its own
     static constexpr size_t kOthersAtOnce = 64;
 
     // With m_Lock held.
@@ -153,6 +154,7 @@ private:
     const BlockDecoder* m_Decoder;
     const Nodes& m_Nodes;
     const UInt64 m_MaxBlockBytes;
+    const UInt64 m_UnitSize;
     const UInt64 m_DataSize;
     Sink* m_Sink;
     bool m_KeepsOrder = false;

@@ -665,3 +665,22 @@ TEST(Extraction, FewDescriptorsAreEnough) {
     EXPECT_EQ(0u, outcome.failures) << outcome;
     EXPECT_EQ(entries.size(), outcome.files);
 }
+
+// All threads together decode 8 MiB at a time, however many they are.
+TEST(Extraction, ManyThreadsShareTheMemoryOfEight) {
+    const std::string bytes = BuildArchive({.entries = {{.path = "a", .bytes = SampleText(3'000'000)}}}).bytes;
+    const zarvo::archive archive = OpenBytes(bytes);
+    std::atomic<size_t> largest = 0;
+    zarvo_run_options run = ZARVO_RUN_OPTIONS_INIT;
+    run.threads = 64;
+    run.context = &largest;
+    zarvo_visit_options visit = ZARVO_VISIT_OPTIONS_INIT;
+    visit.bytes = [](void* context, uint64_t, uint64_t, const void*, size_t size) {
+        std::atomic<size_t>& largestSize = *static_cast<std::atomic<size_t>*>(context);
+        size_t seen = largestSize;
+        while (seen < size && !largestSize.compare_exchange_weak(seen, size)) {
+        }
+    };
+    ASSERT_EQ(ZARVO_OK, zarvo_visit(archive.get(), &run, &visit, nullptr, nullptr));
+    EXPECT_EQ(131'072u, largest.load());
+}

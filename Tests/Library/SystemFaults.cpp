@@ -11,6 +11,13 @@
 #include <sys/syscall.h>
 #include <unistd.h>
 
+// The sanitizers have a pthread_create of their own, which this program must not replace.
+#if defined(__has_feature)
+#if __has_feature(thread_sanitizer) || __has_feature(address_sanitizer)
+#define VARNEX_UNDER_SANITIZERS
+#endif
+#endif
+
 namespace {
 
 struct Fault {
@@ -80,8 +87,10 @@ ssize_t pwrite(int file, const void* bytes, size_t size, off_t offset) {
     return Fails("pwrite") ? -1 : syscall(SYS_pwrite64, file, bytes, size, offset);
 }
 
+#ifndef VARNEX_UNDER_SANITIZERS
 int pthread_create(pthread_t* thread, const pthread_attr_t* attributes, void* (*start)(void*), void* given) {
     static const auto s_Real = reinterpret_cast<decltype(&pthread_create)>(dlsym(RTLD_NEXT, "pthread_create"));
     return Fails("pthread_create") ? EAGAIN : s_Real(thread, attributes, start, given);
 }
+#endif
 }
