@@ -648,7 +648,7 @@ TEST(Extraction, TemporariesOfAKilledRunAreInNobodysWay) {
 // Many threads, deep folders, and hardly a descriptor.
 TEST(Extraction, FewDescriptorsAreEnough) {
     std::vector<ArchiveEntry> entries;
-    for (size_t number = 0; number < 200; ++number) {
+    for (size_t number = 0; number < 60; ++number) {
         std::string path;
         for (size_t level = 0; level < 12; ++level)
             path += std::to_string(number % (level + 2)) + "/";
