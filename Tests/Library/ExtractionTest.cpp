@@ -652,9 +652,9 @@ TEST(Extraction, FewDescriptorsAreEnough) {
         std::string path;
         for (size_t level = 0; level < 12; ++level)
             path += std::to_string(number % (level + 2)) + "/";
-        entries.push_back({.path = path + std::to_string(number), .bytes = std::string(number * 30, 'x')});
+        entries.push_back({.path = path + std::to_string(number), .bytes = std::string(200'000 + number, 'x')});
     }
-    const std::string bytes = Archive(entries);
+    const std::string bytes = Archive(entries, kCompressionNone);
     const TemporaryFolder folder;
     rlimit before = {};
     ASSERT_EQ(0, getrlimit(RLIMIT_NOFILE, &before));
