@@ -42,9 +42,9 @@ int main(int argumentCount, char** arguments) {
     std::vector<Sum> sums(archive->entries().size());
     std::atomic<size_t> next = 0; // the entry that no thread has taken yet
     {
-        std::vector<std::jthread> threads;
-        for (int thread = 0; thread < 4; ++thread)
-            threads.emplace_back([&] {
+        std::vector<std::jthread> threads(4);
+        for (std::jthread& thread : threads)
+            thread = std::jthread([&] {
                 for (size_t index; (index = next++) < sums.size();)
                     sums[index] = SumFile(*archive, index);
             });

@@ -12,8 +12,9 @@ BuiltArchive BuildArchiveFrom(FuzzInput& input) {
     const UInt64 copies = 1 + input.TakeBelow(300);
     std::vector<ArchiveBlock> blocks(input.TakeBelow(6));
     for (ArchiveBlock& block : blocks) {
-        block.type = kTypes[input.TakeBelow(std::size(kTypes))];
-        block.streamed = (block.type == kCompressionLzma || block.type == kCompressionNone) && input.TakeBelow(2) != 0;
+        const CompressionType type = kTypes[input.TakeBelow(std::size(kTypes))];
+        block.type = type;
+        block.streamed = (type == kCompressionLzma || type == kCompressionNone) && input.TakeBelow(2) != 0;
         block.size = input.TakeBelow(100'000);
     }
     const std::string_view bytes(reinterpret_cast<const char*>(input.data()), input.size());

@@ -43,9 +43,10 @@ Bytes MakeData(LzmaRandom& random, size_t size, const std::vector<Bytes>& files)
         uint32_t distance = 1 + random.Below(20);
         if (random.OneIn(3)) distance = (4096u << random.Below(3)) - random.Below(20);
         if (random.OneIn(3)) distance = 1 + random.Below(100'000);
-        const Bytes* const file = files.empty() ? nullptr : &files[random.Below(static_cast<uint32_t>(files.size()))];
-        const uint32_t kind = random.Below(file != nullptr && !file->empty() ? 6 : 4);
-        size_t place = kind >= 4 ? random.Below(static_cast<uint32_t>(file->size())) : 0;
+        const Bytes none;
+        const Bytes& file = files.empty() ? none : files[random.Below(static_cast<uint32_t>(files.size()))];
+        const uint32_t kind = random.Below(file.empty() ? 4 : 6);
+        size_t place = kind >= 4 ? random.Below(static_cast<uint32_t>(file.size())) : 0;
         for (; run != 0 && data.size() < size; --run) {
             if (kind == 0)
                 data.push_back(byte);
@@ -56,7 +57,7 @@ Bytes MakeData(LzmaRandom& random, size_t size, const std::vector<Bytes>& files)
             else if (kind == 3)
                 data.push_back(distance <= data.size() ? data[data.size() - distance] : byte);
             else
-                data.push_back((*file)[place++ % file->size()]);
+                data.push_back(file[place++ % file.size()]);
         }
     }
     return data;
