@@ -50,10 +50,33 @@ ArchiveRun::ArchiveRun(zarvo_archive* archive, const zarvo_run_options& options)
       m_ThreadCount(CountThreads(archive, options, MemoryOf(options), m_MaxBlockBytes)),
       m_Data(&archive->Blocks(), archive->Nodes(), m_MaxBlockBytes, m_ThreadCount, this) {}
 
-bool ArchiveRun::MakeResults() {
-    if (!m_States.resize_uninitialized(Nodes().size(), kResizeExact)) return false;
+zarvo_code ArchiveRun::AddPlanned(OutputPlan* plan, bool isDryRun, UInt64* bytes, Failure* failure) {
+    if (!m_States.resize_uninitialized(Nodes().size(), kResizeExact)) return failure->SetMemory();
     if (!m_States.empty()) memset(m_States.data(), kNoResult, m_States.size());
-    return true;
+    if (const zarvo_code code = plan->Build(m_Options.wanted, m_Options.excluded, failure); code != ZARVO_OK)
+        return code;
+    *bytes = 0;
+    for (UInt32 entry = 0; entry < Nodes().size(); ++entry) {
+        const OutputPlan::Verdict verdict = plan->VerdictOf(entry);
+        if (verdict == OutputPlan::kUnwanted || verdict == OutputPlan::kReplaced) continue;
+        SetState(entry, kPending);
+        const Node& node = Nodes()[entry];
+        bool isAdded = true;
+        if (verdict == OutputPlan::kRefused || verdict == OutputPlan::kClash) {
+            Failure refusal;
+            plan->SetRefusal(entry, &refusal);
+            SetFailed(entry, refusal);
+        } else if (isDryRun) {
+            SetDone(entry);
+        } else if (verdict == OutputPlan::kFolder || node.size == 0 || IsOutsideData(node)) {
+            isAdded = m_Data.AddOther(entry);
+        } else {
+            isAdded = m_Data.AddFile(entry);
+        }
+        if (!isAdded) return failure->SetMemory();
+        if (__builtin_add_overflow(*bytes, zarvo_archive::SizeOf(node), bytes)) *bytes = ~UInt64{0};
+    }
+    return ZARVO_OK;
 }
 
 void ArchiveRun::SetState(size_t entry, State state) {

@@ -7,6 +7,7 @@
 #include "Library/Archive.h"
 #include "Library/DataRun.h"
 #include "Library/FailureList.h"
+#include "Library/OutputPlan.h"
 #include "Library/Threads.h"
 
 class ArchiveRun : protected DataRun::Sink, private ThreadedWork {
@@ -30,11 +31,9 @@ protected:
     UInt32 ThreadCount() const { return m_ThreadCount; }
     void LimitThreads(UInt32 count) { m_ThreadCount = std::min(m_ThreadCount, count); } // before Run
 
-    // Asks for the memory of results, one an entry. Before the functions below.
-    [[nodiscard]] bool MakeResults();
-
-    // An entry that will have a result of its own; all others have none. Before Run.
-    void Expect(size_t entry) { SetState(entry, kPending); }
+    // Builds the plan, and adds what it says is to be written: each entry that counts will have a result. Those that
+    // the plan refuses have theirs at once, and in a dry run all have. *bytes is the sum of their sizes. Before Run.
+    [[nodiscard]] zarvo_code AddPlanned(OutputPlan* plan, bool isDryRun, UInt64* bytes, Failure* failure);
 
     // The result of an entry, once. Any thread.
     void SetDone(size_t entry);

@@ -12,10 +12,11 @@ Extraction::~Extraction() {
 }
 
 zarvo_code Extraction::Extract(const char* folder, Failure* failure) {
-    if (!MakeResults()) return failure->SetMemory();
-    if (const zarvo_code code = m_Plan.Build(Options().wanted, Options().excluded, failure); code != ZARVO_OK)
-        return code;
-    if (const zarvo_code code = AddEntries(failure); code != ZARVO_OK) return code;
+    UInt64 bytes = 0;
+    if (const zarvo_code code = AddPlanned(&m_Plan, m_How.dry_run != 0, &bytes, failure); code != ZARVO_OK) return code;
+    if (m_How.max_bytes != 0 && bytes > m_How.max_bytes)
+        return failure->Set(ZARVO_ERROR_LIMIT, "the files have %llu bytes; the limit (max_bytes) is %llu",
+                            static_cast<unsigned long long>(bytes), static_cast<unsigned long long>(m_How.max_bytes));
     if (m_How.dry_run == 0) {
         if (const zarvo_code code = m_Output.Open(folder, failure); code != ZARVO_OK) return code;
     }
@@ -38,33 +39,6 @@ size_t Extraction::ShareDescriptors() {
     const UInt64 free = std::max<UInt64>(limit.rlim_cur, kOthers + kPerThread + 1) - kOthers;
     LimitThreads(static_cast<UInt32>(std::min<UInt64>(ThreadCount(), free / (kPerThread + 1))));
     return static_cast<size_t>(std::clamp<UInt64>(free / ThreadCount() - kPerThread, 1, kMaxFolders));
-}
-
-zarvo_code Extraction::AddEntries(Failure* failure) {
-    UInt64 bytes = 0;
-    for (UInt32 entry = 0; entry < Nodes().size(); ++entry) {
-        const OutputPlan::Verdict verdict = m_Plan.VerdictOf(entry);
-        if (verdict == OutputPlan::kUnwanted || verdict == OutputPlan::kReplaced) continue;
-        Expect(entry);
-        const Node& node = Nodes()[entry];
-        bool isAdded = true;
-        if (verdict == OutputPlan::kRefused || verdict == OutputPlan::kClash) {
-            Failure refusal;
-            m_Plan.SetRefusal(entry, &refusal);
-            SetFailed(entry, refusal);
-        } else if (m_How.dry_run != 0) {
-            SetDone(entry);
-        } else if (verdict == OutputPlan::kFolder || node.size == 0 || IsOutsideData(node)) {
-            isAdded = Data().AddOther(entry);
-        } else {
-            isAdded = Data().AddFile(entry);
-        }
-        if (!isAdded) return failure->SetMemory();
-        if (__builtin_add_overflow(bytes, zarvo_archive::SizeOf(node), &bytes)) bytes = ~UInt64{0};
-    }
-    if (m_How.max_bytes == 0 || bytes <= m_How.max_bytes) return ZARVO_OK;
-    return failure->Set(ZARVO_ERROR_LIMIT, "the files have %llu bytes; the limit (max_bytes) is %llu",
-                        static_cast<unsigned long long>(bytes), static_cast<unsigned long long>(m_How.max_bytes));
 }
 
 // The open folder of an entry's file, and the file's name in the worker's; -1 after a failure.

@@ -3,7 +3,6 @@
 
 #include "Library/ArchiveRun.h"
 #include "Library/OutputFolder.h"
-#include "Library/OutputPlan.h"
 
 class Extraction final : public ArchiveRun {
 public:
@@ -30,8 +29,6 @@ private:
     };
 
     size_t ShareDescriptors();
-    zarvo_code AddEntries(Failure* failure);
-    void Refuse(size_t entry);
 
     void TakeFile(UInt32 worker, UInt32 entry, const UInt8* bytes, UInt64 readable, const Failure* damage) override;
     SharedFile* ShareFile(UInt32 entry, UInt64 size) override;

@@ -55,27 +55,9 @@ void TestRun::TakeDamage(UInt32 blockIndex, UInt64 begin, UInt64 end, const Fail
 }
 
 zarvo_code VisitRun::Visit(Failure* failure) {
-    if (!MakeResults()) return failure->SetMemory();
-    if (const zarvo_code code = m_Plan.Build(Options().wanted, Options().excluded, failure); code != ZARVO_OK)
-        return code;
     Data().KeepOrder();
-    for (UInt32 entry = 0; entry < Nodes().size(); ++entry) {
-        const OutputPlan::Verdict verdict = m_Plan.VerdictOf(entry);
-        if (verdict == OutputPlan::kUnwanted || verdict == OutputPlan::kReplaced) continue;
-        Expect(entry);
-        const Node& node = Nodes()[entry];
-        bool isAdded = true;
-        if (verdict == OutputPlan::kRefused || verdict == OutputPlan::kClash) {
-            Failure refusal;
-            m_Plan.SetRefusal(entry, &refusal);
-            SetFailed(entry, refusal);
-        } else if (verdict == OutputPlan::kFolder || node.size == 0 || IsOutsideData(node)) {
-            isAdded = Data().AddOther(entry);
-        } else {
-            isAdded = Data().AddFile(entry);
-        }
-        if (!isAdded) return failure->SetMemory();
-    }
+    UInt64 bytes = 0;
+    if (const zarvo_code code = AddPlanned(&m_Plan, false, &bytes, failure); code != ZARVO_OK) return code;
     return Run(failure);
 }
 

@@ -2,7 +2,6 @@
 #pragma once
 
 #include "Library/ArchiveRun.h"
-#include "Library/OutputPlan.h"
 
 // Decodes every block, and tells what can't be read.
 class TestRun final : public ArchiveRun {

@@ -1,5 +1,6 @@
 #include "Library/OutputFolder.h"
 
+#include "PlatformDependent/Linux/RepeatOnInterrupt.h"
 #include "Runtime/Allocator/Allocator.h"
 
 #include <algorithm>
@@ -11,14 +12,6 @@
 #include <unistd.h>
 
 namespace {
-
-template <typename Call>
-auto RepeatOnInterrupt(Call&& call) {
-    auto answer = call();
-    while (answer == -1 && errno == EINTR)
-        answer = call();
-    return answer;
-}
 
 constexpr int kFolderFlags = O_PATH | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC;
 

@@ -74,10 +74,14 @@ UInt64 PublicItem(UInt32 item) {
     return item == EntryIndex::kRoot ? ZARVO_ROOT : item;
 }
 
-// The index's number of a caller's item: false when it has none of that number.
-bool FindItem(const EntryIndex& index, UInt64 item, UInt32* found) {
+// The index, and its number of a caller's item; null after a failure.
+const EntryIndex* FindItem(const zarvo_archive* archive, UInt64 item, UInt32* found, Failure* failure) {
+    const EntryIndex* const index = GetIndex(archive, failure);
+    if (index == nullptr) return nullptr;
     *found = item == ZARVO_ROOT ? EntryIndex::kRoot : static_cast<UInt32>(item);
-    return item == ZARVO_ROOT || item < index.ItemCount();
+    if (item == ZARVO_ROOT || item < index->ItemCount()) return index;
+    (void)failure->SetArgument("no such item");
+    return nullptr;
 }
 
 size_t NormalLength(core::string_ref path) {
@@ -191,10 +195,9 @@ zarvo_code zarvo_get_item(const zarvo_archive* archive, uint64_t item, zarvo_ite
     if (!IsLiveHandle(archive)) return RefuseArgument(kNoArchive, error);
     if (out == nullptr) return RefuseArgument(kNoRoom, error);
     Failure failure;
-    const EntryIndex* index = GetIndex(archive, &failure);
-    if (index == nullptr) return Deliver(failure.code, failure, error);
     UInt32 found;
-    if (!FindItem(*index, item, &found)) return RefuseArgument("no such item", error);
+    const EntryIndex* index = FindItem(archive, item, &found, &failure);
+    if (index == nullptr) return Deliver(failure.code, failure, error);
 
     const bool isRoot = found == EntryIndex::kRoot;
     const core::string_ref path = index->Path(found);
@@ -215,10 +218,9 @@ zarvo_code zarvo_get_item_path(const zarvo_archive* archive, uint64_t item, char
     if (!IsLiveHandle(archive)) return RefuseArgument(kNoArchive, error);
     if (out == nullptr) return RefuseArgument(kNoRoom, error);
     Failure failure;
-    const EntryIndex* index = GetIndex(archive, &failure);
-    if (index == nullptr) return Deliver(failure.code, failure, error);
     UInt32 found;
-    if (!FindItem(*index, item, &found)) return RefuseArgument("no such item", error);
+    const EntryIndex* index = FindItem(archive, item, &found, &failure);
+    if (index == nullptr) return Deliver(failure.code, failure, error);
     const core::string_ref path = index->Path(found);
     out[0] = '\0';
     if (!path.empty()) (void)zarvo_normalize_path(path.data(), path.size(), out);

@@ -1,5 +1,6 @@
 #include "Library/Source.h"
 
+#include "PlatformDependent/Linux/RepeatOnInterrupt.h"
 #include "Runtime/Allocator/Allocator.h"
 
 #include <algorithm>
@@ -37,14 +38,6 @@ namespace {
 
 // An archive never takes the place of a standard stream that the program has closed.
 constexpr int kFirstOrdinaryDescriptor = 3;
-
-template <typename Call>
-auto RepeatOnInterrupt(Call&& call) {
-    auto answer = call();
-    while (answer == -1 && errno == EINTR)
-        answer = call();
-    return answer;
-}
 
 // Which file it is, and what changes with its contents.
 struct Stamp {

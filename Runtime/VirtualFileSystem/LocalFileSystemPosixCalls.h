@@ -1,22 +1,13 @@
 // What the files of the POSIX back end, and of the back end that derives from it, share. Private to them.
 #pragma once
 
+#include "PlatformDependent/Linux/RepeatOnInterrupt.h"
 #include "Runtime/VirtualFileSystem/VirtualFileSystemTypes.h"
 
-#include <cerrno>
 #include <sys/stat.h>
 
 constexpr mode_t kNewFileMode = 0666; // before the umask
 constexpr mode_t kModeBits = 07777;   // the part of st_mode that chmod takes
-
-// Repeats call until it ends without -1 and EINTR, which is how it says that a signal interrupted it.
-template <typename Call>
-auto RepeatOnInterrupt(Call call) {
-    auto result = call();
-    while (result == -1 && errno == EINTR)
-        result = call();
-    return result;
-}
 
 // GetStatus follows links; GetLinkStatus describes a link itself. On failure both answer false and set errno.
 inline bool GetStatus(const char* path, struct stat* status) {

@@ -93,7 +93,7 @@ std::string MakeBash() {
            "complete -o default -F _zarvo zarvo\n";
 }
 
-// A specification for each form, such as "'--threads=[threads to use]:N: '".
+// An optspec for each form, such as "'--threads=[threads to use]:N: '".
 std::string MakeZshOption(const Option& option) {
     const std::vector<std::string> forms = GetForms(option);
     const bool takesValue = !option.value.empty();
@@ -107,12 +107,12 @@ std::string MakeZshOption(const Option& option) {
         if (option.kind == ValueKind::kFile) values = "_files";
         text += ':' + std::string(option.value) + ':' + values;
     }
-    std::string specifications;
+    std::string optspecs;
     for (const std::string& form : forms) {
         const char* const mark = form.starts_with("--") ? "=" : "+"; // the value may stand in the same word
-        specifications += " \\\n            '" + form + (takesValue ? mark : "") + text + '\'';
+        optspecs += " \\\n            '" + form + (takesValue ? mark : "") + text + '\'';
     }
-    return specifications;
+    return optspecs;
 }
 
 std::string MakeZsh() {
