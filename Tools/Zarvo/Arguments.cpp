@@ -46,16 +46,44 @@ size_t FindOperand(const Subcommand& subcommand, const std::vector<std::string>&
     return arguments.size();
 }
 
+// Whether an argument that is an option is one of the subcommand's. Letters after one that takes a value are its value.
+bool IsKnown(const Subcommand& subcommand, std::string_view argument) {
+    if (argument.starts_with("--"))
+        return FindOption(subcommand, argument.substr(2, argument.find('=') - 2)) != nullptr;
+    for (const char letter : argument.substr(1)) {
+        const Option* const option = FindOption(subcommand, letter);
+        if (option == nullptr) return false;
+        if (!option->value.empty()) return true;
+    }
+    return true;
+}
+
+// Whether all options before an operand are the subcommand's.
+bool AreKnown(const Subcommand& subcommand, const std::vector<std::string>& arguments, size_t operand) {
+    for (size_t index = 0; index < operand && arguments[index] != "--"; ++index) {
+        if (!IsKnown(subcommand, arguments[index])) return false;
+        if (TakesNext(subcommand, arguments[index])) ++index;
+    }
+    return true;
+}
+
 // Which of two subcommands an option before it belongs to is not known before the subcommand is: "-l" may take a value.
-// So each one is tried: the first operand has to be its name, which is then taken out.
+// So each one is tried: the first operand has to be its name, which is then taken out. One that has all of the options
+// before its name comes first: "-o list extract" extracts into a folder named "list".
 const Subcommand& TakeSubcommand(std::vector<std::string>& arguments) {
+    const Subcommand* taken = &kNoSubcommand;
+    size_t place = 0;
     for (const Subcommand* const subcommand : GetSubcommands()) {
         const size_t index = FindOperand(*subcommand, arguments);
         if (index >= arguments.size() || arguments[index] != subcommand->name) continue;
-        arguments.erase(arguments.begin() + static_cast<std::ptrdiff_t>(index));
-        return *subcommand;
+        const bool areKnown = AreKnown(*subcommand, arguments, index);
+        if (!areKnown && taken != &kNoSubcommand) continue;
+        taken = subcommand;
+        place = index;
+        if (areKnown) break;
     }
-    return kNoSubcommand;
+    if (taken != &kNoSubcommand) arguments.erase(arguments.begin() + static_cast<std::ptrdiff_t>(place));
+    return *taken;
 }
 
 // CLI11 takes "--name=" for an option whose value is the next argument, and gives flags values: so "--name=value"

@@ -27,6 +27,8 @@ TEST_F(ZarvoArguments, StandAnywhere) {
         {{"list", "list", "b,c", "--", "-l"}, "b,c\n-l\n"},
         {{"list", "./-"}, paths},
         {{"list", "-j", "1", "-j", "2", "-qq", "-lll", "list"}, lines},
+        {{"-qo", "list", "extract", "--dry-run", "list"}, paths}, // "list" is -o's value
+        {{"--strip=0", "-qx", "list", "extract", "--dry-run", "list"}, paths},
     };
     for (const auto& [arguments, output] : kCases) {
         SCOPED_TRACE(arguments[0] + " " + arguments[1]);
@@ -50,6 +52,7 @@ TEST_F(ZarvoArguments, ThatMakeNoSenseAreRefusedInALine) {
         {{"list", "-q", "--"}, "zarvo: no archive is named; see 'zarvo list --help'"},
         {{"cat", "a"}, "zarvo: no pattern is given; see 'zarvo cat --help'"},
         {{"info", "-l", "a"}, "zarvo: no such option: '-l'; see 'zarvo info --help'"},
+        {{"-z", "list", "a"}, "zarvo: no such option: '-z'; see 'zarvo list --help'"},
         {{"list", "-lz", "a"}, "zarvo: no such option: '-z'; see 'zarvo list --help'"},
         {{"list", "-!", "a"}, "zarvo: no such option: '-!'; see 'zarvo list --help'"},
         {{"list", "---", "a"}, "zarvo: no such option: '---'; see 'zarvo list --help'"},
