@@ -46,22 +46,25 @@ size_t FindOperand(const Subcommand& subcommand, const std::vector<std::string>&
     return arguments.size();
 }
 
-// Whether an argument that is an option is one of the subcommand's. Letters after one that takes a value are its value.
-bool IsKnown(const Subcommand& subcommand, std::string_view argument) {
-    if (argument.starts_with("--"))
-        return FindOption(subcommand, argument.substr(2, argument.find('=') - 2)) != nullptr;
+// What of an argument that is an option is none of the subcommand's, "-z" of "-lz"; empty where all is. Letters after
+// one that takes a value are its value.
+std::string FindUnknown(const Subcommand& subcommand, const std::string& argument) {
+    if (argument.starts_with("--")) {
+        const std::string_view name = std::string_view(argument).substr(2);
+        return FindOption(subcommand, name.substr(0, name.find('='))) != nullptr ? "" : argument;
+    }
     for (const char letter : argument.substr(1)) {
         const Option* const option = FindOption(subcommand, letter);
-        if (option == nullptr) return false;
-        if (!option->value.empty()) return true;
+        if (option == nullptr) return {'-', letter};
+        if (!option->value.empty()) break;
     }
-    return true;
+    return "";
 }
 
 // Whether all options before an operand are the subcommand's.
 bool AreKnown(const Subcommand& subcommand, const std::vector<std::string>& arguments, size_t operand) {
     for (size_t index = 0; index < operand && arguments[index] != "--"; ++index) {
-        if (!IsKnown(subcommand, arguments[index])) return false;
+        if (!FindUnknown(subcommand, arguments[index]).empty()) return false;
         if (TakesNext(subcommand, arguments[index])) ++index;
     }
     return true;
@@ -96,6 +99,9 @@ std::string SplitAssignments(const Subcommand& subcommand, std::vector<std::stri
             split.insert(split.end(), arguments.begin() + static_cast<std::ptrdiff_t>(index), arguments.end());
             break;
         }
+        // Not left to CLI11, either: it takes the end of "-q-" for "--".
+        const std::string unknown = IsOption(argument) ? FindUnknown(subcommand, argument) : "";
+        if (!unknown.empty()) return MakeMessage("no such option: '%'", {unknown});
         const size_t mark = argument.starts_with("--") ? argument.find('=') : std::string::npos;
         const Option* const option = mark == std::string::npos
                                          ? nullptr
@@ -157,7 +163,7 @@ std::optional<Arguments> Arguments::Parse(const std::vector<std::string>& argume
     if (!complaint->empty()) return std::nullopt;
 
     // Neither operands nor subcommands are CLI11's: it would split an operand "[a,b]", and take an archive named "list"
-    // for a subcommand. What it leaves over are operands, unknown options and the first "--".
+    // for a subcommand. What it leaves over are operands and the first "--".
     CLI::App app;
     app.set_help_flag();
     app.allow_extras();
@@ -180,14 +186,10 @@ std::optional<Arguments> Arguments::Parse(const std::vector<std::string>& argume
 
     bool areOperands = false;
     for (const std::string& left : app.remaining()) {
-        if (!areOperands && left == "--") {
+        if (!areOperands && left == "--")
             areOperands = true;
-        } else if (!areOperands && IsOption(left)) {
-            *complaint = MakeMessage("no such option: '%'", {left});
-            return std::nullopt;
-        } else {
+        else
             parsed.m_Operands.push_back(left);
-        }
     }
     for (const auto& [option, made] : known)
         for (const std::string& value : made->results())

@@ -54,6 +54,7 @@ TEST_F(ZarvoArguments, ThatMakeNoSenseAreRefusedInALine) {
         {{"info", "-l", "a"}, "zarvo: no such option: '-l'; see 'zarvo info --help'"},
         {{"-z", "list", "a"}, "zarvo: no such option: '-z'; see 'zarvo list --help'"},
         {{"list", "-lz", "a"}, "zarvo: no such option: '-z'; see 'zarvo list --help'"},
+        {{"list", "-q-", "a"}, "zarvo: no such option: '--'; see 'zarvo list --help'"},
         {{"list", "-!", "a"}, "zarvo: no such option: '-!'; see 'zarvo list --help'"},
         {{"list", "---", "a"}, "zarvo: no such option: '---'; see 'zarvo list --help'"},
         {{"list", "--js", "a"}, "zarvo: no such option: '--js'; see 'zarvo list --help'"},
