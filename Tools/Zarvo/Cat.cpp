@@ -50,9 +50,10 @@ public:
     }
 
 private:
+    // In whatever form: names are compared by component. Not what stands for everything, which is nothing in an empty
+    // archive.
     static bool IsPlainPath(const std::string& pattern) {
-        return !pattern.empty() && pattern.find_first_of("*?[\\") == std::string::npos &&
-               zarvo::normalize_path(pattern) == pattern;
+        return pattern.find_first_of("*?[\\") == std::string::npos && !zarvo::normalize_path(pattern).empty();
     }
 
     // Appends the files at and below an item.
