@@ -17,27 +17,27 @@
  *     }
  *     zarvo_close(archive);
  *
- * An archive is one stream of bytes, the data, cut into blocks that are stored as they are or compressed, and a
- * directory of entries that name ranges of the data. The library opens all four layouts alike.
+ * An archive holds one stream of bytes, called the data, and a directory. The data is cut into blocks, which are stored
+ * as they are or compressed. Each entry of the directory names a range of the data. All four layouts are opened alike.
  *
- * Threads. One archive may be used by any number of threads at once, and so may functions that take no handle. A
- * zarvo_stream, a zarvo_patterns and a zarvo_error belong to one thread at a time. An archive is closed when no call on
- * it is under way and its streams have been freed. After fork(), parent and child may both go on with an archive that
- * no call was using at that moment.
+ * Threads. Any number of threads may use one archive at once, or call functions that take no handle. A zarvo_stream, a
+ * zarvo_patterns and a zarvo_error belong to one thread at a time. Close an archive only when no call is using it and
+ * its streams have been freed. After fork(), parent and child may both go on using an archive, if no call was using it
+ * at that moment.
  *
- * Errors. What can fail returns a zarvo_code. The last parameter of such a function may be NULL; else it points to a
- * pointer that is NULL, and a failure stores an error there, which the caller frees. Results that a function stores
- * through pointers are unchanged after a failure unless its description says otherwise. A null pointer where an object
- * is needed, and an index past the end, are ZARVO_ERROR_ARGUMENT, never a crash.
+ * Errors. A function that can fail returns a zarvo_code. Where its last parameter is a zarvo_error**, that may be NULL,
+ * or point to a pointer that is NULL: a failure stores an error there, which the caller frees. Results that a function
+ * stores through pointers are unchanged after a failure unless its description says otherwise. A null pointer where an
+ * object is needed, and an index past the end, are ZARVO_ERROR_ARGUMENT, never a crash.
  *
- * Structures begin with struct_size, which the caller sets to sizeof the structure that it was compiled with (the
- * _INIT macros do): a later version of the library adds fields at the end, and leaves those alone that a caller does
- * not know.
+ * Structures begin with struct_size, which the caller sets to the size of the structure that it was compiled with (the
+ * _INIT macros do). Later versions of the library add fields at the end, and neither read nor write fields that lie
+ * past the caller's struct_size.
  *
- * The process. The library writes to no output of the program's, and changes neither its signals, its working
- * directory, its locale nor its environment. Memory that is refused for what an archive or a caller sizes is
- * ZARVO_ERROR_MEMORY; only where the system refuses a few hundred bytes does the process end. Descriptors are opened
- * with O_CLOEXEC. Callbacks must return: neither throw nor jump out.
+ * The process. The library prints nothing, and does not change the process's signals, working directory, locale or
+ * environment. When memory is refused whose amount depends on an archive or a caller, that is ZARVO_ERROR_MEMORY; the
+ * process ends only when the system refuses a few hundred bytes. Descriptors are opened with O_CLOEXEC. Callbacks must
+ * return; they must neither throw nor use longjmp.
  */
 #ifndef ZARVO_H
 #define ZARVO_H
@@ -51,7 +51,7 @@ extern "C" {
 
 #define ZARVO_API __attribute__((visibility("default")))
 
-/* For the length of a text that ends with a NUL. */
+/* As a length: the text ends with a NUL, and the library counts. */
 #define ZARVO_WHOLE ((size_t)-1)
 
 /* The library's version, such as "0.2.0". */
@@ -68,11 +68,11 @@ enum {
     ZARVO_ERROR_NOT_AN_ARCHIVE = 4, /* no archive, a version that is not known, or a damaged header or directory */
     ZARVO_ERROR_DAMAGED = 5,        /* data can't be decoded, ends too early, or lies outside the archive */
     ZARVO_ERROR_UNSUPPORTED = 6,    /* the data needs a kind of compression that is not known */
-    ZARVO_ERROR_LIMIT = 7,          /* a limit of zarvo_open_options was reached */
+    ZARVO_ERROR_LIMIT = 7,          /* a limit that the caller set, or its default, would be exceeded */
     ZARVO_ERROR_CHANGED = 8,        /* the archive's file has changed since it was opened */
     ZARVO_ERROR_NOT_FOUND = 9,      /* no entry has that path */
-    ZARVO_ERROR_STOPPED = 10,       /* the progress callback asked for it */
-    ZARVO_ERROR_REFUSED = 11        /* extraction refuses the entry's path */
+    ZARVO_ERROR_STOPPED = 10,       /* the progress callback stopped the run */
+    ZARVO_ERROR_REFUSED = 11        /* extraction refuses the entry's path, or another entry has its place */
 };
 
 typedef struct zarvo_error zarvo_error;
@@ -80,7 +80,7 @@ typedef struct zarvo_error zarvo_error;
 /* The code that the failed function returned. ZARVO_OK for NULL. */
 ZARVO_API zarvo_code zarvo_error_code(const zarvo_error* error);
 
-/* The errno behind ZARVO_ERROR_SYSTEM, else 0. */
+/* The errno of a ZARVO_ERROR_SYSTEM, or 0. */
 ZARVO_API int zarvo_error_errno(const zarvo_error* error);
 
 /* What went wrong, without a newline, in English, with the system's reason where there is one: "Permission denied". It
@@ -101,7 +101,7 @@ typedef struct zarvo_source {
     void* context;
 
     /* Reads up to size bytes at offset into buffer. Returns how many were read (fewer than size only at the end), or a
-     * negative errno. From several threads at once where the archive is used by several. */
+     * negative errno. Called by several threads at once when several use the archive, or a run uses several. */
     int64_t (*read_at)(void* context, void* buffer, size_t size, uint64_t offset);
 
     /* Stores the number of bytes in *size; called once, when the archive is opened. Returns 0 or a negative errno. */
@@ -120,47 +120,48 @@ typedef struct zarvo_open_options {
     /* Where the archive begins: the first byte of the file, memory or source that belongs to it. Default: 0. */
     uint64_t offset;
 
-    /* Limits, and ZARVO_ERROR_LIMIT where an archive goes beyond. What an error says names the limit. */
+    /* Limits. An archive that exceeds one is ZARVO_ERROR_LIMIT, with a text that says what was exceeded. */
     uint64_t max_entries;         /* entries of the directory. Default: 2^26 */
     uint64_t max_directory_bytes; /* the directory and the list of blocks, decoded. Default: 2^30 */
     uint64_t max_block_bytes; /* decoded bytes of one block held in memory. Blocks that can be decoded piece by piece
                                  (LZMA) or are stored as they are may be larger. Default: 2^31 */
 
-    /* How much memory decoded blocks, and the states of streamed ones, may take while no call uses them. Blocks in use
-     * come on top, and the one that was used last stays in any case. Default: 2^23 */
+    /* How many bytes decoded blocks, and the states of decoders of streamed blocks, may take while no call uses them.
+     * Blocks in use are not counted, and the block that was used last is always kept. Default: 2^23 */
     uint64_t cache_bytes;
 
-    /* Gets what the library has to say about an archive while it goes on, such as "Decompressing this format (7) is not
-     * supported on this platform.": one line without a newline, each once an archive. Called on the thread whose call
-     * found it, before that call returns, with no lock held; also by the functions that open. Default: nobody is told.
-     */
+    /* Receives remarks about an archive that are not a call's error, such as "Decompressing this format (7) is not
+     * supported on this platform.": one line without a newline, and each only once per archive. Called on the thread
+     * whose call made the remark, before that call returns, with no lock held; the functions that open an archive call
+     * it, too. Default: remarks are dropped. */
     void (*log)(void* log_context, const char* message);
     void* log_context;
 } zarvo_open_options;
 #define ZARVO_OPEN_OPTIONS_INIT                                                                                        \
     { sizeof(zarvo_open_options), 0, 0, 0, 0, 0, NULL, NULL }
 
-/* Open an archive and read its header and directory; options may be NULL. *archive is to be closed with zarvo_close.
+/* These functions open an archive, and read its header and directory. options may be NULL. The caller closes *archive
+ * with zarvo_close.
  *
- * path: any length. The file must be one that can be read at any place: a pipe, a socket or a terminal is refused (and
- * a pipe is not waited for). */
+ * path: of any length. The file must be seekable: pipes, sockets and terminals are refused, without waiting for the
+ * other end of a pipe. */
 ZARVO_API zarvo_code zarvo_open_path(const char* path, const zarvo_open_options* options, zarvo_archive** archive,
                                      zarvo_error** error);
 
-/* descriptor: stays the caller's, who may close it as soon as this returns. Its position is neither used nor moved. */
+/* descriptor: still belongs to the caller, who may close it once this returns. Its position is not used or changed. */
 ZARVO_API zarvo_code zarvo_open_descriptor(int descriptor, const zarvo_open_options* options, zarvo_archive** archive,
                                            zarvo_error** error);
 
-/* data: must stay as it is until the archive is closed. */
+/* data: must stay unchanged, and allocated, until the archive is closed. */
 ZARVO_API zarvo_code zarvo_open_memory(const void* data, size_t size, const zarvo_open_options* options,
                                        zarvo_archive** archive, zarvo_error** error);
 
-/* source: copied; its context stays the caller's until close is called. A size that is wrong, or reads that answer
- * differently each time, end in errors or in wrong bytes, and in nothing worse. */
+/* source: copied. Its context must stay valid until its close callback is called, which happens after a failure, too. A
+ * wrong size, or reads that deliver different bytes each time, lead to errors or wrong bytes and to nothing worse. */
 ZARVO_API zarvo_code zarvo_open_source(const zarvo_source* source, const zarvo_open_options* options,
                                        zarvo_archive** archive, zarvo_error** error);
 
-/* Closes an archive and frees all that was handed out of it: texts, too. NULL is allowed. */
+/* Closes an archive. Texts that it handed out are no longer valid. NULL is allowed. */
 ZARVO_API void zarvo_close(zarvo_archive* archive);
 
 /* ---- What an archive is ---------------------------------------------------------------------------------------- */
@@ -176,7 +177,7 @@ typedef struct zarvo_info {
     size_t struct_size;
     int32_t layout;              /* ZARVO_LAYOUT_... */
     uint32_t version;            /* of the layout */
-    const char* engine_version;  /* what wrote the archive. Any bytes but NUL; valid until the archive is closed */
+    const char* engine_version;  /* of the engine that wrote it: any bytes but NUL; valid until the archive is closed */
     const char* engine_revision; /* as above */
     uint64_t recorded_size;      /* of the archive, as its writer recorded it; 0 where it did not */
     uint64_t file_size;          /* of the file, memory or source, from offset on */
@@ -184,8 +185,8 @@ typedef struct zarvo_info {
     uint64_t stored_size;        /* of the data, as the blocks are stored */
     uint64_t block_count;
     uint64_t largest_block;   /* decoded bytes */
-    uint64_t streamed_blocks; /* that can only be decoded from their start on */
-    uint64_t blocks_none;     /* by kind: stored as they are */
+    uint64_t streamed_blocks; /* blocks that can only be decoded from their start on */
+    uint64_t blocks_none;     /* blocks by kind: stored as they are */
     uint64_t blocks_lzma;
     uint64_t blocks_lz4;
     uint64_t blocks_lz4hc;
@@ -230,15 +231,15 @@ ZARVO_API uint64_t zarvo_entry_count(const zarvo_archive* archive);
 
 ZARVO_API zarvo_code zarvo_get_entry(const zarvo_archive* archive, uint64_t index, zarvo_entry* entry);
 
-/* A path has one normal form: "\" is "/", and empty and "." components are dropped. Paths with equal normal forms are
- * one file on disk; of entries with equal ones the last counts. Writes the normal form, NUL-terminated, to out, which
- * has room for length + 1 bytes and may be path itself, and returns its length. */
+/* A path has one normal form: "\" becomes "/", and empty and "." components are dropped. Paths with the same normal
+ * form are the same file on disk; of several entries with the same one, the last counts. Writes the normal form to out,
+ * with a NUL after it, and returns its length. out has room for length + 1 bytes, and may be path itself. */
 ZARVO_API size_t zarvo_normalize_path(const char* path, size_t length, char* out);
 
-/* Items are what a folder can hold: the entries, and after them (from zarvo_entry_count on) the folders that are only
- * implied by paths, such as "road" for "road/of/one.txt". Items are linked into a tree by their normal forms; an entry
- * that a later one replaces, and one with a problem, is in no folder. A function that takes an item builds the tree at
- * its first use. A file with entries below its path has children, too. */
+/* Items are what a folder can hold: the entries, and folders that have no entry but are implied by a path, such as
+ * "road" by "road/of/one.txt". Entries keep their indices; implied folders have the numbers from zarvo_entry_count on.
+ * Items are linked into a tree by their normal forms. An entry that a later one replaces, or that has a problem, is in
+ * no folder. A file has children when entries lie below its path. The first call that needs the tree builds it. */
 #define ZARVO_ROOT UINT64_MAX
 #define ZARVO_NO_ITEM (UINT64_MAX - 1)
 
@@ -248,15 +249,15 @@ typedef struct zarvo_item {
     size_t name_length;    /* bytes; 0 for ZARVO_ROOT */
     int32_t kind;          /* ZARVO_FILE or ZARVO_FOLDER */
     int32_t is_implied;    /* 1: no entry of its own */
-    uint64_t first_child;  /* the first item in it, in the archive's order, or ZARVO_NO_ITEM */
-    uint64_t next_sibling; /* the item after it in the same folder, or ZARVO_NO_ITEM */
+    uint64_t first_child;  /* the first item in this one, in the archive's order, or ZARVO_NO_ITEM */
+    uint64_t next_sibling; /* the next item in the same folder, or ZARVO_NO_ITEM */
     size_t path_length;    /* of the normal form, in bytes */
 } zarvo_item;
 #define ZARVO_ITEM_INIT                                                                                                \
     { sizeof(zarvo_item), NULL, 0, 0, 0, 0, 0, 0 }
 
-/* Finds what a path names, in whatever form: the last entry of equal ones, an implied folder, or ZARVO_ROOT for a path
- * whose normal form is empty. ZARVO_ERROR_NOT_FOUND when there is none. */
+/* Finds the item with the same normal form as path: the last such entry, an implied folder, or ZARVO_ROOT for a path
+ * whose normal form is empty. ZARVO_ERROR_NOT_FOUND when there is no such item. */
 ZARVO_API zarvo_code zarvo_find(const zarvo_archive* archive, const char* path, size_t length, uint64_t* item,
                                 zarvo_error** error);
 
@@ -271,21 +272,21 @@ ZARVO_API uint64_t zarvo_item_count(const zarvo_archive* archive);
 
 /* ---- Reading --------------------------------------------------------------------------------------------------- */
 
-/* Reads up to size bytes of an entry, from byte offset of it on, into buffer, and stores how many in *count: fewer than
- * size at the entry's end, 0 from there on (and always of a folder). After a failure *count says how many bytes before
- * the damage are in the buffer, and 0 where the arguments were refused. Blocks that were decoded are kept in the
- * archive's cache. */
+/* Reads up to size bytes of an entry into buffer, starting at byte offset of the entry, and stores in *count how many
+ * were read: fewer than size only at the entry's end, 0 past it, and always 0 for a folder. After a failure *count says
+ * how many bytes before the damage are in the buffer; it is 0 when the arguments were refused. Compressed blocks
+ * of which only a part is read are kept in the archive's cache. */
 ZARVO_API zarvo_code zarvo_read(zarvo_archive* archive, uint64_t index, uint64_t offset, void* buffer, size_t size,
                                 size_t* count, zarvo_error** error);
 
 /* Stores in *readable how many bytes from an entry's start can be read: its size, unless the archive is damaged.
- * Decodes the blocks of the entry that have not been decoded before. What makes a byte unreadable: no decoder delivers
- * it, or one before it in the same block. ZARVO_OK also for a damaged entry. */
+ * Decodes those blocks of the entry that are not in the cache. A byte can't be read when decoding fails at it, or at a
+ * byte before it in the same block. A damaged entry is ZARVO_OK, too. */
 ZARVO_API zarvo_code zarvo_get_readable(zarvo_archive* archive, uint64_t index, uint64_t* readable,
                                         zarvo_error** error);
 
-/* A file that is read from its start on. It goes on where the last read ended, also inside a block that can only be
- * decoded from its start, however many are open. Frees nothing of the archive's and must be freed before it is closed.
+/* Reads a file from its start on. Each read goes on where the last one ended. Reading on inside a large streamed block
+ * never decodes it from its start again, however many streams are open. Free a stream before its archive is closed.
  */
 typedef struct zarvo_stream zarvo_stream;
 
@@ -296,7 +297,7 @@ ZARVO_API zarvo_code zarvo_stream_open(zarvo_archive* archive, uint64_t index, z
 ZARVO_API zarvo_code zarvo_stream_read(zarvo_stream* stream, void* buffer, size_t size, size_t* count,
                                        zarvo_error** error);
 
-/* Moves the position, to any place. Going back inside a streamed block costs decoding it from its start. */
+/* Sets the position, to any value. Going back inside a streamed block may decode the block again from its start. */
 ZARVO_API zarvo_code zarvo_stream_seek(zarvo_stream* stream, uint64_t position);
 
 /* NULL is allowed. */
@@ -304,7 +305,7 @@ ZARVO_API void zarvo_stream_free(zarvo_stream* stream);
 
 /* ---- Blocks ---------------------------------------------------------------------------------------------------- */
 
-/* For tools that work block by block. Values other than these are met, too. */
+/* For tools that work block by block. Archives may hold other values, too. */
 enum {
     ZARVO_KIND_NONE = 0, /* stored as is */
     ZARVO_KIND_LZMA = 1,
@@ -326,26 +327,27 @@ typedef struct zarvo_block {
 ZARVO_API uint64_t zarvo_block_count(const zarvo_archive* archive);
 ZARVO_API zarvo_code zarvo_get_block(const zarvo_archive* archive, uint64_t index, zarvo_block* block);
 
-/* Decodes a whole block into buffer, which has room for its size (it may be NULL for none), past the cache, and stores
- * in *count how many bytes were delivered: all of them, or, after a failure, those before the damage. */
+/* Decodes a whole block into buffer, which has room for the block's size (and may be NULL if that is 0), and stores in
+ * *count how many bytes were delivered: all, or after a failure those before the damage. The cache does not keep it. */
 ZARVO_API zarvo_code zarvo_read_block(zarvo_archive* archive, uint64_t index, void* buffer, size_t* count,
                                       zarvo_error** error);
 
 /* ---- Patterns -------------------------------------------------------------------------------------------------- */
 
-/* Paths and globs that choose entries. A glob is matched with whole paths: "*", "?" (one character) and "[...]" stop at
- * "/" and take leading dots, "**" takes everything ("**" + "/x" also a top-level "x"), "\" takes the next character as
- * it is. A leading or trailing "/" and a leading "./" change nothing; an empty pattern and "/" are everything. What
- * matches a folder takes all below it, also a folder that is only implied. A pattern is also taken literally; matches
- * add up. */
+/* Paths and globs that choose entries. A glob must match the whole path, or that of a folder above it, even an implied
+ * one: a pattern that matches a folder chooses everything below it. "*" (any characters), "?" (one character) and
+ * "[...]" (one of a set) match leading dots, but never "/". "**" matches anything ("**" + "/x" also a top-level "x").
+ * "\" makes the next character stand for itself. A leading or trailing "/" and a leading "./" change nothing; an empty
+ * pattern and "/" match everything. A pattern also matches the path that equals it. An entry is chosen when any
+ * pattern matches it. */
 typedef struct zarvo_patterns zarvo_patterns;
 
 ZARVO_API zarvo_code zarvo_patterns_new(zarvo_patterns** patterns, zarvo_error** error);
 ZARVO_API zarvo_code zarvo_patterns_add(zarvo_patterns* patterns, const char* pattern, size_t length,
                                         zarvo_error** error);
 
-/* Whether any pattern matches a path, as it is stored or in its normal form: 1 or 0, or -1 when memory is refused.
- * Those that do are remembered as used. */
+/* Whether any pattern matches a path, as it is stored or in its normal form: 1 or 0, or -1 when memory is refused. All
+ * patterns that match are remembered as used. */
 ZARVO_API int zarvo_patterns_match(zarvo_patterns* patterns, const char* path, size_t length);
 
 /* Whether pattern number index, in the order of adding, has matched a path so far: 1 or 0. */
@@ -356,13 +358,13 @@ ZARVO_API void zarvo_patterns_free(zarvo_patterns* patterns);
 
 /* ---- Working on a whole archive ---------------------------------------------------------------------------------- */
 
-/* How far a run is. */
+/* How far a run has come. */
 typedef struct zarvo_progress {
     size_t struct_size;
-    uint64_t bytes;       /* of data that has been dealt with */
-    uint64_t bytes_total; /* that will have been when the run ends */
-    uint64_t files;       /* entries that have been dealt with */
-    uint64_t files_total;
+    uint64_t bytes;       /* bytes of data that the run has finished with */
+    uint64_t bytes_total; /* bytes of data when the run is complete */
+    uint64_t files;       /* entries that have a result */
+    uint64_t files_total; /* entries that will have one */
 } zarvo_progress;
 
 /* What zarvo_extract, zarvo_test and zarvo_visit have in common. A zero, or NULL, asks for the default. The callbacks
@@ -370,14 +372,15 @@ typedef struct zarvo_progress {
 typedef struct zarvo_run_options {
     size_t struct_size;
 
-    uint32_t threads; /* to use. Default: as many as the process has processors. Results never depend on it */
-    uint64_t memory;  /* bytes that decoding may take: fewer threads are used first, then a block that can't be held is
-                         ZARVO_ERROR_LIMIT. Default: half of what the machine has free */
+    uint32_t threads; /* at most. Default: one per processor that the process may use. Results never depend on it */
+    uint64_t memory;  /* bytes that blocks may take while they are decoded, each twice its size. If there is too little
+                         for all threads, fewer work; if for one block, its entries fail with ZARVO_ERROR_LIMIT.
+                         Default: half of the machine's free memory */
 
-    zarvo_patterns* wanted;   /* which entries. Default: all. Must not be in use elsewhere during the call */
-    zarvo_patterns* excluded; /* which of them not. Default: none. As above */
+    zarvo_patterns* wanted;   /* which entries to take. Default: all. Must not be used elsewhere during the call */
+    zarvo_patterns* excluded; /* which of them to leave out. Default: none. As above */
 
-    /* Called ten times a second, and at the end. Anything but 0 stops the run with ZARVO_ERROR_STOPPED. */
+    /* Called ten times a second, and at the end. A result other than 0 stops the run with ZARVO_ERROR_STOPPED. */
     int (*progress)(void* context, const zarvo_progress* progress);
     void* context; /* for all callbacks of the run */
 } zarvo_run_options;
@@ -389,7 +392,7 @@ enum {
     ZARVO_OUTCOME_DONE = 0,   /* put in place */
     ZARVO_OUTCOME_KEPT = 1,   /* what was there was left (ZARVO_OVERWRITE_NEVER) */
     ZARVO_OUTCOME_FAILED = 2, /* see code and text */
-    ZARVO_OUTCOME_BROKEN = 3  /* the same, but what lies before the damage was put in place (keep_broken) */
+    ZARVO_OUTCOME_BROKEN = 3  /* failed, but the bytes before the damage were put in place (keep_broken) */
 };
 typedef struct zarvo_report {
     size_t struct_size;
@@ -409,13 +412,13 @@ enum {
 typedef struct zarvo_extract_options {
     size_t struct_size;
     int32_t overwrite;   /* ZARVO_OVERWRITE_... */
-    int32_t keep_broken; /* 1: of a damaged file, what lies before the damage is put in place, too */
-    int32_t dry_run;     /* 1: nothing is written; what would be is reported */
-    uint64_t strip;      /* components that each path loses at its front; what has no more is left out */
-    uint64_t max_bytes;  /* to write at most: ZARVO_ERROR_LIMIT before anything is written where the files are larger.
+    int32_t keep_broken; /* 1: the bytes of a damaged file before the damage are put in place, too */
+    int32_t dry_run;     /* 1: nothing is written or decoded; entries are reported as if all could be written */
+    uint64_t strip;      /* how many leading components each path loses; entries that have no more are left out */
+    uint64_t max_bytes;  /* of all files together: if they have more, ZARVO_ERROR_LIMIT, and nothing is written.
                             Default: no limit */
 
-    /* Called once for each entry that was wanted and counts, in the archive's order. May be NULL. */
+    /* Called once for each wanted entry that no later one replaces, in the archive's order. May be NULL. */
     void (*report)(void* context, const zarvo_report* report);
 } zarvo_extract_options;
 #define ZARVO_EXTRACT_OPTIONS_INIT                                                                                     \
@@ -424,24 +427,24 @@ typedef struct zarvo_extract_options {
 /* What a run has done. */
 typedef struct zarvo_summary {
     size_t struct_size;
-    uint64_t files;    /* put in place (of a test: looked at) */
+    uint64_t files;    /* put in place (zarvo_test: checked) */
     uint64_t folders;  /* entries that are folders, put in place */
     uint64_t kept;     /* left as they were */
-    uint64_t failures; /* entries that failed, also broken ones (of a test: entries with unreadable bytes) */
-    uint64_t bytes;    /* of the files */
+    uint64_t failures; /* entries that failed, also broken ones (zarvo_test: entries with unreadable bytes) */
+    uint64_t bytes;    /* of these files */
     uint64_t damaged_blocks;
 } zarvo_summary;
 #define ZARVO_SUMMARY_INIT                                                                                             \
     { sizeof(zarvo_summary), 0, 0, 0, 0, 0, 0 }
 
-/* Writes entries below folder, which is made with those above it where it is missing. Nothing is written elsewhere:
- * links below it are not followed, and paths with ".." are refused. A new file gets its name when it is whole, and
- * takes the place of what is there in one step; what is no file or folder there is never opened. Entries that can't
- * both be (a file where a folder has to be): the first in the archive stays, the other fails. Of entries with one path
- * the last is written.
+/* Writes entries below folder, which is made if it is missing, with the folders above it. Nothing is written elsewhere:
+ * links below it are not followed, and paths with ".." are refused. A new file gets its name only when it is whole, and
+ * replaces what is there in one step; links, devices, pipes and sockets in its place are never opened. When two entries
+ * exclude each other (one is a file where the other needs a folder), the first in the archive is written and the other
+ * fails. Of several entries with the same path, the last is written.
  *
- * options and how may be NULL. *summary, which may be NULL, is filled also after a failure. ZARVO_OK also where entries
- * failed: see the summary. A disk that is full or can't be written ends the run with ZARVO_ERROR_SYSTEM.
+ * options, how and summary may be NULL. *summary is filled after a failure, too. Entries that fail do not fail the
+ * call: see the summary. A disk that is full or can't be written ends the run with ZARVO_ERROR_SYSTEM.
  *
  * A program whose file sizes are limited (ulimit -f) should ignore SIGXFSZ, to get an error instead of a signal. */
 ZARVO_API zarvo_code zarvo_extract(zarvo_archive* archive, const char* folder, const zarvo_run_options* options,
@@ -450,38 +453,38 @@ ZARVO_API zarvo_code zarvo_extract(zarvo_archive* archive, const char* folder, c
 typedef struct zarvo_test_options {
     size_t struct_size;
 
-    /* Called for each block that can't be decoded, in order, once all have been tried. May be NULL. */
+    /* Called for each block that can't be decoded, in the blocks' order, after all have been tried. May be NULL. */
     void (*block)(void* context, uint64_t block_index, const char* text);
 
-    /* Called for each entry with bytes that can't be read, in the archive's order, with how many before them can. May
-     * be NULL. */
+    /* Called for each entry with bytes that can't be read, in the archive's order. readable: how many bytes before them
+     * can be read. May be NULL. */
     void (*entry)(void* context, uint64_t index, uint64_t readable);
 } zarvo_test_options;
 #define ZARVO_TEST_OPTIONS_INIT                                                                                        \
     { sizeof(zarvo_test_options), NULL, NULL }
 
-/* Decodes every block once, and writes nothing. The formats hold no checksums: damage that decodes is not seen.
- * Otherwise as zarvo_extract; patterns are not used. */
+/* Decodes every block once, and writes nothing. The formats hold no checksums, so damage that still decodes is not
+ * found. Patterns are not used. Otherwise as zarvo_extract. */
 ZARVO_API zarvo_code zarvo_test(zarvo_archive* archive, const zarvo_run_options* options,
                                 const zarvo_test_options* what, zarvo_summary* summary, zarvo_error** error);
 
 typedef struct zarvo_visit_options {
     size_t struct_size;
-    uint64_t strip; /* as of zarvo_extract_options; which entries count depends on it */
+    uint64_t strip; /* as in zarvo_extract_options: paths may become the same by it, and then the last entry counts */
 
-    /* Called with the bytes of the files that extraction would write, piece by piece: each file's in order, from offset
-     * 0 on, and none after damage. Called by many threads at once, for different files; must not call the library for
-     * this archive's run, nor throw. Empty files have no bytes. */
+    /* Called with the bytes of the files that extraction would write, piece by piece: those of each file in order, from
+     * offset 0 on, and none after damage. Several threads call it at once, for different files. It must not use the
+     * run's patterns. Not called for empty files. */
     void (*bytes)(void* context, uint64_t index, uint64_t offset, const void* bytes, size_t size);
 
-    /* Called once for each entry that extraction would make a report of, in the archive's order; of a file, after its
+    /* Called once for each entry that extraction would report, in the archive's order, and for a file after all its
      * bytes. May be NULL. */
     void (*report)(void* context, const zarvo_report* report);
 } zarvo_visit_options;
 #define ZARVO_VISIT_OPTIONS_INIT                                                                                       \
     { sizeof(zarvo_visit_options), 0, NULL, NULL }
 
-/* Hands the bytes of files to a callback, decoding each block once, in all threads. Otherwise as zarvo_extract. */
+/* Hands the bytes of files to a callback, and decodes each block once. Otherwise as zarvo_extract. */
 ZARVO_API zarvo_code zarvo_visit(zarvo_archive* archive, const zarvo_run_options* options,
                                  const zarvo_visit_options* what, zarvo_summary* summary, zarvo_error** error);
 
