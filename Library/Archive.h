@@ -12,7 +12,7 @@
 struct zarvo_archive : private NonCopyable {
     using Node = ArchiveStorageHeader::Node;
 
-    // Takes source over, which may be null when it could not be opened. options: every field has its value.
+    // Becomes the owner of source. options: with all defaults filled in.
     zarvo_archive(Source* source, const zarvo_open_options& options);
     ~zarvo_archive();
 
@@ -20,7 +20,7 @@ struct zarvo_archive : private NonCopyable {
 
     const EntryIndex::Nodes& Nodes() const { return m_Reader.GetDirectoryInfo().nodes; }
     static bool IsFolder(const Node& node) { return (node.flags & ArchiveStorageHeader::kNodeDirectory) != 0; }
-    // The sum of a file's bytes; a folder has none.
+    // The size of a file; 0 for a folder, whatever is stored.
     static UInt64 SizeOf(const Node& node) { return IsFolder(node) ? 0 : node.size; }
 
     const zarvo_info& Info() const { return m_Info; }
@@ -35,7 +35,7 @@ struct zarvo_archive : private NonCopyable {
     // Builds the index at the first call.
     zarvo_code GetIndex(const EntryIndex** index, Failure* failure);
 
-    // Reads a range of an entry: as zarvo_read.
+    // Reads a range of an entry, as zarvo_read does. kept: see DataReader::Read.
     zarvo_code Read(UInt64 entry, UInt64 offset, void* buffer, size_t size, size_t* count, StreamCursor** kept,
                     Failure* failure);
 

@@ -1,7 +1,8 @@
-// What extraction, tests and visits have in common: how many threads, how much memory, progress, and reports in the
-// archive's order, whatever order the threads work in. An operation derives from it and says what becomes of the bytes.
+// What extraction, tests and visits have in common: the number of threads, the limit of memory, progress, and reports
+// in the archive's order, whatever order the threads work in. Each operation is a subclass, which decides what becomes
+// of the bytes.
 //
-// One thread makes and runs it; what a subclass takes comes from all workers at once.
+// One thread makes and runs it. The subclass's Sink functions are called by all workers at once.
 #pragma once
 
 #include "Library/Archive.h"
@@ -12,11 +13,11 @@
 
 class ArchiveRun : protected DataRun::Sink, private ThreadedWork {
 public:
-    // options: every field, without defaults filled in.
+    // options: as the caller gave them; zeros stand for defaults.
     ArchiveRun(zarvo_archive* archive, const zarvo_run_options& options);
     ~ArchiveRun() override = default;
 
-    // Runs what has been added. The failure that ended it, or ZARVO_OK.
+    // Runs what has been added. Returns the failure that ended the run, or ZARVO_OK.
     zarvo_code Run(Failure* failure);
 
     const zarvo_summary& Summary() const { return m_Summary; }
@@ -31,11 +32,12 @@ protected:
     UInt32 ThreadCount() const { return m_ThreadCount; }
     void LimitThreads(UInt32 count) { m_ThreadCount = std::min(m_ThreadCount, count); } // before Run
 
-    // Builds the plan, and adds what it says is to be written: each entry that counts will have a result. Those that
-    // the plan refuses have theirs at once, and in a dry run all have. *bytes is the sum of their sizes. Before Run.
+    // Builds the plan, and adds to the run what it says is to be written. Every wanted entry that no later one replaces
+    // will have a result; entries that the plan refuses get theirs at once, and so do all others in a dry run. *bytes is
+    // the sum of the sizes of these entries. Call it before Run.
     [[nodiscard]] zarvo_code AddPlanned(OutputPlan* plan, bool isDryRun, UInt64* bytes, Failure* failure);
 
-    // The result of an entry, once. Any thread.
+    // Set the result of an entry, once. Any thread.
     void SetDone(size_t entry);
     void SetKept(size_t entry);
     void SetFailed(size_t entry, const Failure& failure) { SetFailed(entry, failure, kFailed); }
@@ -44,7 +46,7 @@ protected:
     // Called for each result in the archive's order, on the calling thread.
     virtual void Report(const zarvo_report& report) = 0;
 
-    // Whether data beyond an entry's start is outside of the archive's, so that none of it can be read.
+    // Whether an entry starts at or past the end of the archive's data, so that none of its bytes can be read.
     bool IsOutsideData(const Node& node) const { return node.offset >= m_Archive->Info().data_size; }
 
 private:

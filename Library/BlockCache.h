@@ -1,10 +1,10 @@
-// What has been decoded lately: whole blocks, and places inside large streams from which decoding can go on. Files that
-// are read in turns, in small pieces, cost one decoding of each block. Any thread.
+// Keeps what was decoded lately: whole blocks, and cursors, from which decoding of a large stream can go on. Files that
+// are read in turns, in small pieces, then decode each block once. Any thread.
 //
 //   BlockUse use(cache);
 //   if (cache->Acquire(index, &use, failure) == ZARVO_OK) copy out of use.Data()
 //
-// A block's record, states by operations:
+// The states of a block's record, and what operations do in each:
 //
 //              Acquire                         release                         room is needed
 //   filling    waits until it is filled        (its filler's use)              kept
@@ -13,8 +13,9 @@
 //   filled,    one more use                    (not held)                      the least recently used is freed
 //   idle
 //
-// A record keeps what can be read of a damaged block, with the failure. One whose filling found no memory, or could not
-// read the file, is freed with its last use, and the next Acquire tries again.
+// The record of a damaged block keeps the bytes that can be read, and the failure. A record that could not be filled,
+// because memory was refused or the file could not be read, is freed with its last use, and the next Acquire tries
+// again.
 #pragma once
 
 #include "Library/BlockDecoder.h"
@@ -26,7 +27,7 @@ class BlockCache : private NonCopyable {
     struct Record;
 
 public:
-    // What a caller holds of a record. Released when it is destroyed.
+    // A caller's hold on a record, which ends when it is destroyed.
     class Use : private NonCopyable {
     public:
         explicit Use(BlockCache* cache) : m_Cache(cache) {}
@@ -42,25 +43,25 @@ public:
         Record* m_Record = nullptr;
     };
 
-    // decoder outlives the cache. maxIdleBytes: what records and cursors may take while nobody uses them; the one that
-    // was used last stays in any case.
+    // decoder outlives the cache. maxIdleBytes: how much memory records and cursors may take while nobody uses them;
+    // the one that was used last is always kept.
     BlockCache(const BlockDecoder* decoder, UInt64 maxIdleBytes);
     ~BlockCache(); // nobody holds a use or a cursor
 
-    // The whole block, decoded. Of a damaged one *use holds what can be read, and the answer is ZARVO_ERROR_DAMAGED or
-    // _UNSUPPORTED.
+    // Makes *use hold the whole block, decoded. For a damaged block it holds what can be read, and the result is
+    // ZARVO_ERROR_DAMAGED or ZARVO_ERROR_UNSUPPORTED.
     zarvo_code Acquire(UInt32 blockIndex, Use* use, Failure* failure) VARNEX_NO_THREAD_SAFETY_ANALYSIS;
 
-    // Whether the block is here, or being decoded.
+    // Whether the block is in the cache, or is being decoded into it.
     bool Has(UInt32 blockIndex);
 
-    // The idle cursor of the block that is nearest before offset, or a new one; null when memory is refused.
+    // Hands out the block's idle cursor that is nearest before offset, or a new one; null when memory is refused.
     StreamCursor* TakeCursor(UInt32 blockIndex, UInt64 offset);
     // cursor may be null.
     void GiveCursorBack(StreamCursor* cursor);
 
 private:
-    // Beside the pointer, what a look at all of them needs.
+    // A pointer to a record, and next to it the number that searches compare.
     struct Slot {
         UInt32 blockIndex;
         Record* record;
@@ -87,5 +88,5 @@ private:
     dynamic_array<Slot> m_Slots VARNEX_GUARDED_BY(m_Lock);
     dynamic_array<IdleCursor> m_Cursors VARNEX_GUARDED_BY(m_Lock);
     UInt64 m_Bytes VARNEX_GUARDED_BY(m_Lock) = 0; // of listed records and idle cursors
-    UInt64 m_Uses VARNEX_GUARDED_BY(m_Lock) = 0;  // so far: the stamp of the next
+    UInt64 m_Uses VARNEX_GUARDED_BY(m_Lock) = 0;  // counted so far: the next one's lastUse
 };

@@ -1,5 +1,6 @@
-// Decodes the blocks of an archive, past the reader's cache and locks. What can be read of a damaged block is settled
-// here for everybody: the bytes before the first that its decoder does not deliver, however they are asked for.
+// Decodes the blocks of an archive, without the cache and locks of the runtime's reader. It also decides, for the whole
+// library, what can be read of a damaged block: the bytes before the first one that its decoder does not deliver,
+// whichever way they are read.
 //
 //   kind                              decoded
 //   none, or two equal sizes          as they are stored (of a streamed block: kind none alone)
@@ -29,26 +30,26 @@ public:
     Block GetBlock(UInt32 index) const { return m_Reader->GetBlock(index); }
     UInt64 DataSize() const;
 
-    // The block that holds a position below DataSize. Blocks without bytes hold none.
+    // The block that holds a position below DataSize. Never a block without bytes.
     UInt32 FindBlock(UInt64 position) const;
 
     static bool IsStoredAsIs(const Block& block);
 
-    // Whether a block is decoded piece by piece: LZMA that is streamed and large, or larger than may be held in memory.
-    // Smaller streams are decoded whole, as other blocks are, so that reading in them can jump.
+    // Whether a block is decoded piece by piece: a large LZMA stream, or any LZMA block of more than maxBlockBytes.
+    // Smaller streams are decoded whole, like other blocks, so that reads in them may come in any order.
     static bool IsReadInPieces(const Block& block, UInt64 maxBlockBytes);
 
-    // Whether the archive has the byte at an offset of a block that is stored as is.
+    // Whether the source has the byte at an offset of a block that is stored as is, or ends before it.
     bool IsThere(const Block& block, UInt64 offset) const;
 
-    // What decoding a block whole holds of it at a time: its decoded bytes, or its stored ones where they are more.
+    // The larger of a block's decoded size and its stored bytes: decoding it whole takes at most twice as much memory.
     UInt64 BytesToHold(const Block& block) const { return std::max<UInt64>(block.size, StoredBytesThere(block)); }
 
     // Reads bytes [offset, offset + size) of a block that is stored as is. *count is how many are there.
     zarvo_code ReadStoredAsIs(UInt32 index, UInt64 offset, void* out, size_t size, size_t* count,
                               Failure* failure) const;
 
-    // Decodes a whole block into out, which has room for its size. *count is how many bytes can be read, also after a
+    // Decodes a whole block into out, which has room for its size. *count is how many bytes can be read, even after a
     // failure.
     zarvo_code DecodeWhole(UInt32 index, UInt8* out, size_t* count, Failure* failure) const;
 
@@ -69,7 +70,7 @@ private:
     const Source* m_Source;
 };
 
-// The failure of an entry that leaves the data, and that of a block that may not be held in memory.
+// The failure of an entry that lies outside the data, and that of a block too large to be held in memory.
 zarvo_code SetOutsideData(Failure* failure);
 zarvo_code SetTooLarge(UInt32 index, UInt64 bytes, UInt64 maxBlockBytes, Failure* failure);
 
@@ -84,11 +85,11 @@ public:
           m_Skipped(kMemLabelFileSystem) {}
 
     UInt32 BlockIndex() const { return m_BlockIndex; }
-    UInt64 Position() const { return m_Position; } // of the next byte that decoding makes
+    UInt64 Position() const { return m_Position; } // of the next byte to be decoded
     UInt64 MemoryUsed() const { return sizeof(*this) + 2 * kPieceSize + m_Lzma.MemoryUsed(); }
 
-    // Reads bytes [offset, offset + size) of the block, starting it anew where offset lies before Position. *count is
-    // how many can be read, also after a failure.
+    // Reads bytes [offset, offset + size) of the block. Starts the block again if offset is less than Position. *count
+    // is how many bytes can be read, even after a failure.
     zarvo_code Read(UInt64 offset, UInt8* out, size_t size, size_t* count, Failure* failure);
 
 private:
@@ -103,7 +104,7 @@ private:
     const BlockDecoder::Block m_Block;
     LzmaStream m_Lzma;
     bool m_IsStarted = false;
-    bool m_IsBroken = false; // at m_Position
+    bool m_IsBroken = false; // decoding fails at m_Position
     UInt64 m_Position = 0;
     UInt64 m_Loaded = 0; // stored bytes that are or have been in m_Input
     size_t m_InputUsed = 0;

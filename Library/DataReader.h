@@ -1,5 +1,5 @@
-// Reads any range of an archive's data: from the file where it is stored as it is, past the cache where whole blocks
-// are wanted, else through the cache. Any thread.
+// Reads any range of an archive's data. Blocks that are stored as they are come from the source, whole blocks that are
+// not in the cache are decoded into the caller's buffer, and everything else goes through the cache. Any thread.
 #pragma once
 
 #include "Library/BlockCache.h"
@@ -10,9 +10,9 @@ public:
     DataReader(const BlockDecoder* decoder, BlockCache* cache, UInt64 maxBlockBytes)
         : m_Decoder(decoder), m_Cache(cache), m_MaxBlockBytes(maxBlockBytes), m_DataSize(decoder->DataSize()) {}
 
-    // Reads bytes [position, position + size) of the data. *count is how many can be read, also after a failure. kept
-    // is null, or a cursor that the caller keeps between reads (at first null), so that its next read goes on from
-    // there; it is given back to the cache in the end.
+    // Reads bytes [position, position + size) of the data. *count is how many can be read, even after a failure. kept
+    // may be null. Otherwise *kept is a cursor that the caller keeps between reads, at first null, so that the next
+    // read can go on from there; in the end the caller passes it to GiveBack.
     zarvo_code Read(UInt64 position, void* out, size_t size, size_t* count, StreamCursor** kept, Failure* failure);
 
     // Decodes a whole block into out, which has room for it.

@@ -1,19 +1,19 @@
-// Decodes an archive's blocks in all threads, each block once, and hands the files' bytes to a sink while they are in
-// the processor's cache.
+// Decodes an archive's blocks in several threads, each block once, and hands the files' bytes to a sink while they are
+// in the processor's cache.
 //
-// The data is cut into units: a run of whole blocks of about 1 MiB (less for many threads), a piece of that size of
-// data that is stored as it is, or one block that is decoded piece by piece. Data that is stored as it is and lies past
-// the archive's end is one unit a block. A thread takes the next unit, decodes it, and hands over all that lies in it:
-// files that lie in it whole at once, parts of others. Files are looked at in the order of their places, not of the
-// directory, so that nothing is decoded twice however the directory is sorted. A thread that decodes a block piece by
-// piece passes its pieces on to threads that have nothing to do.
+// The data is cut into units. A unit is about 1 MiB of whole blocks or of data that is stored as it is (less for many
+// threads), or one block that is decoded piece by piece. The rest of a block that is stored as it is and lies past the
+// archive's end is a unit, too. A thread takes the next unit, decodes it, and hands over whole files that lie in it and
+// the parts of others. Files are visited in the order of their places in the data, not in that of the directory, so
+// nothing is decoded twice however the directory is sorted. A thread that decodes a block piece by piece passes its
+// pieces on to threads that have nothing to do.
 //
 //   DataRun run(decoder, nodes, maxBlockBytes, threads, &sink);
 //   run.AddFile(entry) ..., or run.AddAllBlocks(); run.AddOther(entry) ...
 //   run.Prepare();
 //   run.Work(worker);   // in each thread, each with a number of its own
 //
-// Work is for any number of threads at once, everything else for one.
+// Any number of threads may call Work at once; everything else is for one thread.
 #pragma once
 
 #include "Library/BlockDecoder.h"
@@ -33,8 +33,8 @@ struct SharedFile : private NonCopyable {
     UInt64 readable VARNEX_GUARDED_BY(lock) = ~UInt64{0}; // bytes before the first damage that has been met
     Failure damage VARNEX_GUARDED_BY(lock);
 
-    // The run's own.
-    UInt64 inOrder = 0; // bytes that have been handed over, where that is done in order
+    // Used by the run only.
+    UInt64 inOrder = 0; // bytes that have been handed over, if the run keeps the order
     size_t liveIndex = 0;
 };
 
@@ -47,16 +47,16 @@ public:
     public:
         virtual ~Sink() = default;
 
-        // A whole file: readable bytes of it, and why there are no more (null: these are all).
+        // A whole file: its readable bytes, and why there are no more (null: these are all).
         virtual void TakeFile(UInt32 worker, UInt32 entry, const UInt8* bytes, UInt64 readable,
                               const Failure* damage) = 0;
 
-        // A file that is shared by several pieces: its state is made, used (its parts come in any order, unless the run
-        // keeps it) and ended, once all parts have come.
+        // A file that lies in several pieces. ShareFile makes its state, TakePart is called for each part (in any
+        // order, unless the run keeps the order), and EndFile after the last part.
         virtual SharedFile* ShareFile(UInt32 entry, UInt64 size) = 0; // null when memory is refused
         virtual void TakePart(UInt32 worker, SharedFile* file, UInt64 offset, const UInt8* bytes, UInt64 size) = 0;
-        virtual void EndFile(UInt32 worker, SharedFile* file) = 0; // and deletes it
-        virtual void DropFile(SharedFile* file) = 0;               // the run was stopped; deletes it
+        virtual void EndFile(UInt32 worker, SharedFile* file) = 0; // deletes the state
+        virtual void DropFile(SharedFile* file) = 0;               // instead, if the run was stopped; deletes it
 
         // An entry that was added without data.
         virtual void TakeOther(UInt32 worker, UInt32 entry) = 0;
@@ -65,11 +65,13 @@ public:
         virtual void TakeDamage(UInt32 blockIndex, UInt64 begin, UInt64 end, const Failure& damage) = 0;
     };
 
-    // All outlive the run. Blocks of more than maxBlockBytes are not decoded whole. threads: that may work.
+    // decoder, nodes and sink outlive the run. Blocks of more than maxBlockBytes are not decoded whole. threads: how
+    // many may call Work.
     DataRun(const BlockDecoder* decoder, const Nodes& nodes, UInt64 maxBlockBytes, UInt32 threads, Sink* sink);
     ~DataRun();
 
-    // Before Prepare. False when memory is refused. A file needs bytes, and its start must lie in the data.
+    // Call these before Prepare. False when memory is refused. AddFile is for files that have bytes and start in the
+    // data.
     [[nodiscard]] bool AddFile(UInt32 entry);
     [[nodiscard]] bool AddOther(UInt32 entry);
     void AddAllBlocks() { m_TakesAllBlocks = true; }
@@ -77,16 +79,16 @@ public:
 
     void Prepare();
 
-    // Works until nothing is left, or the run is stopped.
+    // Works until nothing is left to do, or the run is stopped.
     void Work(UInt32 worker);
     void Stop();
-    void StopFor(const Failure& failure); // which is the FatalFailure unless there is one already
+    void StopFor(const Failure& failure); // which becomes the FatalFailure if there is none yet
     bool IsStopped() const { return m_IsStopped.load(std::memory_order_relaxed); } // a hint: data is under the lock
 
-    // Once all workers are done: drops the files that a stopped run has not ended.
+    // After all workers have ended: drops the files that a stopped run left unfinished.
     void DropUnended();
 
-    // As above: why the run was stopped, unless by the caller.
+    // After all workers have ended: the failure that stopped the run, if one did.
     const Failure& FatalFailure() const { return m_Fatal; }
 
     UInt64 BytesTotal() const { return m_BytesTotal; }

@@ -1,10 +1,11 @@
 // Finds entries by path, and links entries and implied folders into a tree. Built in one go, then only read: any
 // thread.
 //
-// An item is an entry (its number in the directory) or, after the entries, a folder that only paths imply. Of entries
-// with one normal form the last is the item; earlier ones, and entries with a problem, are in no folder.
+// An item is an entry (its number in the directory), or a folder that only paths imply (a number after the entries').
+// Of several entries with the same normal form, the last is found; the others, and entries with a problem, are in no
+// folder.
 //
-// Takes 18 bytes an entry: a slot of the hash table of 8 bytes, filled to four fifths at most, and two links of 4.
+// Takes 18 bytes per entry: a slot of 8 bytes in a hash table that is at most four fifths full, and two links of 4.
 #pragma once
 
 #include "Library/Failure.h"
@@ -22,7 +23,7 @@ public:
     // nodes outlives the index.
     explicit EntryIndex(const Nodes& nodes);
 
-    // Before anything else; once more where memory was refused.
+    // Call this first. When it fails, because memory was refused, it may be called again.
     [[nodiscard]] zarvo_code Build(Failure* failure);
 
     UInt32 ItemCount() const { return static_cast<UInt32>(m_NextSibling.size()); }
@@ -36,11 +37,11 @@ public:
 
     bool IsImplied(UInt32 item) const { return item >= m_Nodes.size(); }
 
-    // A text with the item's normal form, which lies in the directory.
+    // A path that has the item's normal form: part of the directory's texts.
     core::string_ref Path(UInt32 item) const;
 
 private:
-    // A folder of no entry: the start of an entry's path.
+    // A folder without an entry, whose path is the start of an entry's path.
     struct ImpliedFolder {
         UInt32 entry;
         UInt32 length; // of its path; longer paths make no implied folders

@@ -1,5 +1,5 @@
-// Failures of many entries or blocks, in as little memory as their texts take; a text that comes again at once takes
-// none. One thread at a time.
+// Failures of many entries or blocks, in little more memory than their texts take. A failure that is equal to the one
+// before it takes none. One thread at a time.
 #pragma once
 
 #include "Library/Failure.h"
@@ -9,7 +9,7 @@
 
 class FailureList {
 public:
-    // Stores where the failure is kept in *place. False when memory is refused.
+    // Keeps the failure, and stores in *place the number to Get it by. False when memory is refused.
     [[nodiscard]] bool Add(const Failure& failure, UInt32* place) {
         const size_t count = m_Items.size();
         if (count == 0 || !IsLast(failure)) {

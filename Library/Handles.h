@@ -1,5 +1,5 @@
-// The objects that callers hold. In debug builds a pointer that is none of them (closed already, or never opened) is
-// told from one that is, so that its use is an error instead of a crash; otherwise only null is. Any thread.
+// The objects whose pointers callers hold. Debug builds recognise pointers to objects that are closed or never were
+// opened, so that using one is an error instead of a crash; other builds recognise only null. Any thread.
 #pragma once
 
 // Null is never live.

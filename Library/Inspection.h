@@ -14,7 +14,7 @@ private:
     struct Damage {
         UInt32 blockIndex;
         UInt32 failure; // in m_Failures
-        UInt64 begin;   // in the data, of what can't be read of the block
+        UInt64 begin;   // in the data: [begin, end) can't be read
         UInt64 end;
     };
 
@@ -31,7 +31,7 @@ private:
 
     // Under the lock until the run has ended.
     Mutex m_DamageLock;
-    dynamic_array<Damage> m_Damages{kMemLabelFileSystem}; // after the run in the order of their places
+    dynamic_array<Damage> m_Damages{kMemLabelFileSystem}; // after the run, sorted by begin
     FailureList m_Failures;
 };
 

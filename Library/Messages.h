@@ -1,8 +1,8 @@
-// What the runtime reports while the library works (failed checks, kinds of compression that are not supported) on its
-// way to the caller's log function. Reports happen deep inside, also under locks, so they are collected by thread and
-// told when the public call ends, on its thread, with no lock held.
+// Takes what the runtime reports while the library works (failed checks, unsupported kinds of compression) to the
+// caller's log function. Reports may be made while locks are held, so each thread collects its own. They are told when
+// the public call ends, on its thread, with no lock held.
 //
-//   MessageScope scope(&archive->m_Messages);   // first thing in a public call
+//   MessageScope scope(archive->Messages());   // at the start of a public call
 #pragma once
 
 #include "Runtime/Core/Containers/DynamicArray.h"
@@ -30,7 +30,7 @@ private:
     dynamic_array<UInt64> m_Told VARNEX_GUARDED_BY(m_Lock); // hashes
 };
 
-// What a thread that works for a call has collected, on its way to the thread that made the call. Any thread.
+// Hands what the worker threads of a call have collected to the thread that made the call. Any thread.
 class MessageQueue : private NonCopyable {
 public:
     void Add(dynamic_array<core::string>* messages);
@@ -41,11 +41,11 @@ private:
     dynamic_array<core::string> m_Messages VARNEX_GUARDED_BY(m_Lock);
 };
 
-// Collects this thread's reports for a log for the time of a call. Scopes nest: the innermost collects.
+// Collects this thread's reports as long as it exists. Scopes nest: the innermost collects.
 class MessageScope : private NonCopyable {
 public:
-    explicit MessageScope(MessageLog* log);     // tells them at the end
-    explicit MessageScope(MessageQueue* queue); // hands them on at the end
+    explicit MessageScope(MessageLog* log);     // tells them when it is destroyed
+    explicit MessageScope(MessageQueue* queue); // adds them to the queue when it is destroyed
     ~MessageScope();
 
 private:
@@ -57,5 +57,5 @@ private:
     dynamic_array<core::string> m_Collected;
 };
 
-// Takes over the runtime's reports: none reaches the program's output from here on. Called before the runtime is used.
+// Takes over the runtime's reports: from here on, none reaches the program's output. Call it before using the runtime.
 void InstallMessageHook();

@@ -1,16 +1,16 @@
-// Makes files and folders below one folder, and nowhere else, whoever changes the tree meanwhile: each folder is opened
-// from the one above it, and no link is followed.
+// Makes files and folders below one folder, and nowhere else, even if another program changes the tree at the same
+// time: each folder is opened from the one above it, and no link is followed.
 //
 //   OutputFolder output;
 //   output.Open("game_data", failure);
-//   FolderCache folders(&output);              // of one thread
+//   FolderCache folders(&output);              // one per thread
 //   int folder = folders.Get("road/of", failure);
 //   NewFile file;
 //   file.Create(folder, failure), file.Write(0, bytes, size, failure), file.Place(folder, "one.txt", overwrite,
 //   failure)
 //
-// A new file has no name until it is whole (where the file system can do that, else a temporary one beside its place),
-// and takes the place of what is there in one step.
+// A new file has no name until it is whole, or a temporary name in the same folder if the file system can't make files
+// without names. It then replaces what is there in one step.
 #pragma once
 
 #include "Library/Failure.h"
@@ -26,7 +26,7 @@ class OutputFolder : private NonCopyable {
 public:
     ~OutputFolder();
 
-    // Makes the folder, and those above it, where they are missing. path itself may lead over links.
+    // Opens the folder, and makes it and those above it if they are missing. Links in path are followed.
     zarvo_code Open(const char* path, Failure* failure);
 
     int Descriptor() const { return m_Descriptor; }
@@ -35,19 +35,19 @@ private:
     int m_Descriptor = -1;
 };
 
-// The folders that a thread has used lately, open. One thread.
+// Keeps open the folders that a thread has used lately. One thread.
 class FolderCache : private NonCopyable {
 public:
     // Keeps up to maxFolders open, at least 1.
     FolderCache(const OutputFolder* output, size_t maxFolders) : m_Output(output), m_MaxFolders(maxFolders) {}
     ~FolderCache();
 
-    // The descriptor of a folder, which is made with those above it where it is missing; -1 after a failure. It stays
-    // the cache's, and is good until the next call. path in any form, without "..". Folders that are kept open give way
-    // where descriptors run out.
+    // The descriptor of a folder, or -1 after a failure. Makes the folder if it is missing, with those above it. The
+    // descriptor belongs to the cache, and is valid until the next call. path need not be in normal form, but holds no
+    // "..". When descriptors run out, the cache closes other folders.
     int Get(core::string_ref path, Failure* failure);
 
-    // Closes the folders, for whoever finds no descriptor left. Whether there were any.
+    // Closes all folders, to free descriptors. False if none was open.
     bool Close();
 
 private:
@@ -74,7 +74,7 @@ private:
 // Whether the failure is that no descriptor is left.
 bool IsOutOfDescriptors(const Failure& failure);
 
-// Whether the failure is of the disk, so that no other file will fare better: it is full, or can't be written.
+// Whether the disk is full or can't be written, so that other files would fail, too.
 bool IsDiskFailure(const Failure& failure);
 
 // What stands in the place of a file.
@@ -89,16 +89,16 @@ Standing LookAt(int folder, const char* name);
 // One thread at a time.
 class NewFile : private NonCopyable {
 public:
-    ~NewFile(); // what was not placed is gone
+    ~NewFile(); // removes the file if it was not placed
 
     zarvo_code Create(int folder, Failure* failure);
     zarvo_code Write(UInt64 offset, const UInt8* bytes, UInt64 size, Failure* failure);
 
     zarvo_code Cut(UInt64 size, Failure* failure);
 
-    // Gives the file its name in the folder that it was created in. A file, link, device, pipe or socket that is there
-    // is never opened: it is replaced, or, where replaces is false, left alone. The failure is EEXIST then, and another
-    // try may follow.
+    // Gives the file its name in the folder that it was created in. A file, link, device, pipe or socket of that name
+    // is never opened. If replaces is true, it is replaced; otherwise it is left alone, the failure is EEXIST, and
+    // Place may be called again.
     zarvo_code Place(int folder, const char* name, bool replaces, Failure* failure);
 
 private:
@@ -110,5 +110,5 @@ private:
     char m_Name[32] = ""; // the temporary one; empty where the file has none
 };
 
-// A file of no bytes, which is whole at once. The failure is EEXIST where something is there.
+// Makes an empty file. The failure is EEXIST if the name is taken.
 zarvo_code PlaceEmptyFile(int folder, const char* name, Failure* failure);

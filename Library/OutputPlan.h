@@ -1,9 +1,9 @@
-// What extraction makes of each entry, settled before anything is written, so that it depends on the archive alone:
-// which entries are wanted, which are refused, and who gives way to whom. One thread at a time; any number once it is
-// built.
+// Decides what extraction does with each entry: which are wanted, which are refused, and which give way to others. This
+// is settled before anything is written, so it depends on the archive and the options alone. One thread builds the
+// plan; then any thread may use it.
 //
-// Entries whose paths on disk are equal: the last file counts, and the last folder. Entries that can't both be (a file
-// where a folder has to be): the path belongs to whoever comes first in the archive.
+// Of several files with the same path on disk, the last is written, and of several folders the last. When a file is
+// where a folder has to be, the path belongs to the entry that comes first in the archive.
 #pragma once
 
 #include "Library/Failure.h"
@@ -16,7 +16,7 @@ public:
     using Nodes = dynamic_array<ArchiveStorageHeader::Node>;
 
     enum Verdict : UInt8 {
-        kUnwanted, // by a pattern, or without components that strip leaves
+        kUnwanted, // patterns leave it out, or strip leaves no component of its path
         kReplaced, // by a later entry of the same path
         kRefused,  // its path has a problem: see GetPathProblem
         kClash,    // its path belongs to an earlier entry of the other kind
@@ -27,7 +27,7 @@ public:
     // nodes outlives the plan. strip: how many components each path loses at its front.
     OutputPlan(const Nodes& nodes, UInt64 strip) : m_Nodes(nodes), m_Strip(strip) {}
 
-    // wanted and excluded may be null: everything, and nothing.
+    // wanted may be null (everything is), and so may excluded (nothing is).
     [[nodiscard]] zarvo_code Build(zarvo_patterns* wanted, zarvo_patterns* excluded, Failure* failure);
 
     Verdict VerdictOf(size_t entry) const { return m_Verdicts[entry]; }
@@ -35,11 +35,11 @@ public:
     // Why an entry has the verdict kRefused or kClash.
     void SetRefusal(size_t entry, Failure* failure) const;
 
-    // A text whose normal form is the entry's path on disk.
+    // The entry's path on disk, not yet in normal form.
     core::string_ref PathOnDisk(size_t entry) const { return Strip(m_Nodes[entry].path); }
 
 private:
-    // A folder of no entry: the start of an entry's path.
+    // A folder without an entry, whose path is the start of an entry's path.
     struct ImpliedFolder {
         UInt32 entry;
         UInt32 length;

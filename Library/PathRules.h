@@ -1,5 +1,5 @@
-// What a stored path means on disk, in a mount and for equality: its normal form. "\" is "/", and empty and "."
-// components are dropped. Any thread.
+// The normal form of a stored path, by which paths are compared and files are named on disk: "\" becomes "/", and empty
+// and "." components are dropped. Any thread.
 #pragma once
 
 #include "Runtime/Core/Containers/DynamicArray.h"
@@ -27,26 +27,26 @@ private:
     size_t m_End = 0;
 };
 
-// The last component of the normal form: empty when there is none.
+// The last component of the normal form; empty if the normal form is empty.
 core::string_ref LastComponent(core::string_ref path);
 
-// The path without its last component, for another look at it. Not in normal form.
+// The path without its last component. Not in normal form.
 core::string_ref WithoutLastComponent(core::string_ref path);
 
-// Whether two paths have one normal form.
+// Whether two paths have the same normal form.
 bool IsSamePath(core::string_ref a, core::string_ref b);
 
 // Why extraction refuses an entry: ZARVO_PROBLEM_...
 SInt32 GetPathProblem(core::string_ref path, bool isFile);
 
-// The hash of a normal form, component by component: a folder's hash is on the way to those of what it holds. The hash
-// of the root is a seed, which nobody who makes an archive should know.
+// Hashes a normal form component by component: from the hash of a folder and a name, the hash of what has that name in
+// the folder. The hash of the root is a seed, which the makers of archives should not know.
 UInt64 HashComponent(UInt64 folderHash, core::string_ref name);
 
 // The hash of a path's normal form.
 UInt64 HashPath(core::string_ref path, UInt64 seed);
 
-// The hashes of the folders above a path, from the outermost in, and last the path's own. False when memory is refused.
+// The hashes of the folders above a path, the outermost first, and then of the path. False when memory is refused.
 [[nodiscard]] bool HashFolders(core::string_ref path, UInt64 seed, dynamic_array<UInt64>* hashes);
 
 // A seed for such hashes that differs from run to run.

@@ -1,7 +1,8 @@
-// A hash table that finds items by the normal form of their paths. It holds numbers of items only: whoever owns it says
-// which path an item has. A slot takes 8 bytes, and at most four fifths of the slots are used.
+// A hash table that finds items by the normal form of their paths. It holds only the items' numbers; its owner passes a
+// callable pathOf, core::string_ref(UInt32 item), that knows their paths. A slot takes 8 bytes, and at most four fifths
+// of the slots are used.
 //
-// pathOf is a callable, core::string_ref(UInt32 item). One thread at a time; any number for looks only.
+// One thread at a time; any number of threads may call Get at once.
 #pragma once
 
 #include "Library/PathRules.h"
@@ -11,7 +12,7 @@ class PathTable {
 public:
     static constexpr UInt32 kNoItem = ~UInt32{0};
 
-    // Makes room for count items. What is in the table stays; where Find found it does not.
+    // Makes room for count items, and keeps those in the table. Pointers that Find returned are no longer valid.
     [[nodiscard]] bool Reserve(size_t count) {
         const size_t wanted = count + count / 4 + 8;
         if (wanted <= m_Slots.size()) return true;
@@ -27,8 +28,8 @@ public:
 
     void Clear() { m_Slots = dynamic_array<Slot>(kMemLabelFileSystem); }
 
-    // Where the item with that path is; where there is none, kNoItem, in whose place it may be put. The table must have
-    // room.
+    // Points to the number of the item with that path. If there is no such item, it points to kNoItem in a free slot,
+    // where the caller may store the item's number. The table must have room.
     template <typename PathOf>
     UInt32* Find(UInt64 hash, core::string_ref path, PathOf&& pathOf) {
         Slot& slot = m_Slots[IndexOf(hash, path, pathOf)];
@@ -48,11 +49,11 @@ private:
         UInt32 item;
     };
 
-    // As far into the table as the hash is into its range.
+    // The slot that is as far into the table as the hash is into its range.
     size_t StartOf(UInt32 hash) const { return static_cast<size_t>((UInt64{hash} * m_Slots.size()) >> 32); }
     size_t Next(size_t index) const { return index + 1 == m_Slots.size() ? 0 : index + 1; }
 
-    // Of the slot with the path's item, or of the first free one on the way to it.
+    // The index of the slot with the path's item, or of the free slot where the search for it ends.
     template <typename PathOf>
     size_t IndexOf(UInt64 hash, core::string_ref path, PathOf&& pathOf) const {
         const UInt32 shortHash = static_cast<UInt32>(hash);

@@ -1,5 +1,5 @@
-// What a caller wants of an archive: paths and globs. Literal paths are looked up by hash, so that thousands of them
-// cost one look-up for each component of a path. One thread at a time.
+// Paths and globs that choose entries. Literal paths are looked up by hash: even with thousands of them, matching a
+// path costs one look-up for each of its components. One thread at a time.
 #pragma once
 
 #include "Library/Failure.h"
@@ -22,9 +22,9 @@ private:
     struct Pattern {
         explicit Pattern(MemLabelId label) : text(label) {}
 
-        core::string text; // without what changes nothing at its ends
+        core::string text; // without leading and trailing characters that change nothing
         bool isUsed = false;
-        UInt32 nextEqual = kNone; // the one added before that names the same path
+        UInt32 nextEqual = kNone; // an earlier pattern that names the same path
     };
 
     UInt32* FindSlot(UInt64 hash, core::string_ref path);

@@ -6,7 +6,8 @@
 #include <algorithm>
 #include <cstring>
 
-// Structures of an older caller are shorter than ours, those of a newer one longer: what both know is copied.
+// Structures of an older caller are shorter than ours, those of a newer one longer: only fields that both have are
+// copied.
 template <typename T>
 T CopyIn(const T* given) {
     T copy = {};

@@ -1,5 +1,5 @@
-// Where an archive's bytes come from: a file, memory or a caller's callbacks, all read at a position, by any number of
-// threads at once and without a shared position. Byte 0 is the archive's first byte.
+// Where an archive's bytes come from: a file, memory or a caller's callbacks. Each read names its position, so any
+// number of threads may read at once. Position 0 is the archive's first byte.
 #pragma once
 
 #include "Library/Failure.h"
@@ -19,11 +19,11 @@ public:
     // Bytes from the archive's start to the source's end, as they were when it was opened.
     UInt64 Size() const { return m_Size; }
 
-    // Whether this is the file that the bytes come from.
+    // Whether the bytes come from this file.
     virtual bool IsFile(dev_t, ino_t) const { return false; }
 
 protected:
-    // A single read at a position of the whole source, inside its size: some bytes, 0 at its end, or a failure.
+    // A single read at a position of the whole source, inside its size. *count: how many bytes; 0 if it ends there.
     virtual zarvo_code ReadSome(UInt64 position, void* buffer, size_t size, size_t* count, Failure* failure) const = 0;
 
     // Called after each ReadAt: whether the source is still what was opened.
@@ -37,7 +37,7 @@ private:
     UInt64 m_Size = 0;
 };
 
-// Each opens a source under kMemLabelFileSystem, for Delete.
+// Each opens a source, which the caller frees: Delete(source, kMemLabelFileSystem).
 zarvo_code OpenPath(const char* path, UInt64 offset, Source** source, Failure* failure);
 zarvo_code OpenDescriptor(int descriptor, UInt64 offset, Source** source, Failure* failure);
 zarvo_code OpenMemory(const void* data, size_t size, UInt64 offset, Source** source, Failure* failure);

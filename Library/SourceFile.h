@@ -1,4 +1,4 @@
-// A source as the open file that the runtime's reader sets up over. Read only. One thread at a time.
+// Presents a source as an open file, read only, for the runtime's reader. One thread at a time.
 #pragma once
 
 #include "Library/Source.h"
@@ -9,13 +9,13 @@ public:
     // source outlives the file.
     explicit SourceFile(const Source* source) : m_Source(source) {}
 
-    // Why reads failed, where they did: the reader only tells that they did.
+    // Why the first read that failed did so; the reader only tells that one did. ZARVO_OK if none failed.
     const Failure& FirstFailure() const { return m_Failure; }
 
     bool IsOpen() const override { return true; }
     bool Close() override { return true; }
 
-    // As of a file on disk: false where nothing could be read.
+    // As with a file on disk: false when nothing could be read.
     bool Read(VFS::FileSize position, UInt64 size, void* buffer, UInt64* actual, FileReadFlags flags) override;
     bool Read(UInt64 size, void* buffer, UInt64* actual, FileReadFlags flags) override;
 

@@ -1,4 +1,5 @@
-// Threads that live inside one call, with all signals blocked, so that the program's handlers run on its own threads.
+// Threads that end before the call that starts them returns. They block all signals, so that the program's signal
+// handlers run on its own threads.
 #pragma once
 
 #include "Runtime/Core/Types.h"
@@ -6,18 +7,18 @@
 // How many threads the process may use at once, by the processors that it may run on.
 UInt32 ProcessorCount();
 
-// Work that is done by several threads while the calling one looks on.
+// Work that several threads do while the calling thread watches.
 class ThreadedWork {
 public:
     virtual ~ThreadedWork() = default;
 
-    // In each thread, which have the numbers from 0 on.
+    // Called in each thread, with its number, from 0 on.
     virtual void Work(UInt32 number) = 0;
 
-    // In the calling thread, until count threads have worked.
+    // Called in the calling thread; returns when count threads have ended their Work.
     virtual void Watch(UInt32 count) = 0;
 };
 
-// Returns when all has ended. Fewer threads than count work where the system refuses more; where it refuses all, the
-// calling one works, and watches then.
+// Returns when all threads have ended. When the system refuses threads, fewer than count work; when it refuses all, the
+// calling thread does the work and then watches.
 void RunOnThreads(UInt32 count, ThreadedWork* work);

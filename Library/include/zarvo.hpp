@@ -1,16 +1,16 @@
 // SPDX-License-Identifier: MIT
-// libzarvo for C++20, on top of zarvo.h, which is the manual: the same operations with owners and ranges. Header only.
+// libzarvo for C++20: the operations of zarvo.h, which is the manual, with owning objects and ranges. Header only.
 //
 //     auto archive = zarvo::archive::open("game.zarvo");
 //     if (!archive) return fail(archive.error().text());
 //     for (const zarvo::entry entry : archive->entries())
 //         if (entry.is_file()) use(entry.path(), entry.size());
 //
-// Nothing of it throws, and programs without exceptions may use it. Where there are exceptions, one that leaves a
-// callback (a source, a log function, one of a run) is caught before it can reach the library, and is thrown again when
-// the call that met it returns; a source that throws has failed to read, and a run whose callback throws is stopped.
+// The wrapper throws nothing of its own, and can be used without exceptions. An exception that a callback throws (of a
+// source, a log or a run) is caught before it reaches the library, and thrown again when the call that ran the callback
+// returns. To the library, a source that throws has failed to read; a run whose callback throws is stopped.
 //
-// Threads: as zarvo.h says of the handles. Views of texts are valid until their archive is destroyed.
+// Threads: as for the handles of zarvo.h. Views of texts are valid until their archive is destroyed.
 #pragma once
 
 #include "zarvo.h"
@@ -30,7 +30,7 @@
 
 namespace zarvo {
 
-// Why an operation failed; false when it did not.
+// Why an operation failed. As a bool: whether it failed.
 class error {
 public:
     error() = default;
@@ -51,7 +51,7 @@ private:
     zarvo_error* m_Error = nullptr;
 };
 
-// A value, or why there is none. The value may be asked for when the result is true.
+// A value, or the error that came instead. Only a result that is true has a value.
 template <typename T>
 class [[nodiscard]] result {
 public:
@@ -77,7 +77,7 @@ namespace detail {
 // The exception of a callback, on its way past the library. Programs without exceptions never have one.
 inline thread_local std::exception_ptr pending;
 
-// Calls what a caller handed in; failed is the answer when it throws.
+// Calls a caller's function, and returns its result, or failed when it throws.
 template <typename Call, typename Answer>
 Answer guard(Call&& call, Answer failed) noexcept {
 #if defined(__cpp_exceptions)
@@ -99,7 +99,8 @@ inline void rethrow() {
 #endif
 }
 
-// Makes a call whose last parameter receives the error, and answers that error. Rethrow once the results are owned.
+// Makes a call whose last parameter receives the error, and returns that error. Callers first give the results an
+// owner, then call rethrow.
 template <typename Call>
 error check(Call&& call) {
     zarvo_error* failure = nullptr;
@@ -109,16 +110,17 @@ error check(Call&& call) {
 
 } // namespace detail
 
-// Where the bytes of an archive come from when the library does not read them itself. Both operations may be called
-// from several threads at once where the archive is used by several.
+// Where the bytes of an archive come from when the library does not read them itself. Several threads may call read_at
+// at once when several use the archive, or a run uses several.
 class source {
 public:
     virtual ~source() = default;
 
-    // Reads at most buffer.size() bytes at offset: how many (fewer only at the end), or a negative errno.
+    // Reads up to buffer.size() bytes at offset. Returns how many were read (fewer only at the end), or a negative
+    // errno.
     virtual int64_t read_at(std::span<std::byte> buffer, uint64_t offset) = 0;
 
-    // How many bytes there are, or why that can't be told, as a negative errno.
+    // The number of bytes, or a negative errno. Called once, when the archive is opened.
     virtual int64_t size() = 0;
 };
 
@@ -202,7 +204,7 @@ private:
     const zarvo_archive* m_Archive;
 };
 
-// What a read delivered. Bytes that lie before damage are delivered although there is an error.
+// What a read delivered. With an error, count is the number of bytes before the damage.
 struct [[nodiscard]] read_result {
     size_t count = 0;
     zarvo::error error;
@@ -290,7 +292,7 @@ struct visit_options {
     std::function<void(const zarvo_report& report)> report = {};
 };
 
-// What a run has done, also one that failed.
+// What a run has done, even if it failed.
 struct [[nodiscard]] run_result {
     zarvo_summary summary = ZARVO_SUMMARY_INIT;
     zarvo::error error;
@@ -298,8 +300,8 @@ struct [[nodiscard]] run_result {
 
 namespace detail {
 
-// What a run calls back. Once something of it has thrown, in whatever thread, nothing is called any more, and the run
-// stops when it next tells its progress.
+// The callbacks of a run. Once one of them has thrown, on any thread, none is called again, and the run stops when it
+// next reports progress.
 template <typename Options>
 class run_callbacks {
 public:
@@ -357,7 +359,7 @@ private:
     const run_options& m_Options;
     const Options& m_Own;
     std::atomic<bool> m_HasThrown = false;
-    std::exception_ptr m_Exception; // the first one's, for after the run
+    std::exception_ptr m_Exception; // the first that was thrown; thrown again after the run
 };
 
 } // namespace detail
