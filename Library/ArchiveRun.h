@@ -33,8 +33,8 @@ protected:
     void LimitThreads(UInt32 count) { m_ThreadCount = std::min(m_ThreadCount, count); } // before Run
 
     // Builds the plan, and adds to the run what it says is to be written. Every wanted entry that no later one replaces
-    // will have a result; entries that the plan refuses get theirs at once, and so do all others in a dry run. *bytes is
-    // the sum of the sizes of these entries. Call it before Run.
+    // will have a result; entries that the plan refuses get theirs at once, and so do all others in a dry run. *bytes
+    // is the sum of the sizes of these entries. Call it before Run.
     [[nodiscard]] zarvo_code AddPlanned(OutputPlan* plan, bool isDryRun, UInt64* bytes, Failure* failure);
 
     // Set the result of an entry, once. Any thread.

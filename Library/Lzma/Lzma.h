@@ -23,11 +23,11 @@
 //   kUnsupported   nothing                                          start with other properties
 //   kNoMemory      nothing                                          start again
 //
-// Damage is found as soon as the symbol that shows it has been read whole: a distance to before the first byte or
-// beyond the dictionary, an end mark that is not where the encoder's last byte is, a first byte that is not 0. Other
-// damage yields other bytes. How many bytes come before damage does not depend on the pieces.
+// Damage is found as soon as the symbol that shows it has been read whole: a distance that leads before the first byte
+// or beyond the dictionary, an end mark that is not where the encoder's last byte is, a first byte that is not 0. Other
+// damage yields wrong bytes. How many bytes come before damage does not depend on the pieces.
 //
-// Nothing is allocated but by the caller's functions, and nothing throws. Any thread; a stream is one thread's at a
+// Memory comes only from the caller's functions, and nothing throws. Any thread; a stream belongs to one thread at a
 // time.
 #pragma once
 
@@ -42,7 +42,7 @@ constexpr size_t kPropertiesSize = 5;
 
 enum [[nodiscard]] Result : int{
     kRoomFilled,  kMayBeEnded, kEnded, kNeedsInput, kDamaged,
-    kUnsupported, // the properties are of no LZMA stream
+    kUnsupported, // no LZMA stream has these properties
     kNoMemory,
 };
 
@@ -54,7 +54,8 @@ enum Finish : int {
 enum History : int {
     // The stream keeps a dictionary of the size that the properties name, which may be 4 GiB. Output goes anywhere.
     kHistoryOwn,
-    // All output lies in one piece of memory, each call's behind the last one's, and is left as it is until the end.
+    // All output goes to one piece of memory, each call's right after the last one's, and the caller does not change it
+    // before the stream ends.
     kHistoryInOutput,
 };
 
@@ -71,8 +72,9 @@ struct Answer {
 };
 
 // Decodes until the room is full or an end mark is met, whichever comes first; the properties are not counted as input.
-// Input that ends before both is answered kNeedsInput, with what it holds whole symbols of. Allocates 2 bytes for each
-// of 2,052 + 768 * 2^(lc + lp) probabilities: 16 KB for the usual 3 and 0, 6.3 MB at most.
+// If the input ends before either, the result is kNeedsInput, and what its whole symbols decode to is produced.
+// Allocates 2 bytes for each of 2,052 + 768 * 2^(lc + lp) probabilities: 16 KB for the usual lc = 3 and lp = 0, 6.3 MB
+// at most.
 Answer DecodeBlock(const void* properties, const void* input, size_t inputSize, void* output, size_t room,
                    const Memory& memory);
 

@@ -3,7 +3,7 @@
 //
 // The window is the caller's output as a whole, or a ring of our own. The ring is a little larger than the dictionary,
 // so that a wide copy, which writes up to kWideCopy - 1 bytes more than it should, spoils only what is too far back to
-// be reached; and the memory goes on for as many bytes behind its end.
+// be reached. The memory goes on for as many bytes after the ring's end.
 #include "Library/Lzma/Lzma.h"
 
 #include <algorithm>
