@@ -6,6 +6,7 @@
 #include "PlatformDependent/OSX/StringConversions.h"
 #include "Runtime/Allocator/Allocator.h"
 #include "Runtime/Core/Containers/DynamicArray.h"
+#include "Runtime/Utilities/FixedReports.h"
 #include "Runtime/Utilities/LogAssert.h"
 #include "Runtime/VirtualFileSystem/LocalFileSystemPosixCalls.h"
 #include "Runtime/VirtualFileSystem/VirtualFileSystem.h"
@@ -94,13 +95,10 @@ Record ReadRecord(const UInt8* bytes, size_t size) {
 void ReportMissingAttributes(const Record& record) {
     const UInt32 common = record.returned.commonattr;
     if (record.name.empty()) // also when the reference leads out of the record
-        Report("Assertion failed on expression: 'entry.returned.commonattr & ATTR_CMN_NAME'");
-    if (!(common & ATTR_CMN_OBJTYPE))
-        Report("Assertion failed on expression: 'entry.returned.commonattr & ATTR_CMN_OBJTYPE'");
-    if (!(common & ATTR_CMN_MODTIME))
-        Report("Assertion failed on expression: 'entry.returned.commonattr & ATTR_CMN_MODTIME'");
-    if (!(common & ATTR_CMN_FLAGS))
-        Report("Assertion failed on expression: 'entry.returned.commonattr & ATTR_CMN_FLAGS'");
+        Report(FixedReports::kListingHasNoName);
+    if (!(common & ATTR_CMN_OBJTYPE)) Report(FixedReports::kListingHasNoType);
+    if (!(common & ATTR_CMN_MODTIME)) Report(FixedReports::kListingHasNoTime);
+    if (!(common & ATTR_CMN_FLAGS)) Report(FixedReports::kListingHasNoFlags);
 }
 
 // A link to a folder counts as a folder; a link whose target has no status does not.
@@ -112,9 +110,9 @@ bool IsFolder(const Record& record, const char* path) {
 
 void AddSize(const Record& record, void** handlerData) {
     const bool hasSize = (record.returned.fileattr & ATTR_FILE_TOTALSIZE) != 0;
-    if (!hasSize) Report("Assertion failed on expression: 'entry.returned.fileattr & ATTR_FILE_TOTALSIZE'");
+    if (!hasSize) Report(FixedReports::kListingHasNoSize);
     if (handlerData == nullptr || *handlerData == nullptr)
-        Report("Assertion failed on expression: 'handlerData != NULL'");
+        Report(FixedReports::kSumHasNoCounter);
     else
         *static_cast<UInt64*>(*handlerData) += static_cast<UInt64>(record.totalSize); // 0 without the attribute
 }

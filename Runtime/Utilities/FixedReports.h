@@ -55,5 +55,28 @@ inline constexpr FixedReport kCastOfNegative = {
 // Texts of checks that report at the caller's place.
 inline constexpr char kArraySizeWraps[] = "Assertion failed on expression: 'newSize > m_size'";
 inline constexpr char kArrayTooLong[] = "Assertion failed on expression: 'm_size < max_size()'";
+inline constexpr char kListingHasNoName[] =
+    "Assertion failed on expression: 'entry.returned.commonattr & ATTR_CMN_NAME'";
+inline constexpr char kListingHasNoType[] =
+    "Assertion failed on expression: 'entry.returned.commonattr & ATTR_CMN_OBJTYPE'";
+inline constexpr char kListingHasNoTime[] =
+    "Assertion failed on expression: 'entry.returned.commonattr & ATTR_CMN_MODTIME'";
+inline constexpr char kListingHasNoFlags[] =
+    "Assertion failed on expression: 'entry.returned.commonattr & ATTR_CMN_FLAGS'";
+inline constexpr char kListingHasNoSize[] =
+    "Assertion failed on expression: 'entry.returned.fileattr & ATTR_FILE_TOTALSIZE'";
+inline constexpr char kSumHasNoCounter[] = "Assertion failed on expression: 'handlerData != NULL'";
+inline constexpr char kUnknownCompressionType[] = "Assertion failed on expression: 't < kCompressionCount'";
+inline constexpr char kClaimedStreamHasReaders[] =
+    "Assertion failed on expression: 'AtomicCompareExchange(&block->bufferReaders, 0, 0)'";
+inline constexpr char kChunkHasData[] =
+    "Assertion failed on expression: 'cachedBlock->blockOffset == 0 && cachedBlock->buffer.size() == 0'";
+inline constexpr char kReadOutsideBlock[] =
+    "Assertion failed on expression: 'm_UncompressedBlocksOffsets[blockInd] <= from.Cast<UInt64>() + dstPos && "
+    "m_UncompressedBlocksOffsets[blockInd] + uncompressedBlockSize >= from.Cast<UInt64>() + dstPos'";
+inline constexpr char kBatchReadTooEarly[] = "Assertion failed on expression: 'position >= m_StartPos'";
+inline constexpr char kBatchReadTooFar[] = "Assertion failed on expression: 'position + size <= m_EndPos'";
+inline constexpr char kBatchCopyOutsideWindow[] = "Assertion failed on expression: 'curPosition >= m_LoadedWindowStart "
+                                                  "&& curPosition + readSize <= m_LoadedWindowEnd'";
 
 } // namespace FixedReports

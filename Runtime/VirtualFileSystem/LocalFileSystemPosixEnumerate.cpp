@@ -1,5 +1,6 @@
 // The POSIX back end's listing of folders.
 #include "Runtime/Allocator/Allocator.h"
+#include "Runtime/Utilities/FixedReports.h"
 #include "Runtime/Utilities/LogAssert.h"
 #include "Runtime/VirtualFileSystem/LocalFileSystemPosix.h"
 #include "Runtime/VirtualFileSystem/LocalFileSystemPosixCalls.h"
@@ -91,8 +92,7 @@ void Describe(FileEntryInfo& info, string_ref path, const struct stat* status, b
 
 void AddSize(void** handlerData, UInt64 size) {
     const bool hasCounter = handlerData != nullptr && *handlerData != nullptr;
-    if (Check(hasCounter, "Assertion failed on expression: 'handlerData != NULL'"))
-        *static_cast<UInt64*>(*handlerData) += size;
+    if (Check(hasCounter, FixedReports::kSumHasNoCounter)) *static_cast<UInt64*>(*handlerData) += size;
 }
 
 } // namespace

@@ -1,6 +1,7 @@
 // The block cache: records that hold decompressed data, who may use them, and how they are filled.
 #include "Runtime/Threads/Thread.h"
 #include "Runtime/Utilities/Compression/Lz4Decompressor.h"
+#include "Runtime/Utilities/FixedReports.h"
 #include "Runtime/Utilities/LogAssert.h"
 #include "Runtime/VirtualFileSystem/ArchiveFileSystem/BatchingFileReader.h"
 #include "Runtime/VirtualFileSystem/ArchiveFileSystem/CachedBlock.h"
@@ -13,7 +14,7 @@ using namespace ArchiveStorageHeader;
 constexpr double kFillPollSeconds = 0.01;
 
 IDecompressor* ArchiveStorageReader::GetDecompressor(CompressionType type) {
-    if (!Check(type < kCompressionCount, "Assertion failed on expression: 't < kCompressionCount'")) return nullptr;
+    if (!Check(type < kCompressionCount, FixedReports::kUnknownCompressionType)) return nullptr;
     std::atomic<IDecompressor*>& slot = m_Decompressors[type];
     IDecompressor* decompressor = slot.load(std::memory_order_acquire); // sees what its maker wrote
     if (decompressor != nullptr) return decompressor;
@@ -56,8 +57,7 @@ ArchiveStorageReader::CachedBlock* ArchiveStorageReader::AcquireCachedBlock(UInt
     m_CacheLock.Lock();
     CachedBlock* found = isStreamed ? ClaimStream(blockIndex, offsetInBlock) : FindChunk(blockIndex);
     if (found != nullptr && isStreamed) {
-        Check(!found->HasReaders(),
-              "Assertion failed on expression: 'AtomicCompareExchange(&block->bufferReaders, 0, 0)'");
+        Check(!found->HasReaders(), FixedReports::kClaimedStreamHasReaders);
         found->AddReader();
     } else if (found != nullptr) {
         // Count in first, so that nobody points the record at another block while this thread waits for its filler.
@@ -331,8 +331,7 @@ ArchiveStorageReader::CacheResult ArchiveStorageReader::FillChunkCachedBlock(Cac
     const UInt64 storedStart = m_CompressedBlocksOffsets[block->blockIndex];
     const IDecompressor* decompressor = GetDecompressor(GetBlockType(block->blockIndex));
     if (decompressor == nullptr) return kCacheResultDecompressError;
-    Check(block->blockOffset == 0 && block->buffer.empty(),
-          "Assertion failed on expression: 'cachedBlock->blockOffset == 0 && cachedBlock->buffer.size() == 0'");
+    Check(block->blockOffset == 0 && block->buffer.empty(), FixedReports::kChunkHasData);
 
     const bool isStoredAsIs = stored.compressedSize == stored.uncompressedSize;
     dynamic_array<UInt8>& loaded = isStoredAsIs ? block->buffer : block->compressedBuffer;

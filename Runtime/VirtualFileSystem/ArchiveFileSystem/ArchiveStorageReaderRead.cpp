@@ -1,4 +1,5 @@
 // Reads of the data stream: which blocks a range touches, and how the bytes of each reach the caller.
+#include "Runtime/Utilities/FixedReports.h"
 #include "Runtime/Utilities/LogAssert.h"
 #include "Runtime/VirtualFileSystem/ArchiveFileSystem/BatchingFileReader.h"
 #include "Runtime/VirtualFileSystem/ArchiveFileSystem/CachedBlock.h"
@@ -48,8 +49,7 @@ bool ArchiveStorageReader::Read(VFS::FileSize fromPosition, UInt64 size, void* b
         const UInt64 blockStart = m_UncompressedBlocksOffsets[index];
         const UInt64 blockSize = m_BlocksInfo.storageBlocks[index].uncompressedSize;
         Check(blockStart <= from + delivered && blockStart + blockSize >= from + delivered,
-              "Assertion failed on expression: 'm_UncompressedBlocksOffsets[blockInd] <= from.Cast<UInt64>() + dstPos "
-              "&& m_UncompressedBlocksOffsets[blockInd] + uncompressedBlockSize >= from.Cast<UInt64>() + dstPos'");
+              FixedReports::kReadOutsideBlock);
         const UInt64 offsetInBlock = index == start ? from - blockStart : 0;
         const UInt64 amount = std::min(size - delivered, blockSize - offsetInBlock);
         UInt64 got = 0;

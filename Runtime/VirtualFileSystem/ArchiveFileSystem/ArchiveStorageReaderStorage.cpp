@@ -1,4 +1,5 @@
 // Stored bytes: the archive's file, who uses it, and how its bytes reach one call of Read.
+#include "Runtime/Utilities/FixedReports.h"
 #include "Runtime/Utilities/Format.h"
 #include "Runtime/Utilities/LogAssert.h"
 #include "Runtime/VirtualFileSystem/ArchiveFileSystem/BatchingFileReader.h"
@@ -92,9 +93,8 @@ ArchiveStorageReader::BatchingFileReader::BatchingFileReader(Storage* storage, U
 
 bool ArchiveStorageReader::BatchingFileReader::Read(void* destination, UInt64 position, UInt64 size,
                                                     UInt64* delivered) {
-    Check(position >= m_StartPos, "Assertion failed on expression: 'position >= m_StartPos'");
-    Check(position <= m_EndPos && size <= m_EndPos - position,
-          "Assertion failed on expression: 'position + size <= m_EndPos'");
+    Check(position >= m_StartPos, FixedReports::kBatchReadTooEarly);
+    Check(position <= m_EndPos && size <= m_EndPos - position, FixedReports::kBatchReadTooFar);
     // A window would hold nothing beyond the rest of the wanted bytes.
     const bool isAllThatIsLeft = size != 0 && position >= m_LoadedWindowEnd && size == m_WantedEnd - position;
     if (m_BatchSize <= size || m_LoadedWindowStart > position || isAllThatIsLeft)
@@ -116,8 +116,7 @@ bool ArchiveStorageReader::BatchingFileReader::Read(void* destination, UInt64 po
         }
         const UInt64 count = std::min(remaining, m_LoadedWindowEnd - current);
         Check(current >= m_LoadedWindowStart && current + count <= m_LoadedWindowEnd,
-              "Assertion failed on expression: 'curPosition >= m_LoadedWindowStart && curPosition + readSize <= "
-              "m_LoadedWindowEnd'");
+              FixedReports::kBatchCopyOutsideWindow);
         memcpy(static_cast<UInt8*>(destination) + (current - position),
                m_Buffer.data() + (current - m_LoadedWindowStart), static_cast<size_t>(count));
         current += count;
