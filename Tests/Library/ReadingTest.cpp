@@ -110,6 +110,24 @@ TEST(Reading, FilesReadInTurnsShareTheCache) {
     }
 }
 
+// One file of a large archive costs the directory, and the stored bytes of its own blocks.
+TEST(Reading, OneFileCostsItsOwnBlocks) {
+    const std::string text = SampleText(30'000);
+    ArchiveDescription description{.chunkSize = 50'000, .type = kCompressionLz4};
+    for (int number = 0; number < 300; ++number)
+        description.entries.push_back({.path = std::to_string(number), .bytes = text});
+    const BuiltArchive built = BuildArchive(description);
+    constexpr uint64_t kReadAhead = 16'384; // of whoever parses the directory
+    auto source = std::make_unique<CountingSource>(built.bytes);
+    CountingSource& counts = *source;
+    zarvo::archive archive = *zarvo::archive::open(std::move(source));
+    EXPECT_LE(counts.bytesRead.load(), 2 * (built.dataOffset + kReadAhead));
+    counts.bytesRead = 0;
+    EXPECT_EQ(Delivered{text}, Read(archive, 151, 0, text.size()));
+    // The file lies across the border of two blocks.
+    EXPECT_EQ(archive.block(90).stored_size + archive.block(91).stored_size, counts.bytesRead.load());
+}
+
 // However many streams are open in one large block, each goes on where it was.
 TEST(Reading, OpenStreamsKeepTheirPlaces) {
     const std::string text = SampleText(3'000'000);
