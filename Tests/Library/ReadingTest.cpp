@@ -230,11 +230,13 @@ TEST(Reading, DamageIsWhereNoDecoderDelivers) {
             pieces += piece.bytes;
         pieces += piece.bytes;
         EXPECT_EQ(expected.bytes.size(), pieces.size());
+        EXPECT_EQ(true, expected.bytes == pieces);
         EXPECT_EQ(ZARVO_ERROR_DAMAGED, piece.code);
 
         std::string block(text.size(), '?');
         const zarvo::read_result whole = archive.read_block(0, std::as_writable_bytes(std::span(block)));
         EXPECT_EQ(readable, whole.count);
+        EXPECT_EQ(true, expected.bytes == block.substr(0, whole.count));
         EXPECT_EQ(ZARVO_ERROR_DAMAGED, whole.error.code());
     }
 }
