@@ -4,9 +4,9 @@
 #include "Tools/Zarvo/Text.h"
 
 #include <algorithm>
+#include <compare>
 #include <functional>
 #include <span>
-#include <unordered_map>
 #include <utility>
 
 namespace {
@@ -16,20 +16,17 @@ class FileFinder {
 public:
     explicit FileFinder(const zarvo::archive& archive) : m_Archive(archive) {
         for (const zarvo::entry entry : archive.entries())
-            if (entry.problem() != ZARVO_PROBLEM_NONE) {
-                m_Problems.push_back(entry.index());
-                m_LastProblem[zarvo::normalize_path(entry.path())] = entry.index();
-            }
+            if (entry.problem() != ZARVO_PROBLEM_NONE)
+                m_Problems.push_back({zarvo::normalize_path(entry.path()), entry.index()});
+        std::sort(m_Problems.begin(), m_Problems.end());
     }
 
     // Appends the indices of the files that one pattern chooses, in the archive's order. *isMatched says whether it has
     // matched anything; unchanged where not.
     zarvo::error Find(const std::string& pattern, std::vector<uint64_t>& files, bool* isMatched) const {
         const size_t before = files.size();
-        zarvo::patterns matcher;
-        if (zarvo::error error = matcher.add(pattern)) return error;
         // A path without globs is looked up, so that many of them don't cost a walk over all entries each. What the
-        // tree of items does not hold is matched.
+        // tree of items does not hold is looked up in order.
         if (IsPlainPath(pattern)) {
             if (zarvo::result<uint64_t> item = m_Archive.find(pattern)) {
                 *isMatched = true;
@@ -37,9 +34,12 @@ public:
             } else if (item.error().code() != ZARVO_ERROR_NOT_FOUND) {
                 return std::move(item).error();
             }
-            for (const uint64_t index : m_Problems)
-                if (zarvo::error error = Match(matcher, m_Archive.entries()[index], files, isMatched)) return error;
+            const std::string path = zarvo::normalize_path(pattern);
+            CollectProblems(path, path + '\0', files, isMatched);
+            CollectProblems(path + '/', path + char('/' + 1), files, isMatched);
         } else {
+            zarvo::patterns matcher;
+            if (zarvo::error error = matcher.add(pattern)) return error;
             for (const zarvo::entry entry : m_Archive.entries())
                 if (zarvo::error error = Match(matcher, entry, files, isMatched)) return error;
         }
@@ -75,13 +75,33 @@ private:
         return {};
     }
 
+    // An entry with a problem, which is in no folder.
+    struct Problem {
+        std::string path; // in normal form
+        uint64_t index;
+
+        auto operator<=>(const Problem&) const = default;
+    };
+
+    // Appends the files among the problems whose paths are from one text on and before another.
+    void CollectProblems(const std::string& from, const std::string& to, std::vector<uint64_t>& files,
+                         bool* isMatched) const {
+        const auto end = std::lower_bound(m_Problems.begin(), m_Problems.end(), Problem{to, 0});
+        for (auto at = std::lower_bound(m_Problems.begin(), end, Problem{from, 0}); at != end; ++at) {
+            *isMatched = true;
+            const bool isLast = at + 1 == m_Problems.end() || (at + 1)->path != at->path;
+            if (isLast && m_Archive.entries()[at->index].is_file()) files.push_back(at->index);
+        }
+    }
+
     zarvo::error Match(zarvo::patterns& matcher, const zarvo::entry& entry, std::vector<uint64_t>& files,
                        bool* isMatched) const {
         if (!matcher.match(entry.path())) return {};
         *isMatched = true;
         if (!entry.is_file()) return {};
         if (entry.problem() != ZARVO_PROBLEM_NONE) {
-            files.push_back(m_LastProblem.at(zarvo::normalize_path(entry.path())));
+            const Problem after = {zarvo::normalize_path(entry.path()), UINT64_MAX};
+            files.push_back((std::lower_bound(m_Problems.begin(), m_Problems.end(), after) - 1)->index);
             return {};
         }
         zarvo::result<uint64_t> last = m_Archive.find(entry.path());
@@ -91,8 +111,7 @@ private:
     }
 
     const zarvo::archive& m_Archive;
-    std::vector<uint64_t> m_Problems; // of entries with a problem, which are in no folder, the indices
-    std::unordered_map<std::string, uint64_t> m_LastProblem; // of them, by normal form
+    std::vector<Problem> m_Problems; // sorted
 };
 
 // Why there is no file of this name, or an empty text.
