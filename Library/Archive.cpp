@@ -23,8 +23,10 @@ zarvo_archive::~zarvo_archive() {
 }
 
 zarvo_code zarvo_archive::Open(Failure* failure) {
+    const UInt64 refusedBefore = CountRefusedRequests();
     const zarvo_code code = SetUp(failure);
-    // The reader does not say why the file failed, and may take a failed read for the file's end.
+    // The reader does not say what it has failed for: memory, or the file, whose failure it may take for its end.
+    if (code == ZARVO_ERROR_NOT_AN_ARCHIVE && CountRefusedRequests() != refusedBefore) return failure->SetMemory();
     if (m_File.FirstFailure().code != ZARVO_OK) *failure = m_File.FirstFailure();
     if (code != ZARVO_OK || failure->code != ZARVO_OK) return failure->code;
     if (Nodes().size() > m_Options.max_entries)

@@ -50,7 +50,7 @@ ArchiveRun::ArchiveRun(zarvo_archive* archive, const zarvo_run_options& options)
       m_ThreadCount(CountThreads(archive, options, MemoryOf(options), m_MaxBlockBytes)),
       m_Data(&archive->Blocks(), archive->Nodes(), m_MaxBlockBytes, m_ThreadCount, this) {}
 
-zarvo_code ArchiveRun::AddPlanned(OutputPlan* plan, bool isDryRun, UInt64* bytes, Failure* failure) {
+zarvo_code ArchiveRun::Plan(OutputPlan* plan, UInt64* bytes, Failure* failure) {
     if (!m_States.resize_uninitialized(Nodes().size(), kResizeExact)) return failure->SetMemory();
     if (!m_States.empty()) memset(m_States.data(), kNoResult, m_States.size());
     if (const zarvo_code code = plan->Build(m_Options.wanted, m_Options.excluded, failure); code != ZARVO_OK)
@@ -60,21 +60,29 @@ zarvo_code ArchiveRun::AddPlanned(OutputPlan* plan, bool isDryRun, UInt64* bytes
         const OutputPlan::Verdict verdict = plan->VerdictOf(entry);
         if (verdict == OutputPlan::kUnwanted || verdict == OutputPlan::kReplaced) continue;
         SetState(entry, kPending);
+        if (__builtin_add_overflow(*bytes, zarvo_archive::SizeOf(Nodes()[entry]), bytes)) *bytes = ~UInt64{0};
+    }
+    return ZARVO_OK;
+}
+
+zarvo_code ArchiveRun::AddPlanned(const OutputPlan& plan, Failure* failure) {
+    for (UInt32 entry = 0; entry < Nodes().size(); ++entry) {
+        if (GetState(entry) != kPending) continue;
+        const OutputPlan::Verdict verdict = plan.VerdictOf(entry);
         const Node& node = Nodes()[entry];
         bool isAdded = true;
         if (verdict == OutputPlan::kRefused || verdict == OutputPlan::kClash) {
             Failure refusal;
-            plan->SetRefusal(entry, &refusal);
+            plan.SetRefusal(entry, &refusal);
             SetFailed(entry, refusal);
-        } else if (isDryRun) {
-            SetDone(entry);
+        } else if (verdict == OutputPlan::kFile && IsSettledBefore(entry)) {
+            continue;
         } else if (verdict == OutputPlan::kFolder || node.size == 0 || IsOutsideData(node)) {
             isAdded = m_Data.AddOther(entry);
         } else {
             isAdded = m_Data.AddFile(entry);
         }
         if (!isAdded) return failure->SetMemory();
-        if (__builtin_add_overflow(*bytes, zarvo_archive::SizeOf(node), bytes)) *bytes = ~UInt64{0};
     }
     return ZARVO_OK;
 }
@@ -91,12 +99,12 @@ ArchiveRun::State ArchiveRun::GetState(size_t entry) {
 
 void ArchiveRun::SetDone(size_t entry) {
     SetState(entry, kDone);
-    m_Results.fetch_add(1, std::memory_order_relaxed); // for progress only
+    Count(1);
 }
 
 void ArchiveRun::SetKept(size_t entry) {
     SetState(entry, kKept);
-    m_Results.fetch_add(1, std::memory_order_relaxed); // for progress only
+    Count(1);
 }
 
 void ArchiveRun::SetFailed(size_t entry, const Failure& failure, State state) {
@@ -113,7 +121,7 @@ void ArchiveRun::SetFailed(size_t entry, const Failure& failure, State state) {
         return;
     }
     SetState(entry, state);
-    m_Results.fetch_add(1, std::memory_order_relaxed); // for progress only
+    Count(1);
 }
 
 zarvo_code ArchiveRun::Run(Failure* failure) {
@@ -124,6 +132,7 @@ zarvo_code ArchiveRun::Run(Failure* failure) {
     (void)TellProgress(); // too late to stop anything
     m_Messages.TellAll(m_Archive->Messages());
     if (m_Data.FatalFailure().code != ZARVO_OK) {
+        m_Summary.failures = m_Expected - m_Summary.files - m_Summary.folders - m_Summary.kept;
         *failure = m_Data.FatalFailure();
         return failure->code;
     }
@@ -140,15 +149,32 @@ void ArchiveRun::Work(UInt32 number) {
     m_HasEnded.notify_one();
 }
 
+void ArchiveRun::WorkAlone() {
+    m_IsAlone = true;
+    Work(0);
+}
+
+void ArchiveRun::BetweenFiles() {
+    if (!m_IsAlone) return;
+    const Clock::time_point now = Clock::now();
+    if (now - m_LastLook < kProgressInterval) return;
+    m_LastLook = now;
+    Look();
+}
+
+// Tells what there is to tell meanwhile, on the calling thread.
+void ArchiveRun::Look() {
+    TellReports(false);
+    if (TellProgress()) return;
+    m_IsStopped = true;
+    m_Data.Stop();
+}
+
 void ArchiveRun::Watch(UInt32 count) {
     std::unique_lock lock(m_Lock);
     while (!m_HasEnded.wait_for(lock, kProgressInterval, [&] { return m_Ended == count; })) {
         lock.unlock();
-        TellReports(false);
-        if (!TellProgress()) {
-            m_IsStopped = true;
-            m_Data.Stop();
-        }
+        Look();
         lock.lock();
     }
 }

@@ -11,6 +11,8 @@
 #include "Library/OutputPlan.h"
 #include "Library/Threads.h"
 
+#include <chrono>
+
 class ArchiveRun : protected DataRun::Sink, private ThreadedWork {
 public:
     // options: as the caller gave them; zeros stand for defaults.
@@ -32,10 +34,23 @@ protected:
     UInt32 ThreadCount() const { return m_ThreadCount; }
     void LimitThreads(UInt32 count) { m_ThreadCount = std::min(m_ThreadCount, count); } // before Run
 
-    // Builds the plan, and adds to the run what it says is to be written. Every wanted entry that no later one replaces
-    // will have a result; entries that the plan refuses get theirs at once, and so do all others in a dry run. *bytes
-    // is the sum of the sizes of these entries. Call it before Run.
-    [[nodiscard]] zarvo_code AddPlanned(OutputPlan* plan, bool isDryRun, UInt64* bytes, Failure* failure);
+    // Builds the plan. Every wanted entry that no later one replaces will have a result. *bytes is the sum of the sizes
+    // of these entries.
+    [[nodiscard]] zarvo_code Plan(OutputPlan* plan, UInt64* bytes, Failure* failure);
+
+    // Adds to the run what the plan says is to be written; entries that it refuses get their results at once. Call it
+    // after Plan and before Run.
+    [[nodiscard]] zarvo_code AddPlanned(const OutputPlan& plan, Failure* failure);
+
+    // Whether a file's result is known, and set, before its bytes are. Called by AddPlanned.
+    virtual bool IsSettledBefore(UInt32) { return false; }
+
+    // The run will not begin: none of the entries is done.
+    void SetAllFailed() { m_Summary.failures = m_Expected; }
+
+    // How many entries will have a result, and have one, for progress alone.
+    void Expect(UInt64 count) { m_Expected += count; }
+    void Count(UInt64 count) { m_Results.fetch_add(count, std::memory_order_relaxed); }
 
     // Set the result of an entry, once. Any thread.
     void SetDone(size_t entry);
@@ -51,9 +66,13 @@ protected:
 
 private:
     enum State : UInt8 { kNoResult, kPending, kDone, kKept, kFailed, kBroken };
+    using Clock = std::chrono::steady_clock;
 
     void Work(UInt32 number) override;
     void Watch(UInt32 count) override;
+    void WorkAlone() override;
+    void BetweenFiles() final;
+    void Look();
     void TellReports(bool areAllWorkersDone);
     bool TellProgress(); // false: to be stopped
     void SetState(size_t entry, State state);
@@ -68,6 +87,8 @@ private:
     MessageQueue m_Messages;
     zarvo_summary m_Summary = ZARVO_SUMMARY_INIT;
     bool m_IsStopped = false; // by the caller
+    bool m_IsAlone = false;   // the calling thread does the work
+    Clock::time_point m_LastLook = Clock::now();
 
     dynamic_array<UInt8> m_States{kMemLabelFileSystem}; // State; written and read by atomic references
     size_t m_Reported = 0;                              // entries whose results have been told

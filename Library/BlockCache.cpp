@@ -23,7 +23,7 @@ struct BlockCache::Record {
 
 BlockCache::Use::~Use() { m_Cache->Release(m_Record); }
 const UInt8* BlockCache::Use::Data() const { return m_Record->data.data(); }
-size_t BlockCache::Use::Readable() const { return m_Record->readable; }
+size_t BlockCache::Use::Readable() const { return m_Record != nullptr ? m_Record->readable : 0; }
 
 BlockCache::BlockCache(const BlockDecoder* decoder, UInt64 maxIdleBytes)
     : m_Decoder(decoder), m_MaxIdleBytes(maxIdleBytes), m_Slots(kMemLabelFileSystem), m_Cursors(kMemLabelFileSystem) {}
@@ -88,7 +88,7 @@ void BlockCache::Fill(Record* record) {
         (void)record->failure.SetMemory();
     if (code == ZARVO_OK || code == ZARVO_ERROR_DAMAGED || code == ZARVO_ERROR_UNSUPPORTED) return;
     // Another time may be luckier.
-    record->readable = 0;
+    if (code != ZARVO_ERROR_SYSTEM) record->readable = 0;
     Mutex::AutoLock lock(m_Lock);
     Unlist(record);
 }

@@ -14,8 +14,8 @@
 //   idle
 //
 // The record of a damaged block keeps the bytes that can be read, and the failure. A record that could not be filled,
-// because memory was refused or the file could not be read, is freed with its last use, and the next Acquire tries
-// again.
+// because memory was refused or the file could not be read to its end, is freed with its last use, and the next Acquire
+// tries again.
 #pragma once
 
 #include "Library/BlockDecoder.h"
@@ -34,7 +34,7 @@ public:
         ~Use();
 
         const UInt8* Data() const;
-        size_t Readable() const; // bytes from the block's start
+        size_t Readable() const; // bytes from the block's start; 0 while nothing is held
 
     private:
         friend class BlockCache;
@@ -48,8 +48,7 @@ public:
     BlockCache(const BlockDecoder* decoder, UInt64 maxIdleBytes);
     ~BlockCache(); // nobody holds a use or a cursor
 
-    // Makes *use hold the whole block, decoded. For a damaged block it holds what can be read, and the result is
-    // ZARVO_ERROR_DAMAGED or ZARVO_ERROR_UNSUPPORTED.
+    // Makes *use hold the whole block, decoded. After a failure it holds what can be read.
     zarvo_code Acquire(UInt32 blockIndex, Use* use, Failure* failure) VARNEX_NO_THREAD_SAFETY_ANALYSIS;
 
     // Whether the block is in the cache, or is being decoded into it.

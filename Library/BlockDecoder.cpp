@@ -5,6 +5,7 @@
 #include "Runtime/Utilities/Compression/Lz4Decompressor.h"
 
 #include <algorithm>
+#include <cstdio>
 
 using Block = BlockDecoder::Block;
 
@@ -12,13 +13,19 @@ static zarvo_code SetDamaged(UInt32 index, const char* why, Failure* failure) {
     return failure->Set(ZARVO_ERROR_DAMAGED, "block %u %s", index, why);
 }
 
+static zarvo_code NameBlock(UInt32 index, Failure* failure) {
+    char name[32];
+    (void)snprintf(name, sizeof(name), "block %u", index);
+    return failure->code == ZARVO_ERROR_SYSTEM ? failure->SetSystem(failure->systemCode, name) : failure->code;
+}
+
 zarvo_code SetOutsideData(Failure* failure) {
     return failure->Set(ZARVO_ERROR_DAMAGED, "lies outside the archive's data");
 }
 
-zarvo_code SetTooLarge(UInt32 index, UInt64 bytes, UInt64 maxBlockBytes, Failure* failure) {
-    return failure->Set(ZARVO_ERROR_LIMIT, "block %u takes %llu bytes of memory, and the limit is %llu", index,
-                        static_cast<unsigned long long>(bytes), static_cast<unsigned long long>(maxBlockBytes));
+zarvo_code SetTooLarge(UInt32 index, UInt64 bytes, Failure* failure) {
+    return failure->Set(ZARVO_ERROR_LIMIT, "block %u of %llu bytes is too large to be held in memory", index,
+                        static_cast<unsigned long long>(bytes));
 }
 
 static bool HasLz4(const Block& block) { return block.type == kCompressionLz4 || block.type == kCompressionLz4HC; }
@@ -65,9 +72,10 @@ UInt64 BlockDecoder::StoredBytesThere(const Block& block) const {
     return std::min<UInt64>(block.storedSize, start < m_Source->Size() ? m_Source->Size() - start : 0);
 }
 
-zarvo_code BlockDecoder::ReadStored(const Block& block, UInt64 from, void* out, size_t size, size_t* count,
+zarvo_code BlockDecoder::ReadStored(UInt32 index, UInt64 from, void* out, size_t size, size_t* count,
                                     Failure* failure) const {
     *count = 0;
+    const Block block = GetBlock(index);
     for (const Block::Piece& piece : block.pieces) {
         if (from >= piece.size) {
             from -= piece.size;
@@ -76,9 +84,9 @@ zarvo_code BlockDecoder::ReadStored(const Block& block, UInt64 from, void* out, 
         const size_t wanted = static_cast<size_t>(std::min<UInt64>(size - *count, piece.size - from));
         size_t got = 0;
         const zarvo_code code =
-            m_Source->ReadAt(piece.offset + from, static_cast<UInt8*>(out) + *count, wanted, &got, failure);
-        if (code != ZARVO_OK) return code;
+            m_Source->ReadBeforeDamage(piece.offset + from, static_cast<UInt8*>(out) + *count, wanted, &got, failure);
         *count += got;
+        if (code != ZARVO_OK) return NameBlock(index, failure);
         if (got < wanted || *count == size) break;
         from = 0;
     }
@@ -88,12 +96,14 @@ zarvo_code BlockDecoder::ReadStored(const Block& block, UInt64 from, void* out, 
 zarvo_code BlockDecoder::ReadStoredAsIs(UInt32 index, UInt64 offset, void* out, size_t size, size_t* count,
                                         Failure* failure) const {
     // As many bytes as the block has decoded, whatever its stored size says.
-    const zarvo_code code = m_Source->ReadAt(GetBlock(index).pieces[0].offset + offset, out, size, count, failure);
-    if (code != ZARVO_OK) {
-        *count = 0;
-        return code;
-    }
+    const UInt64 position = GetBlock(index).pieces[0].offset + offset;
+    if (m_Source->ReadBeforeDamage(position, out, size, count, failure) != ZARVO_OK) return NameBlock(index, failure);
     return *count == size ? ZARVO_OK : SetDamaged(index, "ends after the archive's last byte", failure);
+}
+
+UInt64 BlockDecoder::FindEndOfDamage(UInt32 index, UInt64 offset, UInt64 end) const {
+    const UInt64 start = GetBlock(index).pieces[0].offset;
+    return m_Source->FindEndOfDamage(start + offset, start + end) - start;
 }
 
 zarvo_code BlockDecoder::DecodeWhole(UInt32 index, UInt8* out, size_t* count, Failure* failure) const {
@@ -110,10 +120,15 @@ zarvo_code BlockDecoder::DecodeWhole(UInt32 index, UInt8* out, size_t* count, Fa
     if (!stored.resize_uninitialized(static_cast<size_t>(StoredBytesThere(block)), kResizeExact))
         return failure->SetMemory();
     size_t loaded = 0;
-    const zarvo_code code = ReadStored(block, 0, stored.data(), stored.size(), &loaded, failure);
-    if (code != ZARVO_OK) return code;
+    const zarvo_code code = ReadStored(index, 0, stored.data(), stored.size(), &loaded, failure);
+    if (code != ZARVO_OK && code != ZARVO_ERROR_SYSTEM) return code;
     (void)stored.resize_uninitialized(loaded); // never grows
-    return DecodeLoaded(index, block, stored, out, count, failure);
+    if (code == ZARVO_OK) return DecodeLoaded(index, block, stored, out, count, failure);
+    // The bytes before those that can't be read give some of the block.
+    Failure ofTheRest;
+    const zarvo_code decoded = DecodeLoaded(index, block, stored, out, count, &ofTheRest);
+    if (decoded == ZARVO_OK || decoded == ZARVO_ERROR_MEMORY) *failure = ofTheRest;
+    return failure->code;
 }
 
 zarvo_code BlockDecoder::DecodeLoaded(UInt32 index, const Block& block, const dynamic_array<UInt8>& stored, UInt8* out,
@@ -158,12 +173,13 @@ zarvo_code StreamCursor::LoadInput(Failure* failure) {
     const size_t wanted = static_cast<size_t>(std::min<UInt64>(kPieceSize, m_Block.storedSize - m_Loaded));
     if (!m_Input.resize_uninitialized(wanted, kResizeExact)) return failure->SetMemory();
     size_t got = 0;
-    const zarvo_code code = m_Decoder->ReadStored(m_Block, m_Loaded, m_Input.data(), wanted, &got, failure);
-    if (code != ZARVO_OK) got = 0;
+    const zarvo_code code = m_Decoder->ReadStored(m_BlockIndex, m_Loaded, m_Input.data(), wanted, &got, failure);
     (void)m_Input.resize_uninitialized(got); // never grows
     m_InputUsed = 0;
     m_Loaded += got;
-    return code;
+    if (code != ZARVO_ERROR_SYSTEM || got == 0) return code;
+    *failure = {};
+    return ZARVO_OK; // what could be read is used first; then this fails again
 }
 
 // Makes the next size bytes, at most; *count is how many. Fewer without a failure: the block is broken there.
@@ -197,16 +213,10 @@ zarvo_code StreamCursor::Read(UInt64 offset, UInt8* out, size_t size, size_t* co
         size_t made = 0;
         const size_t wanted = static_cast<size_t>(std::min<UInt64>(kPieceSize, offset - m_Position));
         const zarvo_code code = Decode(m_Skipped.data(), wanted, &made, failure);
-        if (code != ZARVO_OK) {
-            m_IsStarted = false; // input may have been lost
-            return code;
-        }
+        if (code != ZARVO_OK) return code;
     }
     zarvo_code code = ZARVO_OK;
     if (m_Position == offset) code = Decode(out, size, count, failure);
-    if (code != ZARVO_OK) {
-        m_IsStarted = false;
-        return code;
-    }
+    if (code != ZARVO_OK) return code;
     return *count == size ? ZARVO_OK : SetDamaged(m_BlockIndex, "is damaged", failure);
 }

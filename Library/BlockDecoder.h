@@ -45,9 +45,13 @@ public:
     // The larger of a block's decoded size and its stored bytes: decoding it whole takes at most twice as much memory.
     UInt64 BytesToHold(const Block& block) const { return std::max<UInt64>(block.size, StoredBytesThere(block)); }
 
-    // Reads bytes [offset, offset + size) of a block that is stored as is. *count is how many are there.
+    // Reads bytes [offset, offset + size) of a block that is stored as is. *count is how many can be read, even after a
+    // failure.
     zarvo_code ReadStoredAsIs(UInt32 index, UInt64 offset, void* out, size_t size, size_t* count,
                               Failure* failure) const;
+
+    // Byte offset of a block that is stored as is could not be read. Where, up to end, reading can go on.
+    UInt64 FindEndOfDamage(UInt32 index, UInt64 offset, UInt64 end) const;
 
     // Decodes a whole block into out, which has room for its size. *count is how many bytes can be read, even after a
     // failure.
@@ -60,9 +64,9 @@ private:
 
     UInt64 StoredBytesThere(const Block& block) const;
 
-    // Reads stored bytes [from, from + size) of a block; *count is how many the archive has.
-    zarvo_code ReadStored(const Block& block, UInt64 from, void* out, size_t size, size_t* count,
-                          Failure* failure) const;
+    // Reads stored bytes [from, from + size) of a block; *count is how many the archive has, or could be read before a
+    // failure.
+    zarvo_code ReadStored(UInt32 index, UInt64 from, void* out, size_t size, size_t* count, Failure* failure) const;
     zarvo_code DecodeLoaded(UInt32 index, const Block& block, const dynamic_array<UInt8>& stored, UInt8* out,
                             size_t* count, Failure* failure) const;
 
@@ -72,7 +76,7 @@ private:
 
 // The failure of an entry that lies outside the data, and that of a block too large to be held in memory.
 zarvo_code SetOutsideData(Failure* failure);
-zarvo_code SetTooLarge(UInt32 index, UInt64 bytes, UInt64 maxBlockBytes, Failure* failure);
+zarvo_code SetTooLarge(UInt32 index, UInt64 bytes, Failure* failure);
 
 // A place inside an LZMA block from which decoding can go on.
 class StreamCursor : private NonCopyable {

@@ -31,18 +31,16 @@ zarvo_code DataReader::ReadInBlock(UInt32 blockIndex, UInt64 offset, UInt8* out,
         return m_Decoder->ReadStoredAsIs(blockIndex, offset, out, size, count, failure);
     if (BlockDecoder::IsReadInPieces(block, m_MaxBlockBytes))
         return ReadFromCursor(blockIndex, offset, out, size, count, kept, failure);
-    if (block.size > m_MaxBlockBytes) return SetTooLarge(blockIndex, block.size, m_MaxBlockBytes, failure);
+    if (m_Decoder->BytesToHold(block) > m_MaxBlockBytes)
+        return SetTooLarge(blockIndex, m_Decoder->BytesToHold(block), failure);
     if (size == block.size && !m_Cache->Has(blockIndex)) return m_Decoder->DecodeWhole(blockIndex, out, count, failure);
 
     BlockCache::Use use(m_Cache);
-    zarvo_code code = m_Cache->Acquire(blockIndex, &use, failure);
-    if (code == ZARVO_OK || code == ZARVO_ERROR_DAMAGED || code == ZARVO_ERROR_UNSUPPORTED) {
-        const UInt64 readable = use.Readable() > offset ? use.Readable() - offset : 0;
-        *count = static_cast<size_t>(std::min<UInt64>(size, readable));
-        if (*count != 0) memcpy(out, use.Data() + offset, *count);
-        if (*count == size) code = ZARVO_OK; // the damage lies after it
-    }
-    return code;
+    const zarvo_code code = m_Cache->Acquire(blockIndex, &use, failure);
+    const UInt64 readable = use.Readable() > offset ? use.Readable() - offset : 0;
+    *count = static_cast<size_t>(std::min<UInt64>(size, readable));
+    if (*count != 0) memcpy(out, use.Data() + offset, *count);
+    return *count == size ? ZARVO_OK : code; // the damage may lie after it
 }
 
 zarvo_code DataReader::ReadFromCursor(UInt32 blockIndex, UInt64 offset, UInt8* out, size_t size, size_t* count,

@@ -6,7 +6,8 @@
 
 class DataReader : private NonCopyable {
 public:
-    // decoder and cache outlive the reader. Blocks that are larger than maxBlockBytes are never decoded whole.
+    // decoder and cache outlive the reader. Blocks with more bytes than maxBlockBytes, stored or
+    // decoded, are never decoded whole.
     DataReader(const BlockDecoder* decoder, BlockCache* cache, UInt64 maxBlockBytes)
         : m_Decoder(decoder), m_Cache(cache), m_MaxBlockBytes(maxBlockBytes), m_DataSize(decoder->DataSize()) {}
 

@@ -3,6 +3,7 @@
 #include "Runtime/Allocator/Allocator.h"
 
 #include <algorithm>
+#include <cerrno>
 
 using Block = BlockDecoder::Block;
 
@@ -192,8 +193,10 @@ void DataRun::Work(UInt32 worker) {
             m_NextOther = std::min(m_Others.size(), first + kOthersAtOnce);
             const size_t end = m_NextOther;
             lock.unlock();
-            for (size_t index = first; index < end && !IsStopped(); ++index)
+            for (size_t index = first; index < end && !IsStopped(); ++index) {
                 m_Sink->TakeOther(worker, m_Others[index]);
+                m_Sink->BetweenFiles();
+            }
             lock.lock();
         } else if (m_Streams != 0) {
             ++m_Waiting;
@@ -234,26 +237,34 @@ void DataRun::Decode(const Unit& unit, Piece* piece) {
     if (unit.isMissing || room > std::max(m_MaxBlockBytes, m_UnitSize)) room = 0; // one block, which fails below
     if (!piece->bytes.resize_uninitialized(static_cast<size_t>(room), kResizeExact)) return StopWithoutMemory();
     UInt64 position = unit.begin;
-    for (UInt32 index = unit.firstBlock; position < unit.end && !IsStopped(); ++index) {
+    UInt32 index = unit.firstBlock;
+    while (position < unit.end && !IsStopped()) {
         const Block block = m_Decoder->GetBlock(index);
         const UInt64 offset = position - block.position;
         const size_t size = static_cast<size_t>(std::min<UInt64>(block.size - offset, unit.end - position));
-        if (size == 0) continue;
+        if (size == 0) {
+            ++index;
+            continue;
+        }
         Failure failure;
         size_t count = 0;
+        UInt64 lost = 0;
         zarvo_code code;
         if (BlockDecoder::IsStoredAsIs(block))
             code = m_Decoder->ReadStoredAsIs(index, offset, piece->bytes.data() + (position - unit.begin), size, &count,
                                              &failure);
         else if (m_Decoder->BytesToHold(block) > m_MaxBlockBytes)
-            code = SetTooLarge(index, m_Decoder->BytesToHold(block), m_MaxBlockBytes, &failure);
+            code = SetTooLarge(index, m_Decoder->BytesToHold(block), &failure);
         else
             code = m_Decoder->DecodeWhole(index, piece->bytes.data() + (position - unit.begin), &count, &failure);
         if (code != ZARVO_OK) {
-            AddHole(piece, position + count, position + size, failure);
-            m_Sink->TakeDamage(index, position + count, position + size, failure);
+            lost = size - count;
+            if (BlockDecoder::IsStoredAsIs(block) && failure.systemCode == EIO)
+                lost = m_Decoder->FindEndOfDamage(index, offset + count, offset + size) - (offset + count);
+            AddHole(piece, position + count, position + count + lost, failure);
+            m_Sink->TakeDamage(index, position + count, position + count + lost, failure);
         }
-        position += size;
+        position += count + lost;
     }
 }
 
@@ -270,7 +281,8 @@ void DataRun::WorkOnStream(UInt32 worker, const Unit& unit, Piece** piece) {
         end = std::max(end, std::min(unit.end, m_Files[index].end));
     size_t file = unit.firstFile;
     size_t leaving = 0;
-    bool isBroken = false;
+    bool isBroken = false; // nothing from here on can be read
+    Failure failure;
     for (UInt64 begin = unit.begin; begin < end && !IsStopped(); begin += m_UnitSize) {
         (*piece)->begin = begin;
         (*piece)->end = std::min(end, begin + m_UnitSize);
@@ -299,14 +311,12 @@ void DataRun::WorkOnStream(UInt32 worker, const Unit& unit, Piece** piece) {
         }
         if (!isOk) return StopWithoutMemory();
 
-        Failure failure;
         size_t count = 0;
-        const zarvo_code code = cursor.Read(begin - unit.begin, (*piece)->bytes.data(), size, &count, &failure);
-        if (code != ZARVO_OK) {
-            AddHole(*piece, begin + count, (*piece)->end, failure);
-            if (!isBroken) m_Sink->TakeDamage(unit.firstBlock, begin + count, unit.end, failure);
-            isBroken = true;
+        if (!isBroken) {
+            isBroken = cursor.Read(begin - unit.begin, (*piece)->bytes.data(), size, &count, &failure) != ZARVO_OK;
+            if (isBroken) m_Sink->TakeDamage(unit.firstBlock, begin + count, unit.end, failure);
         }
+        if (isBroken) AddHole(*piece, begin + count, (*piece)->end, failure);
         if (!PassOn(piece)) Deliver(worker, **piece);
     }
 }
@@ -333,7 +343,6 @@ bool DataRun::PassOn(Piece** piece) {
 }
 
 void DataRun::Deliver(UInt32 worker, const Piece& piece) {
-    UInt64 taken = m_TakesAllBlocks ? piece.end - piece.begin : 0;
     for (const PieceFile& part : piece.files) {
         if (IsStopped()) return;
         const UInt64 begin = std::max(part.file->begin, piece.begin);
@@ -345,9 +354,13 @@ void DataRun::Deliver(UInt32 worker, const Piece& piece) {
         // A piece that has no bytes is all hole.
         const UInt8* const bytes = piece.bytes.empty() ? nullptr : piece.bytes.data() + (begin - piece.begin);
         DeliverPart(worker, part, begin - part.file->begin, bytes, end - begin, hole);
-        if (!m_TakesAllBlocks) taken += end - begin;
+        if (!m_TakesAllBlocks) CountBytes(end - begin);
+        m_Sink->BetweenFiles();
     }
-    m_BytesTaken.fetch_add(taken, std::memory_order_relaxed); // for progress only
+    if (!m_TakesAllBlocks) return;
+    m_Sink->TakeData(piece.begin, piece.end);
+    CountBytes(piece.end - piece.begin);
+    m_Sink->BetweenFiles();
 }
 
 // offset: of the part, in its file. hole: the first in the part, or null.
@@ -378,12 +391,14 @@ void DataRun::DeliverPart(UInt32 worker, const PieceFile& part, UInt64 offset, c
         isWanted = offset < shared->readable;
         if (hole != nullptr && offset + readable < shared->readable) {
             shared->readable = offset + readable;
-            shared->damage = hole->failure;
+            shared->damage.Set(hole->failure);
         }
         const UInt64 wholeSize = m_Nodes[shared->entry].size;
-        if (part.file->end - part.file->begin < wholeSize && shared->damage.code == ZARVO_OK) {
+        if (part.file->end - part.file->begin < wholeSize && shared->damage.Get() == nullptr) {
             shared->readable = part.file->end - part.file->begin;
-            (void)SetOutsideData(&shared->damage);
+            Failure outside;
+            (void)SetOutsideData(&outside);
+            shared->damage.Set(outside);
         }
     }
     if (isWanted && readable != 0) m_Sink->TakePart(worker, shared, offset, bytes, readable);

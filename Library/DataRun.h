@@ -31,7 +31,7 @@ struct SharedFile : private NonCopyable {
 
     Mutex lock;                                           // for what follows, and the sink's
     UInt64 readable VARNEX_GUARDED_BY(lock) = ~UInt64{0}; // bytes before the first damage that has been met
-    Failure damage VARNEX_GUARDED_BY(lock);
+    RareFailure damage VARNEX_GUARDED_BY(lock);
 
     // Used by the run only.
     UInt64 inOrder = 0; // bytes that have been handed over, if the run keeps the order
@@ -63,6 +63,12 @@ public:
 
         // Data [begin, end) of a block that can't be read.
         virtual void TakeDamage(UInt32 blockIndex, UInt64 begin, UInt64 end, const Failure& damage) = 0;
+
+        // Data [begin, end) has been tried. Only if the run takes all blocks.
+        virtual void TakeData(UInt64, UInt64) {}
+
+        // Called after each file, and after each piece of data, with no lock held.
+        virtual void BetweenFiles() {}
     };
 
     // decoder, nodes and sink outlive the run. Blocks of more than maxBlockBytes are not decoded whole. threads: how
@@ -152,6 +158,7 @@ private:
                      const Hole* hole);
     void Unshare(SharedFile* shared);
     void StopWithoutMemory();
+    void CountBytes(UInt64 count) { m_BytesTaken.fetch_add(count, std::memory_order_relaxed); } // for progress only
 
     const BlockDecoder* m_Decoder;
     const Nodes& m_Nodes;

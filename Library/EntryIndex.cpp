@@ -20,6 +20,18 @@ core::string_ref EntryIndex::Path(UInt32 item) const {
     return core::string_ref(m_Nodes[folder.entry].path).substr(0, folder.length);
 }
 
+static size_t MeasureNormalForm(core::string_ref path) {
+    size_t length = 0;
+    for (PathComponents at(path); at.Next();)
+        length += at.Name().size() + (length != 0 ? 1 : 0);
+    return length;
+}
+
+size_t EntryIndex::NormalLength(UInt32 item) const {
+    if (item != kRoot && IsImplied(item)) return m_Implied[item - m_Nodes.size()].normalLength;
+    return MeasureNormalForm(Path(item));
+}
+
 // The slot of the item with that path, or the empty one where it belongs.
 UInt32* EntryIndex::FindSlot(UInt64 hash, core::string_ref path) {
     return m_Table.Find(hash, path, [this](UInt32 item) { return Path(item); });
@@ -68,12 +80,14 @@ bool EntryIndex::LinkIntoFolders(UInt32 entry, dynamic_array<UInt64>* hashes) {
 
     UInt32 item = entry;
     core::string_ref rest = path;
+    size_t normalLength = MeasureNormalForm(path);
     for (size_t depth = hashes->size() - 1; depth != 0; --depth) {
+        normalLength -= LastComponent(rest).size() + 1;
         rest = WithoutLastComponent(rest);
         if (!m_Table.Reserve(size_t{ItemCount()} + 1)) return false;
         UInt32* const slot = FindSlot((*hashes)[depth - 1], rest);
         const bool isNew = *slot == kNoItem;
-        if (isNew && !AddImpliedFolder(entry, rest.size(), slot)) return false;
+        if (isNew && !AddImpliedFolder(entry, rest.size(), normalLength, slot)) return false;
         const UInt32 folder = *slot;
         PutInFront(item, &m_FirstChild[folder]);
         if (!isNew) return true;
@@ -93,10 +107,10 @@ static bool AppendOne(dynamic_array<T>* array, T value) {
     return true;
 }
 
-bool EntryIndex::AddImpliedFolder(UInt32 entry, size_t length, UInt32* slot) {
+bool EntryIndex::AddImpliedFolder(UInt32 entry, size_t length, size_t normalLength, UInt32* slot) {
     const UInt32 item = ItemCount();
     if (item >= kRoot - 1 || length > ~UInt32{0}) return false;
-    if (!AppendOne(&m_Implied, {entry, static_cast<UInt32>(length)})) return false;
+    if (!AppendOne(&m_Implied, {entry, static_cast<UInt32>(length), static_cast<UInt32>(normalLength)})) return false;
     if (!AppendOne(&m_FirstChild, UInt32{kNoItem}) || !AppendOne(&m_NextSibling, UInt32{kNoItem})) return false;
     *slot = item;
     return true;

@@ -40,16 +40,20 @@ public:
     // A path that has the item's normal form: part of the directory's texts.
     core::string_ref Path(UInt32 item) const;
 
+    // The length of the item's normal form. That of an implied folder is known: one path may imply very many.
+    size_t NormalLength(UInt32 item) const;
+
 private:
     // A folder without an entry, whose path is the start of an entry's path.
     struct ImpliedFolder {
         UInt32 entry;
-        UInt32 length; // of its path; longer paths make no implied folders
+        UInt32 length; // of its path, as it is stored; longer paths make no implied folders
+        UInt32 normalLength;
     };
 
     UInt32* FindSlot(UInt64 hash, core::string_ref path);
     [[nodiscard]] bool LinkIntoFolders(UInt32 item, dynamic_array<UInt64>* hashes);
-    [[nodiscard]] bool AddImpliedFolder(UInt32 entry, size_t length, UInt32* slot);
+    [[nodiscard]] bool AddImpliedFolder(UInt32 entry, size_t length, size_t normalLength, UInt32* slot);
     void PutInFront(UInt32 item, UInt32* first);
 
     const Nodes& m_Nodes;

@@ -3,6 +3,7 @@
 
 #include "Library/ArchiveRun.h"
 #include "Library/OutputFolder.h"
+#include "Runtime/Allocator/Owned.h"
 
 class Extraction final : public ArchiveRun {
 public:
@@ -19,15 +20,17 @@ private:
 
         NewFile file; // made by whoever has the first part
         bool isMade VARNEX_GUARDED_BY(lock) = false;
-        Failure failure VARNEX_GUARDED_BY(lock); // of making or writing it
+        bool isOpen = false;                         // or, once it is made, does not stay open
+        RareFailure failure VARNEX_GUARDED_BY(lock); // of making or writing it
     };
     struct Worker {
-        Worker(const OutputFolder* output, size_t maxFolders) : folders(output, maxFolders) {}
+        Worker(const OutputFolder* output, size_t maxFolders, bool makes) : folders(output, maxFolders, makes) {}
 
         FolderCache folders;
         core::string name{kMemLabelGeneral}; // of the entry at hand
     };
 
+    zarvo_code OpenFolder(const char* folder, Failure* failure);
     size_t ShareDescriptors();
 
     void TakeFile(UInt32 worker, UInt32 entry, const UInt8* bytes, UInt64 readable, const Failure* damage) override;
@@ -38,10 +41,16 @@ private:
     void TakeOther(UInt32 worker, UInt32 entry) override;
     void TakeDamage(UInt32, UInt64, UInt64, const Failure&) override {}
     void Report(const zarvo_report& report) override;
+    bool IsSettledBefore(UInt32 entry) override;
 
     int FindFolder(Worker* worker, UInt32 entry, Failure* failure);
-    zarvo_code MakeFile(Worker* worker, UInt32 entry, NewFile* file, Failure* failure);
+    template <typename Make>
+    zarvo_code MakeFile(Worker* worker, UInt32 entry, Failure* failure, Make&& make);
+    bool MakeShared(Worker* worker, OutputFile* file) VARNEX_REQUIRES(file->lock);
+    zarvo_code CutShared(Worker* worker, OutputFile* file, Failure* failure) VARNEX_REQUIRES(file->lock);
+    void FreeShared(Worker* worker, OutputFile* file);
     void Place(Worker* worker, UInt32 entry, NewFile* file, const Failure* damage);
+    void TryPlace(Worker* worker, UInt32 entry, const Failure* damage);
     bool IsKept(UInt32 entry, int folder, const char* name);
     void Settle(UInt32 entry, const Failure& failure, const Failure* damage);
 
@@ -49,4 +58,7 @@ private:
     OutputPlan m_Plan;
     OutputFolder m_Output;
     dynamic_array<Worker*> m_Workers{kMemLabelFileSystem};
+    Owned<Worker> m_Looker; // that makes nothing, for IsSettledBefore; null where nothing is looked for
+    SInt64 m_MaxOpenFiles = 0;
+    std::atomic<SInt64> m_OpenFiles{0}; // shared ones
 };

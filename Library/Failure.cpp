@@ -5,6 +5,7 @@
 #include <cstdarg>
 #include <cstdio>
 #include <cstring>
+#include <utility>
 
 struct zarvo_error {
     Failure failure;
@@ -32,6 +33,17 @@ zarvo_code Failure::SetSystem(int error, const char* what) {
         (void)Set(ZARVO_ERROR_SYSTEM, "%s: %s", reason, what);
     systemCode = error;
     return code;
+}
+
+RareFailure::~RareFailure() {
+    if (m_Failure != &s_NoMemory.failure) Delete(const_cast<Failure*>(m_Failure), kMemLabelGeneral);
+}
+
+void RareFailure::Set(const Failure& failure) {
+    RareFailure before;
+    std::swap(before.m_Failure, m_Failure);
+    m_Failure = New<Failure>(kMemLabelGeneral, failure);
+    if (m_Failure == nullptr) m_Failure = &s_NoMemory.failure;
 }
 
 zarvo_code Deliver(zarvo_code code, const Failure& failure, zarvo_error** error) {

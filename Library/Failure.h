@@ -23,5 +23,21 @@ struct Failure {
     zarvo_code SetArgument(const char* what) { return Set(ZARVO_ERROR_ARGUMENT, "%s", what); }
 };
 
+// A failure of one of very many things, of which nearly all go well: until there is one, it takes the room of a
+// pointer. Where memory is refused, the failure becomes that. One thread at a time.
+class RareFailure {
+public:
+    ~RareFailure();
+    RareFailure() = default;
+    RareFailure(const RareFailure&) = delete;
+    RareFailure& operator=(const RareFailure&) = delete;
+
+    void Set(const Failure& failure);
+    const Failure* Get() const { return m_Failure; } // null while there is none
+
+private:
+    const Failure* m_Failure = nullptr; // owned, but for that of refused memory
+};
+
 // Ends a public call: hands the failure over where the caller wants it (error may be null), and returns code.
 zarvo_code Deliver(zarvo_code code, const Failure& failure, zarvo_error** error);

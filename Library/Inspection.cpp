@@ -3,9 +3,12 @@
 #include "Runtime/Allocator/Allocator.h"
 
 #include <algorithm>
+#include <cerrno>
+#include <climits>
 
 zarvo_code TestRun::Test(const zarvo_test_options& what, zarvo_summary* summary, Failure* failure) {
     Data().AddAllBlocks();
+    if (!ListEnds()) return failure->SetMemory();
     if (const zarvo_code code = Run(failure); code != ZARVO_OK) return code;
     std::sort(m_Damages.begin(), m_Damages.end(), [](const Damage& a, const Damage& b) { return a.begin < b.begin; });
     // A block that is cut into units is told once, with its first damage.
@@ -27,6 +30,25 @@ zarvo_code TestRun::Test(const zarvo_test_options& what, zarvo_summary* summary,
         if (what.entry != nullptr) what.entry(Options().context, entry, readable);
     }
     return ZARVO_OK;
+}
+
+// For progress: the entries that end in a piece of data are counted with it, and those that end nowhere in it at once.
+bool TestRun::ListEnds() {
+    if (!m_Ends.resize_uninitialized(Nodes().size(), kResizeExact)) return false;
+    size_t count = 0;
+    for (const Node& node : Nodes())
+        if (zarvo_archive::SizeOf(node) != 0 && !IsOutsideData(node))
+            m_Ends[count++] = node.offset + std::min<UInt64>(node.size, Archive()->Info().data_size - node.offset);
+    (void)m_Ends.resize_uninitialized(count); // never grows
+    std::sort(m_Ends.begin(), m_Ends.end());
+    Expect(Nodes().size());
+    Count(Nodes().size() - count);
+    return true;
+}
+
+void TestRun::TakeData(UInt64 begin, UInt64 end) {
+    UInt64* const first = std::upper_bound(m_Ends.begin(), m_Ends.end(), begin);
+    Count(static_cast<UInt64>(std::upper_bound(first, m_Ends.end(), end) - first));
 }
 
 UInt64 TestRun::ReadableBytes(const Node& node) const {
@@ -57,8 +79,21 @@ void TestRun::TakeDamage(UInt32 blockIndex, UInt64 begin, UInt64 end, const Fail
 zarvo_code VisitRun::Visit(Failure* failure) {
     Data().KeepOrder();
     UInt64 bytes = 0;
-    if (const zarvo_code code = AddPlanned(&m_Plan, false, &bytes, failure); code != ZARVO_OK) return code;
+    if (const zarvo_code code = Plan(&m_Plan, &bytes, failure); code != ZARVO_OK) return code;
+    if (const zarvo_code code = AddPlanned(m_Plan, failure); code != ZARVO_OK) return code;
     return Run(failure);
+}
+
+// What no file system takes is not handed over.
+bool VisitRun::IsSettledBefore(UInt32 entry) {
+    for (PathComponents at(m_Plan.PathOnDisk(entry)); at.Next();) {
+        if (at.Name().size() <= NAME_MAX) continue;
+        Failure failure;
+        (void)failure.SetSystem(ENAMETOOLONG);
+        SetFailed(entry, failure);
+        return true;
+    }
+    return false;
 }
 
 void VisitRun::HandOver(UInt32 entry, UInt64 offset, const UInt8* bytes, UInt64 size) {
@@ -83,8 +118,8 @@ void VisitRun::TakePart(UInt32, SharedFile* file, UInt64 offset, const UInt8* by
 void VisitRun::EndFile(UInt32, SharedFile* file) {
     {
         Mutex::AutoLock lock(file->lock);
-        if (file->damage.code != ZARVO_OK)
-            SetFailed(file->entry, file->damage);
+        if (const Failure* const damage = file->damage.Get())
+            SetFailed(file->entry, *damage);
         else
             SetDone(file->entry);
     }

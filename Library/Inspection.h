@@ -27,7 +27,12 @@ private:
     void DropFile(SharedFile*) override {}
     void TakeOther(UInt32, UInt32) override {}
     void TakeDamage(UInt32 blockIndex, UInt64 begin, UInt64 end, const Failure& damage) override;
+    void TakeData(UInt64 begin, UInt64 end) override;
     void Report(const zarvo_report&) override {}
+
+    bool ListEnds();
+
+    dynamic_array<UInt64> m_Ends{kMemLabelFileSystem}; // where entries end in the data, sorted
 
     // Under the lock until the run has ended.
     Mutex m_DamageLock;
@@ -44,6 +49,7 @@ public:
     zarvo_code Visit(Failure* failure);
 
 private:
+    bool IsSettledBefore(UInt32 entry) override;
     void HandOver(UInt32 entry, UInt64 offset, const UInt8* bytes, UInt64 size);
 
     void TakeFile(UInt32 worker, UInt32 entry, const UInt8* bytes, UInt64 readable, const Failure* damage) override;

@@ -15,6 +15,15 @@ namespace {
 
 constexpr int kFolderFlags = O_PATH | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC;
 
+constexpr int kNewFileFlags = O_WRONLY | O_CREAT | O_EXCL | O_NOFOLLOW | O_CLOEXEC;
+
+// What a descriptor stands for, as a path.
+struct DescriptorPath {
+    explicit DescriptorPath(int descriptor) { (void)snprintf(text, sizeof(text), "/proc/self/fd/%d", descriptor); }
+
+    char text[40];
+};
+
 // Distinct names within this process; those of others are found out by O_EXCL.
 std::atomic<UInt64> s_NextName{0};
 
@@ -48,6 +57,27 @@ zarvo_code OutputFolder::Open(const char* path, Failure* failure) {
     return failure->SetSystem(error != 0 && error != EEXIST && openError == ENOENT ? error : openError);
 }
 
+zarvo_code OutputFolder::OpenToLook(const char* path, Failure* failure) {
+    const core::string_ref whole(path);
+    core::string start(kMemLabelGeneral);
+    if (start.grow(whole.size() + 1) == nullptr) return failure->SetMemory();
+    start = whole;
+    while (true) {
+        m_Descriptor = open(start.c_str(), O_PATH | O_DIRECTORY | O_CLOEXEC);
+        if (m_Descriptor >= 0) return m_IsMissing ? CheckCanMakeIn(m_Descriptor, failure) : ZARVO_OK;
+        struct stat status;
+        const int error = errno;
+        const bool isMissing = error == ENOENT && lstat(start.c_str(), &status) != 0;
+        if (!isMissing || start.empty() || start == ".") return failure->SetSystem(error);
+        m_IsMissing = true;
+        const size_t slash = start.rfind('/');
+        if (slash == core::string::npos)
+            start = ".";
+        else
+            start = whole.substr(0, std::max<size_t>(slash, 1));
+    }
+}
+
 FolderCache::~FolderCache() { (void)Close(); }
 
 bool FolderCache::Close() {
@@ -60,17 +90,31 @@ bool FolderCache::Close() {
 
 // Opens a folder in another one, and makes it where it is missing.
 int FolderCache::Enter(int above, const char* name, Failure* failure) {
-    if (RepeatOnInterrupt([&] { return mkdirat(above, name, 0777); }) != 0 && errno != EEXIST) {
+    if (m_Makes && RepeatOnInterrupt([&] { return mkdirat(above, name, 0777); }) != 0 && errno != EEXIST) {
         (void)failure->SetSystem(errno);
         return -1;
     }
     const int descriptor = RepeatOnInterrupt([&] { return openat(above, name, kFolderFlags); });
     if (descriptor >= 0) return descriptor;
     const int error = errno;
+    if (!m_Makes && error == ENOENT) {
+        (void)CheckCanMakeIn(above, failure);
+        return -1;
+    }
     struct stat status;
     const bool isLink = fstatat(above, name, &status, AT_SYMLINK_NOFOLLOW) == 0 && S_ISLNK(status.st_mode);
     (void)failure->SetSystem(error, isLink ? "a link is in the place of a folder" : nullptr);
     return -1;
+}
+
+// Of folders below one that is missing, only the names can be wrong. names: with a "/" between them.
+void FolderCache::CheckNames(int above, char* names, Failure* failure) {
+    for (char* name = names; name != nullptr && failure->code == ZARVO_OK;) {
+        char* const slash = strchr(name, '/');
+        if (slash != nullptr) *slash = '\0';
+        (void)CheckName(above, name, failure);
+        name = slash != nullptr ? slash + 1 : nullptr;
+    }
 }
 
 bool FolderCache::Keep(core::string_ref path, int descriptor) {
@@ -109,6 +153,10 @@ int FolderCache::Walk(core::string_ref path, size_t maxKept, Failure* failure) {
         return -1;
     }
     const core::string_ref normal(buffer, zarvo_normalize_path(path.data(), path.size(), buffer));
+    if (m_Output->IsMissing()) {
+        if (!normal.empty()) CheckNames(m_Output->Descriptor(), buffer, failure);
+        return -1;
+    }
     if (normal.empty()) return m_Output->Descriptor();
 
     // From the innermost folder that is open.
@@ -132,6 +180,7 @@ int FolderCache::Walk(core::string_ref path, size_t maxKept, Failure* failure) {
         buffer[end] = '\0';
         const int inner = Enter(descriptor, buffer + begin, failure);
         if (end != normal.size()) buffer[end] = '/';
+        if (inner < 0 && failure->code == ZARVO_OK) CheckNames(descriptor, buffer + begin, failure);
         if (!isKept) close(descriptor);
         if (inner < 0) return -1;
         descriptor = inner;
@@ -157,10 +206,21 @@ Standing LookAt(int folder, const char* name) {
     return standing;
 }
 
+zarvo_code CheckName(int folder, const char* name, Failure* failure) {
+    struct stat status;
+    const bool isTooLong = fstatat(folder, name, &status, AT_SYMLINK_NOFOLLOW) != 0 && errno == ENAMETOOLONG;
+    return isTooLong ? failure->SetSystem(ENAMETOOLONG) : ZARVO_OK;
+}
+
+zarvo_code CheckCanMakeIn(int folder, Failure* failure) {
+    return faccessat(folder, ".", W_OK | X_OK, AT_EACCESS) == 0 ? ZARVO_OK : failure->SetSystem(errno);
+}
+
 NewFile::~NewFile() {
     if (m_Descriptor >= 0) close(m_Descriptor);
-    if (m_Name[0] != '\0') unlinkat(m_Folder, m_Name, 0);
-    if (m_Folder >= 0) close(m_Folder);
+    if (m_Folder < 0) return;
+    Remove(m_Folder);
+    close(m_Folder);
 }
 
 // A name of our own that nothing has.
@@ -184,26 +244,32 @@ zarvo_code NewFile::Create(int folder, Failure* failure) {
     return failure->SetSystem(errno);
 }
 
+// Makes a file with a name of our own, which is stored, or is empty after a failure.
+static int OpenNamed(int folder, char (&name)[32]) {
+    int descriptor;
+    do {
+        MakeName(name); // may be one that a killed process has left
+        descriptor = RepeatOnInterrupt([&] { return openat(folder, name, kNewFileFlags, 0666); });
+    } while (descriptor < 0 && errno == EEXIST);
+    if (descriptor < 0) name[0] = '\0';
+    return descriptor;
+}
+
 zarvo_code NewFile::CreateNamed(int folder, Failure* failure) {
     m_Folder = fcntl(folder, F_DUPFD_CLOEXEC, 0);
     if (m_Folder < 0) return failure->SetSystem(errno);
-    do {
-        MakeName(m_Name);
-        m_Descriptor = RepeatOnInterrupt(
-            [&] { return openat(m_Folder, m_Name, O_WRONLY | O_CREAT | O_EXCL | O_NOFOLLOW | O_CLOEXEC, 0666); });
-    } while (m_Descriptor < 0 && errno == EEXIST);
+    m_Descriptor = OpenNamed(m_Folder, m_Name);
     if (m_Descriptor >= 0) return ZARVO_OK;
-    const int error = errno;
-    m_Name[0] = '\0';
+    (void)failure->SetSystem(errno);
     close(m_Folder); // another try may follow
     m_Folder = -1;
-    return failure->SetSystem(error);
+    return failure->code;
 }
 
-zarvo_code NewFile::Write(UInt64 offset, const UInt8* bytes, UInt64 size, Failure* failure) {
+static zarvo_code WriteAll(int descriptor, UInt64 offset, const UInt8* bytes, UInt64 size, Failure* failure) {
     while (size != 0) {
         const ssize_t written = RepeatOnInterrupt(
-            [&] { return pwrite(m_Descriptor, bytes, static_cast<size_t>(size), static_cast<off_t>(offset)); });
+            [&] { return pwrite(descriptor, bytes, static_cast<size_t>(size), static_cast<off_t>(offset)); });
         if (written < 0) return failure->SetSystem(errno);
         bytes += written;
         offset += static_cast<UInt64>(written);
@@ -212,18 +278,77 @@ zarvo_code NewFile::Write(UInt64 offset, const UInt8* bytes, UInt64 size, Failur
     return ZARVO_OK;
 }
 
-zarvo_code NewFile::Cut(UInt64 size, Failure* failure) {
-    const int answer = RepeatOnInterrupt([&] { return ftruncate(m_Descriptor, static_cast<off_t>(size)); });
+static zarvo_code CutFile(int descriptor, UInt64 size, Failure* failure) {
+    const int answer = RepeatOnInterrupt([&] { return ftruncate(descriptor, static_cast<off_t>(size)); });
     return answer == 0 ? ZARVO_OK : failure->SetSystem(errno);
+}
+
+zarvo_code NewFile::Write(UInt64 offset, const UInt8* bytes, UInt64 size, Failure* failure) {
+    return WriteAll(m_Descriptor, offset, bytes, size, failure);
+}
+
+zarvo_code NewFile::Cut(UInt64 size, Failure* failure) { return CutFile(m_Descriptor, size, failure); }
+
+zarvo_code NewFile::CreateClosed(int folder, Failure* failure) {
+    const int descriptor = OpenNamed(folder, m_Name);
+    if (descriptor < 0) return failure->SetSystem(errno);
+    struct stat status;
+    if (fstat(descriptor, &status) != 0) {
+        (void)failure->SetSystem(errno);
+        Remove(folder);
+    }
+    close(descriptor); // nothing has been written
+    m_Device = status.st_dev;
+    m_Inode = status.st_ino;
+    return failure->code;
+}
+
+// Opens the file, and nothing else that may have got its name meanwhile.
+int NewFile::OpenAgain(int folder) const {
+    const int found = RepeatOnInterrupt([&] { return openat(folder, m_Name, O_PATH | O_NOFOLLOW | O_CLOEXEC); });
+    if (found < 0) return -1;
+    struct stat status;
+    int descriptor = -1;
+    errno = ESTALE;
+    if (fstat(found, &status) == 0 && status.st_dev == m_Device && status.st_ino == m_Inode) {
+        const DescriptorPath path(found);
+        descriptor = RepeatOnInterrupt([&] { return open(path.text, O_WRONLY | O_CLOEXEC); });
+    }
+    const int error = errno;
+    close(found);
+    errno = error;
+    return descriptor;
+}
+
+// The work of a function below on the file, opened for it. work: (descriptor) -> code.
+template <typename Work>
+static zarvo_code DoAndClose(int descriptor, Failure* failure, Work&& work) {
+    if (descriptor < 0) return failure->SetSystem(errno);
+    const zarvo_code code = work(descriptor);
+    if (close(descriptor) != 0 && errno != EINTR && code == ZARVO_OK) return failure->SetSystem(errno);
+    return code;
+}
+
+zarvo_code NewFile::WriteClosed(int folder, UInt64 offset, const UInt8* bytes, UInt64 size, Failure* failure) const {
+    return DoAndClose(OpenAgain(folder), failure,
+                      [&](int descriptor) { return WriteAll(descriptor, offset, bytes, size, failure); });
+}
+
+zarvo_code NewFile::CutClosed(int folder, UInt64 size, Failure* failure) const {
+    return DoAndClose(OpenAgain(folder), failure, [&](int descriptor) { return CutFile(descriptor, size, failure); });
+}
+
+void NewFile::Remove(int folder) {
+    if (m_Name[0] != '\0') unlinkat(folder, m_Name, 0);
+    m_Name[0] = '\0';
 }
 
 // Gives a file without a name one.
 static int LinkFile(int descriptor, int folder, const char* name) {
     if (linkat(descriptor, "", folder, name, AT_EMPTY_PATH) == 0) return 0;
     if (errno != ENOENT && errno != EPERM && errno != EINVAL) return -1;
-    char path[40]; // for kernels that let only the superuser do that
-    (void)snprintf(path, sizeof(path), "/proc/self/fd/%d", descriptor);
-    return linkat(AT_FDCWD, path, folder, name, AT_SYMLINK_FOLLOW);
+    const DescriptorPath path(descriptor); // for kernels that let only the superuser do that
+    return linkat(AT_FDCWD, path.text, folder, name, AT_SYMLINK_FOLLOW);
 }
 
 // Gives a temporary file its last name; EEXIST where something has it.
@@ -282,8 +407,7 @@ zarvo_code NewFile::Place(int folder, const char* name, bool replaces, Failure* 
 }
 
 zarvo_code PlaceEmptyFile(int folder, const char* name, Failure* failure) {
-    const int flags = O_WRONLY | O_CREAT | O_EXCL | O_NOFOLLOW | O_CLOEXEC;
-    const int descriptor = RepeatOnInterrupt([&] { return openat(folder, name, flags, 0666); });
+    const int descriptor = RepeatOnInterrupt([&] { return openat(folder, name, kNewFileFlags, 0666); });
     if (descriptor < 0) return failure->SetSystem(errno);
     return close(descriptor) == 0 || errno == EINTR ? ZARVO_OK : failure->SetSystem(errno);
 }

@@ -11,6 +11,9 @@
 //
 // A new file has no name until it is whole, or a temporary name in the same folder if the file system can't make files
 // without names. It then replaces what is there in one step.
+//
+// For dry runs, both kinds of folders can be looked at without being made: whatever would keep them from being made, as
+// far as can be known without writing, is a failure.
 #pragma once
 
 #include "Library/Failure.h"
@@ -29,22 +32,29 @@ public:
     // Opens the folder, and makes it and those above it if they are missing. Links in path are followed.
     zarvo_code Open(const char* path, Failure* failure);
 
+    // As Open, but makes nothing. If the folder IsMissing, the Descriptor is that of the nearest one above it.
+    zarvo_code OpenToLook(const char* path, Failure* failure);
+
     int Descriptor() const { return m_Descriptor; }
+    bool IsMissing() const { return m_IsMissing; }
 
 private:
     int m_Descriptor = -1;
+    bool m_IsMissing = false;
 };
 
 // Keeps open the folders that a thread has used lately. One thread.
 class FolderCache : private NonCopyable {
 public:
-    // Keeps up to maxFolders open, at least 1.
-    FolderCache(const OutputFolder* output, size_t maxFolders) : m_Output(output), m_MaxFolders(maxFolders) {}
+    // Keeps up to maxFolders open, at least 1. makes: whether folders that are missing are made.
+    FolderCache(const OutputFolder* output, size_t maxFolders, bool makes)
+        : m_Output(output), m_MaxFolders(maxFolders), m_Makes(makes) {}
     ~FolderCache();
 
     // The descriptor of a folder, or -1 after a failure. Makes the folder if it is missing, with those above it. The
     // descriptor belongs to the cache, and is valid until the next call. path need not be in normal form, but holds no
-    // "..". When descriptors run out, the cache closes other folders.
+    // "..". When descriptors run out, the cache closes other folders. If it makes none, -1 without a failure says that
+    // the folder is missing and can be made.
     int Get(core::string_ref path, Failure* failure);
 
     // Closes all folders, to free descriptors. False if none was open.
@@ -62,10 +72,12 @@ private:
     // As Get, and keeps the last maxKept folders of the path open.
     int Walk(core::string_ref path, size_t maxKept, Failure* failure);
     int Enter(int above, const char* name, Failure* failure);
+    void CheckNames(int above, char* names, Failure* failure);
     [[nodiscard]] bool Keep(core::string_ref path, int descriptor);
 
     const OutputFolder* m_Output;
     const size_t m_MaxFolders;
+    const bool m_Makes;
     dynamic_array<Folder> m_Folders{kMemLabelFileSystem};
     core::string m_Normal{kMemLabelGeneral};
     UInt64 m_Uses = 0;
@@ -86,6 +98,10 @@ struct Standing {
 };
 Standing LookAt(int folder, const char* name);
 
+// Whether a name is one that the file system takes, and whether files can be made in a folder, without trying.
+zarvo_code CheckName(int folder, const char* name, Failure* failure);
+zarvo_code CheckCanMakeIn(int folder, Failure* failure);
+
 // One thread at a time.
 class NewFile : private NonCopyable {
 public:
@@ -96,6 +112,14 @@ public:
 
     zarvo_code Cut(UInt64 size, Failure* failure);
 
+    // For a file that does not stay open: it is made with a temporary name, and opened again for each of the next two,
+    // which several threads may call at once. folder: the one that it was made in. Whoever made it calls Remove in the
+    // end, which does nothing after Place.
+    zarvo_code CreateClosed(int folder, Failure* failure);
+    zarvo_code WriteClosed(int folder, UInt64 offset, const UInt8* bytes, UInt64 size, Failure* failure) const;
+    zarvo_code CutClosed(int folder, UInt64 size, Failure* failure) const;
+    void Remove(int folder);
+
     // Gives the file its name in the folder that it was created in. A file, link, device, pipe or socket of that name
     // is never opened. If replaces is true, it is replaced; otherwise it is left alone, the failure is EEXIST, and
     // Place may be called again.
@@ -103,11 +127,14 @@ public:
 
 private:
     zarvo_code CreateNamed(int folder, Failure* failure);
+    int OpenAgain(int folder) const;
     int Close();
 
     int m_Descriptor = -1;
     int m_Folder = -1;    // of the temporary name; a copy of the caller's
     char m_Name[32] = ""; // the temporary one; empty where the file has none
+    dev_t m_Device = 0;   // these of a file that does not stay open
+    ino_t m_Inode = 0;
 };
 
 // Makes an empty file. The failure is EEXIST if the name is taken.

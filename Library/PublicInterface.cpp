@@ -36,6 +36,7 @@ template <typename OpenSource>
 zarvo_code OpenArchive(const zarvo_open_options* givenOptions, zarvo_archive** archive, zarvo_error** error,
                        OpenSource&& openSource) {
     InstallMessageHook();
+    if (!IsNullOrHasSize(givenOptions)) return RefuseArgument(kNoSize, error);
     Failure failure;
     const zarvo_open_options options = FillInDefaults(givenOptions);
     Source* source = nullptr;
@@ -84,13 +85,6 @@ const EntryIndex* FindItem(const zarvo_archive* archive, UInt64 item, UInt32* fo
     return nullptr;
 }
 
-size_t NormalLength(core::string_ref path) {
-    size_t length = 0;
-    for (PathComponents at(path); at.Next();)
-        length += at.Name().size() + (length != 0 ? 1 : 0);
-    return length;
-}
-
 bool IsEntry(const zarvo_archive* archive, UInt64 index) {
     return IsLiveHandle(archive) && index < archive->Nodes().size();
 }
@@ -130,10 +124,13 @@ zarvo_code zarvo_open_memory(const void* data, size_t size, const zarvo_open_opt
 
 zarvo_code zarvo_open_source(const zarvo_source* source, const zarvo_open_options* options, zarvo_archive** archive,
                              zarvo_error** error) {
+    if (!IsNullOrHasSize(source)) return RefuseArgument(kNoSize, error);
     const zarvo_source callbacks = CopyIn(source);
-    if (callbacks.read_at == nullptr || callbacks.get_size == nullptr || archive == nullptr) {
+    const bool isComplete = callbacks.read_at != nullptr && callbacks.get_size != nullptr && archive != nullptr;
+    if (!isComplete || !IsNullOrHasSize(options)) {
         if (callbacks.close != nullptr) callbacks.close(callbacks.context);
-        return RefuseArgument("no source, a source without its callbacks, or no place for the archive", error);
+        return RefuseArgument(
+            isComplete ? kNoSize : "no source, a source without its callbacks, or no place for the archive", error);
     }
     return OpenArchive(options, archive, error, [&](UInt64 offset, Source** opened, Failure* failure) {
         return OpenCallbacks(callbacks, offset, opened, failure);
@@ -147,7 +144,7 @@ void zarvo_close(zarvo_archive* archive) {
 }
 
 zarvo_code zarvo_get_info(const zarvo_archive* archive, zarvo_info* info) {
-    if (!IsLiveHandle(archive) || info == nullptr) return ZARVO_ERROR_ARGUMENT;
+    if (!IsLiveHandle(archive) || info == nullptr || !HasSize(info)) return ZARVO_ERROR_ARGUMENT;
     CopyOut(archive->Info(), info);
     return ZARVO_OK;
 }
@@ -155,7 +152,7 @@ zarvo_code zarvo_get_info(const zarvo_archive* archive, zarvo_info* info) {
 uint64_t zarvo_entry_count(const zarvo_archive* archive) { return IsLiveHandle(archive) ? archive->Nodes().size() : 0; }
 
 zarvo_code zarvo_get_entry(const zarvo_archive* archive, uint64_t index, zarvo_entry* entry) {
-    if (!IsEntry(archive, index) || entry == nullptr) return ZARVO_ERROR_ARGUMENT;
+    if (!IsEntry(archive, index) || entry == nullptr || !HasSize(entry)) return ZARVO_ERROR_ARGUMENT;
     const zarvo_archive::Node& node = archive->Nodes()[index];
     const bool isFolder = zarvo_archive::IsFolder(node);
     zarvo_entry filled = ZARVO_ENTRY_INIT;
@@ -194,6 +191,7 @@ zarvo_code zarvo_find(const zarvo_archive* archive, const char* path, size_t len
 zarvo_code zarvo_get_item(const zarvo_archive* archive, uint64_t item, zarvo_item* out, zarvo_error** error) {
     if (!IsLiveHandle(archive)) return RefuseArgument(kNoArchive, error);
     if (out == nullptr) return RefuseArgument(kNoRoom, error);
+    if (!HasSize(out)) return RefuseArgument(kNoSize, error);
     Failure failure;
     UInt32 found;
     const EntryIndex* index = FindItem(archive, item, &found, &failure);
@@ -209,7 +207,7 @@ zarvo_code zarvo_get_item(const zarvo_archive* archive, uint64_t item, zarvo_ite
     filled.kind = filled.is_implied || zarvo_archive::IsFolder(archive->Nodes()[found]) ? ZARVO_FOLDER : ZARVO_FILE;
     filled.first_child = PublicItem(index->FirstChild(found));
     filled.next_sibling = isRoot ? ZARVO_NO_ITEM : PublicItem(index->NextSibling(found));
-    filled.path_length = NormalLength(path);
+    filled.path_length = index->NormalLength(found);
     CopyOut(filled, out);
     return ZARVO_OK;
 }
@@ -305,7 +303,7 @@ uint64_t zarvo_block_count(const zarvo_archive* archive) {
 }
 
 zarvo_code zarvo_get_block(const zarvo_archive* archive, uint64_t index, zarvo_block* block) {
-    if (index >= zarvo_block_count(archive) || block == nullptr) return ZARVO_ERROR_ARGUMENT;
+    if (index >= zarvo_block_count(archive) || block == nullptr || !HasSize(block)) return ZARVO_ERROR_ARGUMENT;
     const BlockDecoder::Block found = archive->Blocks().GetBlock(static_cast<UInt32>(index));
     zarvo_block filled = ZARVO_BLOCK_INIT;
     filled.position = found.position;

@@ -10,6 +10,7 @@ template <typename Work>
 static zarvo_code RunOn(zarvo_archive* archive, const zarvo_run_options* options, zarvo_summary* summary,
                         zarvo_error** error, Work&& work) {
     if (!IsLiveHandle(archive)) return RefuseArgument("no open archive", error);
+    if (!IsNullOrHasSize(options) || !IsNullOrHasSize(summary)) return RefuseArgument(kNoSize, error);
     const zarvo_run_options given = CopyIn(options);
     const bool arePatternsLive = (given.wanted == nullptr || IsLiveHandle(given.wanted)) &&
                                  (given.excluded == nullptr || IsLiveHandle(given.excluded));
@@ -24,6 +25,7 @@ static zarvo_code RunOn(zarvo_archive* archive, const zarvo_run_options* options
 
 zarvo_code zarvo_extract(zarvo_archive* archive, const char* folder, const zarvo_run_options* options,
                          const zarvo_extract_options* how, zarvo_summary* summary, zarvo_error** error) {
+    if (!IsNullOrHasSize(how)) return RefuseArgument(kNoSize, error);
     const zarvo_extract_options given = CopyIn(how);
     if (folder == nullptr) return RefuseArgument("no folder to extract to", error);
     if (given.overwrite < ZARVO_OVERWRITE_ALWAYS || given.overwrite > ZARVO_OVERWRITE_FAIL)
@@ -39,6 +41,7 @@ zarvo_code zarvo_extract(zarvo_archive* archive, const char* folder, const zarvo
 
 zarvo_code zarvo_test(zarvo_archive* archive, const zarvo_run_options* options, const zarvo_test_options* what,
                       zarvo_summary* summary, zarvo_error** error) {
+    if (!IsNullOrHasSize(what)) return RefuseArgument(kNoSize, error);
     const zarvo_test_options given = CopyIn(what);
     return RunOn(archive, options, summary, error,
                  [&](const zarvo_run_options& run, zarvo_summary* done, Failure* failure) {
@@ -49,6 +52,7 @@ zarvo_code zarvo_test(zarvo_archive* archive, const zarvo_run_options* options, 
 
 zarvo_code zarvo_visit(zarvo_archive* archive, const zarvo_run_options* options, const zarvo_visit_options* what,
                        zarvo_summary* summary, zarvo_error** error) {
+    if (!IsNullOrHasSize(what)) return RefuseArgument(kNoSize, error);
     const zarvo_visit_options given = CopyIn(what);
     return RunOn(archive, options, summary, error,
                  [&](const zarvo_run_options& run, zarvo_summary* done, Failure* failure) {

@@ -24,7 +24,50 @@ zarvo_code Source::ReadAt(UInt64 position, void* buffer, size_t size, size_t* co
         if (got == 0) break;
         *count += got;
     }
-    return CheckUnchanged(failure);
+    const zarvo_code code = CheckUnchanged(failure);
+    if (code != ZARVO_OK) *count = 0; // they may be another file's
+    return code;
+}
+
+static bool IsDamage(zarvo_code code, const Failure& failure) {
+    return code == ZARVO_ERROR_SYSTEM && failure.systemCode == EIO;
+}
+
+zarvo_code Source::ReadBeforeDamage(UInt64 position, void* buffer, size_t size, size_t* count, Failure* failure) const {
+    *count = 0;
+    const UInt64 end = position + std::min<UInt64>(size, m_Size - std::min(position, m_Size));
+    UInt64 at = position;
+    UInt64 limit = end; // of the next reads: where one has failed, they are halved
+    while (true) {
+        size_t got = 0;
+        Failure problem;
+        const zarvo_code code =
+            ReadAt(at, static_cast<UInt8*>(buffer) + (at - position), static_cast<size_t>(limit - at), &got, &problem);
+        at += got;
+        *count = static_cast<size_t>(at - position);
+        if (code == ZARVO_OK) {
+            if (at < limit || at == end) return ZARVO_OK;
+            limit = end;
+            continue;
+        }
+        const UInt64 pageEnd = PageEnd(at);
+        if (!IsDamage(code, problem) || limit <= pageEnd) {
+            *failure = problem;
+            return code;
+        }
+        limit = std::max(pageEnd, PageBegin(at + (limit - at) / 2));
+    }
+}
+
+UInt64 Source::FindEndOfDamage(UInt64 position, UInt64 end) const {
+    UInt8 page[kPageSize];
+    size_t count = 0;
+    Failure failure;
+    do
+        position = PageEnd(position);
+    while (position < end &&
+           IsDamage(ReadAt(position, page, std::min(kPageSize, m_Size - position), &count, &failure), failure));
+    return std::min(position, end);
 }
 
 zarvo_code Source::SetRange(UInt64 wholeSize, UInt64 offset, Failure* failure) {

@@ -6,6 +6,7 @@
 #include "Runtime/Core/NonCopyable.h"
 #include "Runtime/Core/Types.h"
 
+#include <algorithm>
 #include <sys/types.h>
 
 class Source : private NonCopyable {
@@ -13,8 +14,15 @@ public:
     virtual ~Source() = default;
 
     // Reads up to size bytes at position into buffer. *count is less than size only where the source ends. After a
-    // failure *count means nothing. Any thread.
+    // failure *count is how many bytes were read before it. Any thread.
     zarvo_code ReadAt(UInt64 position, void* buffer, size_t size, size_t* count, Failure* failure) const;
+
+    // As ReadAt. Where a part of the source can't be read (EIO), *count is how many bytes lie before the first page of
+    // the source that can't be: however the reads are cut, the same bytes are lost.
+    zarvo_code ReadBeforeDamage(UInt64 position, void* buffer, size_t size, size_t* count, Failure* failure) const;
+
+    // The page at position can't be read. Where, up to end, the next one that can be begins.
+    UInt64 FindEndOfDamage(UInt64 position, UInt64 end) const;
 
     // Bytes from the archive's start to the source's end, as they were when it was opened.
     UInt64 Size() const { return m_Size; }
@@ -33,6 +41,12 @@ protected:
     zarvo_code SetRange(UInt64 wholeSize, UInt64 offset, Failure* failure);
 
 private:
+    static constexpr UInt64 kPageSize = 4'096; // the least that systems read
+
+    // Where the page that a position lies in begins, and where it ends.
+    UInt64 PageBegin(UInt64 position) const { return position - std::min(position, (m_Offset + position) % kPageSize); }
+    UInt64 PageEnd(UInt64 position) const { return position + kPageSize - (m_Offset + position) % kPageSize; }
+
     UInt64 m_Offset = 0;
     UInt64 m_Size = 0;
 };

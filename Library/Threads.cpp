@@ -44,8 +44,8 @@ void RunOnThreads(UInt32 count, ThreadedWork* work) {
         if (pthread_create(&jobs[started].thread, nullptr, RunJob, &jobs[started]) != 0) break;
     }
     pthread_sigmask(SIG_SETMASK, &before, nullptr);
-    if (started == 0) work->Work(0);
-    work->Watch(started != 0 ? started : 1);
+    if (started == 0) return work->WorkAlone();
+    work->Watch(started);
     for (UInt32 number = 0; number < started; ++number)
         pthread_join(jobs[number].thread, nullptr);
 }

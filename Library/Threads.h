@@ -17,8 +17,10 @@ public:
 
     // Called in the calling thread; returns when count threads have ended their Work.
     virtual void Watch(UInt32 count) = 0;
+
+    // Called in the calling thread, instead of both, when the system refuses all threads.
+    virtual void WorkAlone() = 0;
 };
 
-// Returns when all threads have ended. When the system refuses threads, fewer than count work; when it refuses all, the
-// calling thread does the work and then watches.
+// Returns when all threads have ended. When the system refuses threads, fewer than count work.
 void RunOnThreads(UInt32 count, ThreadedWork* work);

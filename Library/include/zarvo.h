@@ -31,8 +31,8 @@
  * object is needed, and an index past the end, are ZARVO_ERROR_ARGUMENT, never a crash.
  *
  * Structures begin with struct_size, which the caller sets to the size of the structure that it was compiled with (the
- * _INIT macros do). Later versions of the library add fields at the end, and neither read nor write fields that lie
- * past the caller's struct_size.
+ * _INIT macros do); one that is not set is ZARVO_ERROR_ARGUMENT. Later versions of the library add fields at the end,
+ * and neither read nor write fields that lie past the caller's struct_size.
  *
  * The process. The library prints nothing, and does not change the process's signals, working directory, locale or
  * environment. When memory is refused whose amount depends on an archive or a caller, that is ZARVO_ERROR_MEMORY; the
@@ -405,7 +405,7 @@ typedef struct zarvo_report {
 
 enum {
     ZARVO_OVERWRITE_ALWAYS = 0, /* a file that is there is replaced */
-    ZARVO_OVERWRITE_NEVER = 1,  /* it is left */
+    ZARVO_OVERWRITE_NEVER = 1,  /* it is left; data that only such files need is not read */
     ZARVO_OVERWRITE_FAIL = 2    /* it is left, and that is a failure of the entry */
 };
 
@@ -413,7 +413,8 @@ typedef struct zarvo_extract_options {
     size_t struct_size;
     int32_t overwrite;   /* ZARVO_OVERWRITE_... */
     int32_t keep_broken; /* 1: the bytes of a damaged file before the damage are put in place, too */
-    int32_t dry_run;     /* 1: nothing is written or decoded; entries are reported as if all could be written */
+    int32_t dry_run;     /* 1: nothing is written, and nothing is made; all is read and decoded, and reported as without
+                            it, as far as can be known without writing */
     uint64_t strip;      /* how many leading components each path loses; entries that have no more are left out */
     uint64_t max_bytes;  /* of all files together: if they have more, ZARVO_ERROR_LIMIT, and nothing is written.
                             Default: no limit */
@@ -430,7 +431,8 @@ typedef struct zarvo_summary {
     uint64_t files;    /* put in place (zarvo_test: checked) */
     uint64_t folders;  /* entries that are folders, put in place */
     uint64_t kept;     /* left as they were */
-    uint64_t failures; /* entries that failed, also broken ones (zarvo_test: entries with unreadable bytes) */
+    uint64_t failures; /* entries that failed, also broken ones, and those that were not reached when the call itself
+                          failed, but for ZARVO_ERROR_STOPPED (zarvo_test: entries with unreadable bytes) */
     uint64_t bytes;    /* of these files */
     uint64_t damaged_blocks;
 } zarvo_summary;

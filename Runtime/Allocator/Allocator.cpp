@@ -8,10 +8,15 @@
 
 constexpr size_t kMinAlignment = 16;
 
+static constinit thread_local UInt64 t_RefusedRequests = 0;
+
+UInt64 CountRefusedRequests() { return t_RefusedRequests; }
+
 void* malloc_internal(size_t size, size_t align, MemLabelId, AllocateOptions, const char*, int) {
     void* pointer = nullptr;
-    if (posix_memalign(&pointer, std::max(align, kMinAlignment), size) != 0) return nullptr;
-    return pointer;
+    if (posix_memalign(&pointer, std::max(align, kMinAlignment), size) == 0) return pointer;
+    ++t_RefusedRequests;
+    return nullptr;
 }
 
 void* realloc_internal(void* pointer, size_t size, size_t align, MemLabelId label, AllocateOptions options,

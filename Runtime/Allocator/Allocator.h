@@ -23,6 +23,10 @@ void* malloc_internal(size_t size, size_t align, MemLabelId label, AllocateOptio
 void* realloc_internal(void* pointer, size_t size, size_t align, MemLabelId label, AllocateOptions options,
                        const char* file, int line);
 
+// How many requests of the calling thread have been refused so far: for callers of code that answers only that it
+// failed.
+UInt64 CountRefusedRequests();
+
 // Null is allowed.
 void free_alloc_internal(void* pointer, MemLabelId label, const char* file, int line);
 

@@ -144,3 +144,22 @@ TEST(Entries, DeepAndManyPathsAreFound) {
     }
     EXPECT_EQ(5'002u + 20'000u + 700u, zarvo_item_count(archive.get()));
 }
+
+// Looking at each folder of a path with very many components costs no walk along the path.
+TEST(Entries, FoldersOfDeepPathsKnowTheirLengths) {
+    constexpr size_t kLevels = 300'000;
+    std::string deep;
+    for (size_t level = 0; level < kLevels; ++level)
+        deep += "./x//";
+    const std::string bytes = BuildArchive({.entries = {{.path = deep + "file"}}}).bytes;
+    const zarvo::archive archive = OpenBytes(bytes);
+    uint64_t item = archive.item(ZARVO_ROOT)->first_child;
+    const clock_t start = clock();
+    for (size_t level = 0; level < kLevels; ++level) {
+        const zarvo_item folder = *archive.item(item);
+        ASSERT_EQ(2 * level + 1, folder.path_length);
+        item = folder.first_child;
+    }
+    EXPECT_EQ(2 * kLevels + 4, archive.item(item)->path_length);
+    EXPECT_LE((clock() - start) / CLOCKS_PER_SEC, 10) << "seconds; walks take more than a minute";
+}

@@ -10,6 +10,7 @@
 #include <random>
 #include <sys/resource.h>
 #include <sys/stat.h>
+#include <thread>
 #include <unistd.h>
 
 namespace {
@@ -32,6 +33,26 @@ Tree TreeOf(const std::string& folder) {
     }
     return tree;
 }
+
+// How many things are below a folder, also where they can't be read.
+size_t CountThings(const std::string& folder) {
+    const fs::recursive_directory_iterator things(folder, fs::directory_options::skip_permission_denied);
+    return static_cast<size_t>(std::distance(begin(things), end(things)));
+}
+
+// While it is there, the superuser, who may do everything, is somebody else.
+class OrdinaryUser : private NonCopyable {
+public:
+    OrdinaryUser() : m_User(geteuid()) {
+        if (m_User == 0) {
+            EXPECT_EQ(0, seteuid(65'534));
+        }
+    }
+    ~OrdinaryUser() { EXPECT_EQ(0, seteuid(m_User)); }
+
+private:
+    const uid_t m_User;
+};
 
 // How an extraction went: a line for each report, and what it comes to.
 struct Outcome {
@@ -271,13 +292,262 @@ TEST(Extraction, PathsAreRefusedSettledAndStripped) {
     }
 }
 
-TEST(Extraction, DryRunReportsAndWritesNothing) {
-    const TemporaryFolder folder;
-    EXPECT_EQ((Outcome{.reports = "a/b\nc\n..: the path has a component \"..\"\n", .files = 2, .failures = 1}),
-              Extract(Archive({{.path = "a/b", .bytes = "1"}, {.path = "c"}, {.path = ".."}}), folder / "out",
-                      {.dryRun = 1}));
-    EXPECT_EQ(Tree{}, TreeOf(folder.Path()));
+// A dry run says what the run then says, whatever is in the folder, and changes nothing.
+TEST(Extraction, DryRunSaysWhatTheRunWouldSay) {
+    const std::string text = SampleText(1'500'000);
+    ArchiveDescription description;
+    description.entries = {{.path = "a/b", .bytes = "1"},
+                           {.path = "empty"},
+                           {.path = "..", .bytes = "2"},
+                           {.path = "file/x", .bytes = "3"},
+                           {.path = "file/y", .flags = kFolderEntry},
+                           {.path = "link/x"},
+                           {.path = "folder", .bytes = "4"},
+                           {.path = "folder/x", .bytes = "5"},
+                           {.path = "pipe", .bytes = "6"},
+                           {.path = "standing", .flags = kFolderEntry},
+                           {.path = "sealed/x", .bytes = "7"},
+                           {.path = "sealed/there", .bytes = "8"},
+                           {.path = "sealed/new/x", .bytes = "9"},
+                           {.path = "new/" + std::string(300, 'n') + "/x", .bytes = "10"},
+                           {.path = "new/" + std::string(300, 'n'), .bytes = "11"},
+                           {.path = std::string(300, 'm'), .bytes = "12"},
+                           {.path = "broken", .bytes = "12345678"},
+                           {.path = "large", .bytes = text},
+                           {.path = "outside", .bytes = "13"}};
+    size_t before = 0;
+    for (size_t entry = 0; entry < 16; ++entry)
+        before += description.entries[entry].bytes.size();
+    description.blocks = {{.size = before + 4},
+                          {.size = 4, .type = kCompressionLz4, .stored = std::string(3, '\xFF')},
+                          {.size = text.size(), .type = kCompressionLz4}};
+    description.fields["node[18].offset"] = 5'000'000;
+    const std::string bytes = BuildArchive(description).bytes;
+    const auto settings = [](int32_t overwrite, int32_t keepBroken, int32_t dryRun) {
+        return Settings{.overwrite = overwrite, .keepBroken = keepBroken, .dryRun = dryRun};
+    };
+    for (const int32_t overwrite : {ZARVO_OVERWRITE_ALWAYS, ZARVO_OVERWRITE_NEVER, ZARVO_OVERWRITE_FAIL})
+        for (const int32_t keepBroken : {0, 1})
+            for (const char* const below : {"", "/new/out"}) {
+                SCOPED_TRACE(std::to_string(overwrite) + below);
+                const TemporaryFolder folder;
+                fs::permissions(folder.Path(), fs::perms::all);
+                const OrdinaryUser user;
+                for (const char* const name : {"folder", "standing", "sealed"})
+                    fs::create_directory(folder / name);
+                for (const char* const name : {"file", "broken", "sealed/there"})
+                    WriteFile(folder / name, "old");
+                fs::create_symlink("standing", folder / "link");
+                EXPECT_EQ(0, mkfifo((folder / "pipe").c_str(), 0600));
+                fs::permissions(folder / "sealed", fs::perms::owner_read | fs::perms::owner_exec);
+                const std::string out = folder.Path() + below;
+                const size_t things = CountThings(folder.Path());
+                const Outcome dry = Extract(bytes, out, settings(overwrite, keepBroken, 1));
+                EXPECT_EQ(things, CountThings(folder.Path()));
+                const Outcome wet = Extract(bytes, out, settings(overwrite, keepBroken, 0));
+                fs::permissions(folder / "sealed", fs::perms::owner_all);
+                EXPECT_EQ(wet, dry);
+                EXPECT_LT(0u, wet.files);
+                EXPECT_LT(5u, wet.failures);
+            }
 }
+
+TEST(Extraction, DryRunSaysWhyTheFolderCantBeMade) {
+    const TemporaryFolder folder;
+    WriteFile(folder / "file", "");
+    fs::create_symlink("nowhere", folder / "dangling");
+    const std::string bytes = Archive({{.path = "a", .bytes = "1"}});
+    for (const std::string name :
+         {"file", "file/out", "dangling", "dangling/out", "dangling/out/more", "new/out/", "new//more"}) {
+        SCOPED_TRACE(name);
+        const Outcome dry = Extract(bytes, folder / name, {.dryRun = 1});
+        EXPECT_EQ(false, fs::exists(folder / "new") && !name.starts_with("new//"));
+        EXPECT_EQ(Extract(bytes, folder / name), dry);
+    }
+    EXPECT_EQ(Extract(bytes, ""), Extract(bytes, "", {.dryRun = 1}));
+}
+
+// A second run over what is there reads none of the data.
+TEST(Extraction, KeptFilesAreNotDecoded) {
+    const TemporaryFolder folder;
+    for (const int32_t overwrite : {ZARVO_OVERWRITE_ALWAYS, ZARVO_OVERWRITE_NEVER, ZARVO_OVERWRITE_FAIL}) {
+        SCOPED_TRACE(overwrite);
+        auto source = std::make_unique<CountingSource>(Archive(ManyFiles(13)));
+        CountingSource& counts = *source;
+        zarvo::archive archive = *zarvo::archive::open(std::move(source));
+        counts.reads = 0;
+        const zarvo::run_result result = archive.extract(folder / "out", {}, {.overwrite = overwrite});
+        EXPECT_EQ(ZARVO_OK, result.error.code());
+        EXPECT_EQ(overwrite == ZARVO_OVERWRITE_ALWAYS, counts.reads.load() != 0);
+        EXPECT_EQ(overwrite == ZARVO_OVERWRITE_NEVER ? 40u : 0u, result.summary.kept);
+        EXPECT_EQ(overwrite == ZARVO_OVERWRITE_FAIL ? 40u : 0u, result.summary.failures);
+    }
+}
+
+// Very many files that begin before a unit's end and end after it, with few descriptors: all are written, one decoding
+// is enough, and a run that fails leaves nothing behind.
+TEST(Extraction, AnyNumberOfFilesMayShareTheirData) {
+    constexpr uint64_t kFiles = 500, kFrom = 1'040'000, kSize = 30'000;
+    const std::string text = SampleText(3'000'000);
+    ArchiveDescription description{.entries = {{.path = "all", .bytes = text}}, .type = kCompressionLz4};
+    for (uint64_t file = 0; file < kFiles; ++file) {
+        const std::string node = "node[" + std::to_string(description.entries.size()) + "].";
+        description.entries.push_back({.path = "f" + std::to_string(file % 20) + "/" + std::to_string(file)});
+        description.fields[node + "offset"] = kFrom + file;
+        description.fields[node + "size"] = kSize;
+    }
+    const std::string bytes = BuildArchive(description).bytes;
+    rlimit before = {};
+    ASSERT_EQ(0, getrlimit(RLIMIT_NOFILE, &before));
+    for (const rlim_t descriptors : {16, 64, 1'024}) {
+        SCOPED_TRACE(descriptors);
+        const TemporaryFolder folder;
+        auto source = std::make_unique<CountingSource>(bytes);
+        CountingSource& counts = *source;
+        zarvo::archive archive = *zarvo::archive::open(std::move(source));
+        counts.bytesRead = 0;
+        const rlimit few = {descriptors, before.rlim_max};
+        ASSERT_EQ(0, setrlimit(RLIMIT_NOFILE, &few));
+        const zarvo::run_result result = archive.extract(folder / "out", {.threads = 2});
+        const SystemFault fault({.call = "pwrite", .number = 400, .error = ENOSPC});
+        const zarvo::run_result failed = archive.extract(folder / "failed", {.threads = 2});
+        ASSERT_EQ(0, setrlimit(RLIMIT_NOFILE, &before));
+        EXPECT_EQ(kFiles + 1, result.summary.files);
+        EXPECT_LE(counts.bytesRead.load(), 2 * archive.info().stored_size);
+        const Tree tree = TreeOf(folder / "out");
+        EXPECT_EQ(kFiles + 21, tree.size());
+        for (uint64_t file = 0; file < kFiles; ++file)
+            EXPECT_EQ(text.substr(kFrom + file, kSize),
+                      tree.at("f" + std::to_string(file % 20) + "/" + std::to_string(file)));
+        EXPECT_EQ(ZARVO_ERROR_SYSTEM, failed.error.code());
+        EXPECT_EQ(kFiles + 1, failed.summary.files + failed.summary.failures);
+        for (const auto& [name, there] : TreeOf(folder / "failed"))
+            EXPECT_EQ(std::string::npos, name.find(".zarvo-")) << name;
+    }
+}
+
+// Whoever takes the temporary name of a file that is not open gets none of its bytes.
+TEST(Extraction, TakenTemporaryIsNotWritten) {
+    const TemporaryFolder folder;
+    fs::create_directory(folder / "out");
+    WriteFile(folder / "mine", "mine");
+    const std::string text = SampleText(3'000'000);
+    const std::string bytes = Archive({{.path = "a", .bytes = text}}, kCompressionNone);
+    struct Swapping final : zarvo::source {
+        int64_t read_at(std::span<std::byte> buffer, uint64_t offset) override {
+            for (const auto& entry : fs::directory_iterator(*folder / "out")) {
+                fs::remove(entry.path());
+                fs::create_hard_link(*folder / "mine", entry.path());
+                hasSwapped = true;
+            }
+            const size_t count = std::min<uint64_t>(buffer.size(), bytes->size() - std::min(offset, bytes->size()));
+            memcpy(buffer.data(), bytes->data() + offset, count);
+            return static_cast<int64_t>(count);
+        }
+        int64_t size() override { return static_cast<int64_t>(bytes->size()); }
+
+        const TemporaryFolder* folder = nullptr;
+        const std::string* bytes = nullptr;
+        bool hasSwapped = false;
+    };
+    auto source = std::make_unique<Swapping>();
+    Swapping& swapping = *source;
+    swapping.folder = &folder;
+    swapping.bytes = &bytes;
+    zarvo::archive archive = *zarvo::archive::open(std::move(source));
+    rlimit before = {};
+    ASSERT_EQ(0, getrlimit(RLIMIT_NOFILE, &before));
+    const rlimit few = {12, before.rlim_max}; // none for a file that stays open
+    ASSERT_EQ(0, setrlimit(RLIMIT_NOFILE, &few));
+    const zarvo::run_result result = archive.extract(folder / "out", {.threads = 1});
+    ASSERT_EQ(0, setrlimit(RLIMIT_NOFILE, &before));
+    EXPECT_EQ(true, swapping.hasSwapped);
+    EXPECT_EQ(1u, result.summary.failures);
+    EXPECT_EQ("mine", ReadFile(folder / "mine"));
+    EXPECT_EQ(false, fs::exists(folder / "out/a"));
+}
+
+// What a full disk has kept from being done is counted.
+TEST(Extraction, FullDiskFailsAllThatIsNotDone) {
+    const TemporaryFolder folder;
+    const SystemFault fault({.call = "pwrite", .number = 2, .error = ENOSPC});
+    const Outcome outcome = Extract(
+        Archive(
+            {{.path = "a", .bytes = "1"}, {.path = "b", .bytes = "2"}, {.path = "c"}, {.path = "..", .bytes = "3"}}),
+        folder.Path(), {.threads = 1});
+    EXPECT_EQ((Outcome{.reports = "a\n..: the path has a component \"..\"\n",
+                       .code = ZARVO_ERROR_SYSTEM,
+                       .files = 1,
+                       .failures = 3}),
+              outcome);
+}
+
+// How far tests are is told in entries, too; the last word is that all have been looked at.
+TEST(Extraction, ProgressOfTestsCountsEntries) {
+    ArchiveDescription description{.entries = ManyFiles(15), .chunkSize = 1'000'000, .type = kCompressionLz4};
+    description.entries.push_back({.path = "folder", .flags = kFolderEntry});
+    const std::string bytes = BuildArchive(description).bytes;
+    zarvo::archive archive = OpenBytes(bytes);
+    zarvo_progress last = {};
+    zarvo::run_options run;
+    run.progress = [&](const zarvo_progress& progress) {
+        last = progress;
+        return true;
+    };
+    EXPECT_EQ(ZARVO_OK, archive.test(run).error.code());
+    EXPECT_EQ(41u, last.files_total);
+    EXPECT_EQ(41u, last.files);
+    EXPECT_EQ(archive.info().data_size, last.bytes);
+}
+
+// Bytes are counted with each file, and not when all that are decoded together are done.
+TEST(Extraction, ProgressCountsTheBytesOfEachFile) {
+    struct State {
+        std::atomic<bool> isWaiting = false, isSeen = false;
+        uint64_t bytes = 0;
+    } state;
+    const std::string bytes =
+        Archive({{.path = "a", .bytes = "1"}, {.path = "b", .bytes = "22"}, {.path = "c", .bytes = "333"}});
+    const zarvo::archive archive = OpenBytes(bytes);
+    zarvo_run_options run = ZARVO_RUN_OPTIONS_INIT;
+    run.context = &state;
+    run.progress = [](void* context, const zarvo_progress* progress) {
+        State& seen = *static_cast<State*>(context);
+        if (!seen.isWaiting || seen.isSeen) return 0;
+        seen.bytes = progress->bytes;
+        seen.isSeen = true;
+        seen.isSeen.notify_all();
+        return 0;
+    };
+    zarvo_visit_options visit = ZARVO_VISIT_OPTIONS_INIT;
+    visit.bytes = [](void* context, uint64_t index, uint64_t, const void*, size_t) {
+        State& waiting = *static_cast<State*>(context);
+        if (index != 2) return;
+        waiting.isWaiting = true;
+        waiting.isSeen.wait(false);
+    };
+    EXPECT_EQ(ZARVO_OK, zarvo_visit(archive.get(), &run, &visit, nullptr, nullptr));
+    EXPECT_EQ(3u, state.bytes);
+}
+
+#ifndef VARNEX_UNDER_SANITIZERS
+// Without threads, the calling one works, and looks up from it.
+TEST(Extraction, ProgressStopsARunWithoutThreads) {
+    const std::string bytes = BuildArchive({.entries = ManyFiles(17), .type = kCompressionLz4}).bytes;
+    zarvo::archive archive = OpenBytes(bytes);
+    size_t looks = 0, files = 0;
+    zarvo::run_options run;
+    run.progress = [&](const zarvo_progress&) { return ++looks < 2; };
+    zarvo::visit_options visit;
+    visit.bytes = [&](uint64_t, uint64_t, std::span<const std::byte>) {
+        ++files;
+        std::this_thread::sleep_for(std::chrono::milliseconds(50));
+    };
+    const SystemFault fault({.call = "pthread_create"});
+    EXPECT_EQ(ZARVO_ERROR_STOPPED, archive.visit(run, visit).error.code());
+    EXPECT_GT(8u, files);
+}
+#endif
 
 TEST(Extraction, WhatIsThereIsReplacedKeptOrAFailure) {
     const std::string bytes = Archive({{.path = "a", .bytes = "new"}, {.path = "b"}, {.path = "c", .bytes = "new"}});
@@ -389,7 +659,7 @@ TEST(Extraction, MemoryBudgetIsKept) {
         const std::string bytes =
             BuildArchive({.entries = {{.path = "a", .bytes = text}}, .chunkSize = 0, .type = type}).bytes;
         const Outcome outcome = Extract(bytes, folder / "out", {.memory = 4'000'000});
-        const std::string refusal = "a: block 0 takes 3000000 bytes of memory, and the limit is 2000000\n";
+        const std::string refusal = "a: block 0 of 3000000 bytes is too large to be held in memory\n";
         EXPECT_EQ(type == kCompressionLzma ? "a\n" : refusal, outcome.reports);
     }
 }
@@ -397,7 +667,8 @@ TEST(Extraction, MemoryBudgetIsKept) {
 TEST(Extraction, FolderThatCantBeMadeEndsTheRun) {
     const TemporaryFolder folder;
     WriteFile(folder / "file", "");
-    EXPECT_EQ((Outcome{.code = ZARVO_ERROR_SYSTEM}), Extract(Archive({{.path = "a"}}), folder / "file/out"));
+    EXPECT_EQ((Outcome{.code = ZARVO_ERROR_SYSTEM, .failures = 2}),
+              Extract(Archive({{.path = "a"}, {.path = "b"}}), folder / "file/out"));
 }
 
 // A file that is larger than it may be is an entry's failure, and leaves nothing behind.
@@ -545,7 +816,7 @@ TEST(Extraction, FilesInsideARefusedBlockFail) {
                                             .chunkSize = 0,
                                             .type = kCompressionLz4})
                                   .bytes;
-    const std::string refusal = ": block 0 takes 3000001 bytes of memory, and the limit is 2000000\n";
+    const std::string refusal = ": block 0 of 3000001 bytes is too large to be held in memory\n";
     EXPECT_EQ("a" + refusal + "b" + refusal, Extract(bytes, folder / "out", {.memory = 4'000'000}).reports);
 }
 
@@ -555,7 +826,7 @@ TEST(Extraction, StoredBytesBeyondTheBudgetAreRefused) {
     ArchiveDescription description = {.entries = {{.path = "a", .bytes = "text"}}, .type = kCompressionLz4};
     description.blocks = {{.size = 4, .stored = std::string(3'000'000, 'x')}};
     const Outcome outcome = Extract(BuildArchive(description).bytes, folder / "out", {.memory = 4'000'000});
-    EXPECT_EQ("a: block 0 takes 3000000 bytes of memory, and the limit is 2000000\n", outcome.reports);
+    EXPECT_EQ("a: block 0 of 3000000 bytes is too large to be held in memory\n", outcome.reports);
 }
 
 // Blocks that claim 4 GiB each, all past the archive's end.

@@ -60,12 +60,35 @@ inline zarvo::archive OpenBytes(const std::string& bytes, zarvo::open_options op
     return std::move(*opened);
 }
 
+// Bytes on a medium with pages of 4,096 bytes, some of which can't be read. A read that meets one of them delivers
+// nothing, or, from a medium that can say so, the bytes before it.
+struct DamagedMedium final : zarvo::source {
+    DamagedMedium(std::string served, std::vector<size_t> badPages, bool isExact)
+        : bytes(std::move(served)), bad(std::move(badPages)), deliversBytesBefore(isExact) {}
+
+    int64_t read_at(std::span<std::byte> buffer, uint64_t offset) override {
+        size_t count = std::min<uint64_t>(buffer.size(), bytes.size() - std::min<uint64_t>(offset, bytes.size()));
+        for (const size_t page : bad)
+            if (offset < (page + 1) * 4'096 && offset + count > page * 4'096) {
+                if (!deliversBytesBefore || offset >= page * 4'096) return -EIO;
+                count = page * 4'096 - offset;
+            }
+        memcpy(buffer.data(), bytes.data() + offset, count);
+        return static_cast<int64_t>(count);
+    }
+    int64_t size() override { return static_cast<int64_t>(bytes.size()); }
+
+    const std::string bytes;
+    const std::vector<size_t> bad; // in order
+    const bool deliversBytesBefore;
+};
+
 // Bytes that are served by callbacks. The counts are the test's to read while no call is under way.
 struct CountingSource final : zarvo::source {
     explicit CountingSource(std::string served) : bytes(std::move(served)) {}
 
     int64_t read_at(std::span<std::byte> buffer, uint64_t offset) override {
-        if (++reads == failingRead) return -EIO;
+        if (++reads == failingRead) return -ETIMEDOUT;
         const size_t start = std::min<uint64_t>(offset, bytes.size());
         const size_t count = std::min({buffer.size(), bytes.size() - start, longestRead});
         memcpy(buffer.data(), bytes.data() + start, count);

@@ -322,8 +322,95 @@ TEST(Reading, BlockAboveTheLimitIsStreamedOrRefused) {
     const std::string bytes = ArchiveOfOneBlock(text, kCompressionLz4, false);
     zarvo::archive archive = OpenBytes(bytes, {.max_block_bytes = 299'999});
     char byte;
-    EXPECT_EQ("block 0 takes 300000 bytes of memory, and the limit is 299999",
+    EXPECT_EQ("block 0 of 300000 bytes is too large to be held in memory",
               archive.read(0, 0, std::as_writable_bytes(std::span(&byte, 1))).error.text());
+}
+
+// What is small when it is decoded may be large as it is stored.
+TEST(Reading, StoredBytesOfABlockAreLimitedToo) {
+    ArchiveDescription description = {.entries = {{.path = "a", .bytes = "text"}}, .type = kCompressionLz4};
+    description.blocks = {{.size = 4, .stored = std::string(300'000, 'x')}};
+    const std::string bytes = BuildArchive(description).bytes;
+    zarvo::archive archive = OpenBytes(bytes, {.max_block_bytes = 299'999});
+    EXPECT_EQ((Delivered{"", ZARVO_ERROR_LIMIT}), Read(archive, 0, 0, 1));
+    EXPECT_EQ((Delivered{"", ZARVO_ERROR_LIMIT}), Read(archive, 0, 0, 4));
+}
+
+// Of files that are stored as they are, only the bytes of the pages that can't be read are lost.
+TEST(Reading, BadPagesOfStoredDataLoseTheirBytesAlone) {
+    const std::string text = SampleText(200'000);
+    ArchiveDescription description{.layout = ArchiveLayout::kRaw};
+    for (size_t from = 0; from < text.size(); from += 1'000)
+        description.entries.push_back({.path = std::to_string(from), .bytes = text.substr(from, 1'000)});
+    const std::string bytes = BuildArchive(description).bytes;
+    const size_t textOffset = bytes.find(text);
+    ASSERT_NE(std::string::npos, textOffset);
+    const std::vector<size_t> bad = {12, 20, 21, 22, 40};
+    for (const bool isExact : {false, true}) {
+        SCOPED_TRACE(isExact);
+        zarvo::archive archive = *zarvo::archive::open(std::make_unique<DamagedMedium>(bytes, bad, isExact));
+        std::map<uint64_t, uint64_t> expected, tested;
+        for (const zarvo::entry entry : archive.entries()) {
+            const size_t begin = textOffset + entry.index() * 1'000, end = begin + entry.size();
+            size_t readable = end;
+            for (const size_t page : bad)
+                if (begin < (page + 1) * 4'096 && end > page * 4'096)
+                    readable = std::min(readable, std::max(begin, page * 4'096));
+            if (readable != end) expected[entry.index()] = readable - begin;
+            const Delivered delivered = {text.substr(entry.index() * 1'000, readable - begin),
+                                         readable == end ? ZARVO_OK : ZARVO_ERROR_SYSTEM};
+            EXPECT_EQ(delivered, Read(archive, entry.index(), 0, 1'000)) << entry.path();
+        }
+        zarvo::test_options test;
+        test.entry = [&](uint64_t index, uint64_t readable) { tested[index] = readable; };
+        std::string said;
+        test.block = [&](uint64_t, std::string_view why) { said += why; };
+        EXPECT_EQ(ZARVO_OK, archive.test({}, test).error.code());
+        EXPECT_EQ(expected, tested);
+        EXPECT_EQ("Input/output error: block 0", said);
+        std::map<uint64_t, std::string> visited;
+        zarvo::visit_options visit;
+        visit.bytes = [&](uint64_t index, uint64_t, std::span<const std::byte> piece) {
+            visited[index].append(reinterpret_cast<const char*>(piece.data()), piece.size());
+        };
+        EXPECT_EQ(expected.size(), archive.visit({.threads = 1}, visit).summary.failures);
+        for (const auto& [index, readable] : expected)
+            EXPECT_EQ(text.substr(index * 1'000, readable), visited[index]) << index;
+    }
+}
+
+// Of a compressed block, what the bytes before a bad page give can be read, in whatever way.
+TEST(Reading, BadPagesOfCompressedBlocksLeaveWhatIsBefore) {
+    std::mt19937 random(3);
+    std::string text(400'000, '?');
+    for (char& letter : text)
+        letter = static_cast<char>('a' + random() % 8);
+    for (const Form& form : EveryForm(text)) {
+        if (form.description.type == kCompressionNone) continue; // "web" keeps its directory in front of the page
+        SCOPED_TRACE(form.what);
+        const std::string bytes = BuildArchive(form.description).bytes;
+        zarvo::archive archive =
+            *zarvo::archive::open(std::make_unique<DamagedMedium>(bytes, std::vector<size_t>{10}, false));
+        const Delivered whole = Read(archive, kTextEntry, 0, text.size());
+        EXPECT_EQ(ZARVO_ERROR_SYSTEM, whole.code);
+        EXPECT_LT(30'000u, whole.bytes.size());
+        EXPECT_EQ(text.substr(0, whole.bytes.size()), whole.bytes);
+
+        std::string inPieces;
+        zarvo::stream stream = *archive.open_stream(kTextEntry);
+        Delivered piece;
+        for (; piece.code == ZARVO_OK; inPieces += piece.bytes)
+            piece = ReadNext(stream, 777);
+        EXPECT_EQ(ZARVO_ERROR_SYSTEM, piece.code);
+        EXPECT_EQ(whole.bytes.size(), inPieces.size());
+        uint64_t tested = 0;
+        zarvo::test_options test;
+        test.entry = [&](uint64_t index, uint64_t readable) {
+            if (index == kTextEntry) tested = readable;
+        };
+        EXPECT_EQ(ZARVO_OK, archive.test({}, test).error.code());
+        EXPECT_EQ(whole.bytes.size(), tested);
+    }
 }
 
 // Blocks without bytes are stepped over in one go.

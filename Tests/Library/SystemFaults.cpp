@@ -11,13 +11,6 @@
 #include <sys/syscall.h>
 #include <unistd.h>
 
-// The sanitizers have a pthread_create of their own, which this program must not replace.
-#if defined(__has_feature)
-#if __has_feature(thread_sanitizer) || __has_feature(address_sanitizer)
-#define VARNEX_UNDER_SANITIZERS
-#endif
-#endif
-
 namespace {
 
 struct Fault {

@@ -9,6 +9,13 @@
 
 #include <cerrno>
 
+// The sanitizers have some of the functions themselves, and a program must not replace those.
+#if defined(__has_feature)
+#if __has_feature(thread_sanitizer) || __has_feature(address_sanitizer)
+#define VARNEX_UNDER_SANITIZERS
+#endif
+#endif
+
 struct FaultDescription {
     const char* call = ""; // openat, mkdirat, linkat, renameat2, pwrite, pthread_create (not under sanitizers); or a
                            // kind of one: O_TMPFILE, AT_EMPTY_PATH, RENAME_NOREPLACE, "link of a name", "/proc"

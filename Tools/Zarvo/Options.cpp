@@ -24,7 +24,7 @@ const Option kOverwrite = {.name = "overwrite",
 const Option kStrip = {
     .name = "strip", .value = "N", .kind = ValueKind::kNumber, .help = "leave out the first N components of each path"};
 const Option kKeepBroken = {.name = "keep-broken", .help = "keep what lies before the damage of damaged files"};
-const Option kDryRun = {.name = "dry-run", .help = "print what -v would, and write nothing"};
+const Option kDryRun = {.name = "dry-run", .help = "read everything, print what -v would, and write nothing"};
 const Option kVerbose = {.letter = 'v', .help = "print the path of each entry that is put in place"};
 const Option kAlgorithm = {.letter = 'a',
                            .value = "NAME",

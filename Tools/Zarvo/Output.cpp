@@ -57,9 +57,7 @@ void OutputBuffer::WriteNow(std::string_view bytes) {
     }
 }
 
-void Console::Say(std::string_view name, std::string_view text) {
-    Say((name.empty() ? "''" : std::string(name)) + ": " + std::string(text));
-}
+void Console::Say(std::string_view name, std::string_view text) { Say(QuoteEmpty(name) + ": " + std::string(text)); }
 
 void Console::Say(std::string_view text) {
     m_Output.Flush();

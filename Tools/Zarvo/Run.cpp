@@ -65,5 +65,5 @@ void Run::WritePath(const zarvo::entry& entry, std::string_view end) const {
 }
 
 void Run::SayOfEntry(const std::string& archive, std::string_view entry, std::string_view text) const {
-    console.Say(archive + ": " + std::string(entry), text);
+    console.Say(archive + ": " + QuoteEmpty(entry), text);
 }

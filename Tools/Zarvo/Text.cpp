@@ -136,6 +136,8 @@ std::string MakeMessage(std::string_view form, std::initializer_list<std::string
     return text;
 }
 
+std::string QuoteEmpty(std::string_view name) { return name.empty() ? "''" : std::string(name); }
+
 std::string DescribeBytes(double bytes) {
     constexpr const char* kUnits[] = {"bytes", "KiB", "MiB", "GiB", "TiB", "PiB", "EiB"};
     size_t unit = 0;

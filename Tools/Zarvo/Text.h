@@ -23,5 +23,8 @@ std::string EncodeBase64(std::string_view bytes);
 // the forms, so they are literals.
 std::string MakeMessage(std::string_view form, std::initializer_list<std::string_view> parts = {});
 
+// A name in a message: an empty one is "''".
+std::string QuoteEmpty(std::string_view name);
+
 // "512 bytes", "1.5 MiB".
 std::string DescribeBytes(double bytes);

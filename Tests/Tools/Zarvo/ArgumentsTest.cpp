@@ -27,7 +27,7 @@ TEST_F(ZarvoArguments, StandAnywhere) {
         {{"list", "list", "b,c", "--", "-l"}, "b,c\n-l\n"},
         {{"list", "./-"}, paths},
         {{"list", "-j", "1", "-j", "2", "-qq", "-lll", "list"}, lines},
-        {{"-qo", "list", "extract", "--dry-run", "list"}, paths}, // "list" is -o's value
+        {{"-qo", "test", "extract", "--dry-run", "list"}, paths}, // "test" is -o's value
         {{"--strip=0", "-qx", "list", "extract", "--dry-run", "list"}, paths},
     };
     for (const auto& [arguments, output] : kCases) {

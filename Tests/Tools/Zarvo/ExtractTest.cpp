@@ -60,11 +60,17 @@ TEST_F(ZarvoExtract, ListsWhatItPutsInPlaceForAnyThreads) {
     }
 }
 
-TEST_F(ZarvoExtract, WritesNothingInADryRun) {
-    MakeArchive("a.zarvo", Archive("a:1 ../b:2 d|"));
-    EXPECT_EQ((Heard{1, "a\nd/\n", "zarvo: a.zarvo: ../b: the path has a component \"..\"\n"}),
-              Extract({"--dry-run", "a.zarvo"}));
+TEST_F(ZarvoExtract, SaysInADryRunWhatItWouldSay) {
+    MakeArchive("a.zarvo", Archive("a:1 ../b:2 d| /:3"));
+    const std::string problems = "zarvo: a.zarvo: ../b: the path has a component \"..\"\n"
+                                 "zarvo: a.zarvo: /: the path is empty\n";
+    EXPECT_EQ((Heard{1, "a\nd/\n", problems}), Extract({"--dry-run", "a.zarvo"}));
     EXPECT_FALSE(fs::exists("a.zarvo_data"));
+    fs::create_directories("a.zarvo_data/a");
+    const Heard heard = Extract({"--dry-run", "a.zarvo"});
+    EXPECT_EQ((Heard{1, "d/\n", "zarvo: a.zarvo: a: Is a directory: a folder is in the place of a file\n" + problems}),
+              heard);
+    EXPECT_EQ(heard, Extract({"-v", "a.zarvo"}));
 }
 
 TEST_F(ZarvoExtract, OverwritesAsAsked) {
@@ -103,12 +109,16 @@ TEST_F(ZarvoExtract, KeepsBrokenFilesOnRequest) {
 TEST_F(ZarvoExtract, NamesTheFolderThatCannotBeMade) {
     MakeArchive("a.zarvo", Archive("a:1 b:2"));
     WriteFile("file", "");
-    EXPECT_EQ((Heard{1, "", "zarvo: file/out: Not a directory\n"}), Extract({"-o", "file/out", "a.zarvo"}));
+    const std::string refusal = "zarvo: file/out: Not a directory\n";
+    EXPECT_EQ((Heard{1, "", refusal}), Extract({"-o", "file/out", "a.zarvo"}));
+    EXPECT_EQ((Heard{1, "", refusal}), Extract({"--dry-run", "-o", "file/out", "a.zarvo"}));
+    EXPECT_THAT(Zarvo({"extract", "-o", "file/out", "a.zarvo"}).error,
+                testing::StartsWith(refusal + "zarvo: a.zarvo: 0 files, 0 bytes, 2 failures, "));
 }
 
 TEST_F(ZarvoExtract, NamesTheSizeOfABlockOverTheBudget) {
     MakeArchive("a.zarvo", Archive("lz4 chunk=4096 a:c4096 b:x"));
-    EXPECT_EQ((Heard{1, "b\n", "zarvo: a.zarvo: a: block 0 takes 4096 bytes of memory, and the limit is 1024\n"}),
+    EXPECT_EQ((Heard{1, "b\n", "zarvo: a.zarvo: a: block 0 of 4096 bytes is too large to be held in memory\n"}),
               Extract({"-v", "--memory=2K", "a.zarvo"}));
 }
 

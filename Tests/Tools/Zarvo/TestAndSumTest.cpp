@@ -109,6 +109,20 @@ TEST_F(ZarvoSum, SaysOfOtherFilesWhatIsWrong) {
               Zarvo({"sum", "a.zarvo"}));
 }
 
+TEST_F(ZarvoSum, SaysNamesThatNoDiskTakes) {
+    const std::string name(256, 'n');
+    MakeArchive("a.zarvo", {.entries = {{.path = name + "/a", .bytes = "x"},
+                                        {.path = "b/" + name, .bytes = "x"},
+                                        {.path = std::string(255, 'n'), .bytes = "1"},
+                                        {.path = "", .bytes = "x"}}});
+    const Heard heard = Zarvo({"sum", "a.zarvo"});
+    EXPECT_EQ((Heard{1, std::string(kDigestOf1) + "  " + std::string(255, 'n') + "\n",
+                     "zarvo: a.zarvo: " + name + "/a: File name too long\n" + "zarvo: a.zarvo: b/" + name +
+                         ": File name too long\n" + "zarvo: a.zarvo: '': the path is empty\n"}),
+              heard);
+    EXPECT_EQ(heard.error, Zarvo({"extract", "-q", "a.zarvo"}).error);
+}
+
 TEST_F(ZarvoSum, TakesPatterns) {
     MakeArchive("a.zarvo", Archive("a:1 b:2 c:1"));
     EXPECT_EQ(
