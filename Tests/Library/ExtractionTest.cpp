@@ -54,6 +54,20 @@ private:
     const uid_t m_User;
 };
 
+// While it is there, the process may have so many descriptors open.
+class FewDescriptors : private NonCopyable {
+public:
+    explicit FewDescriptors(rlim_t count) {
+        EXPECT_EQ(0, getrlimit(RLIMIT_NOFILE, &m_Before));
+        const rlimit few = {count, m_Before.rlim_max};
+        EXPECT_EQ(0, setrlimit(RLIMIT_NOFILE, &few));
+    }
+    ~FewDescriptors() { EXPECT_EQ(0, setrlimit(RLIMIT_NOFILE, &m_Before)); }
+
+private:
+    rlimit m_Before = {};
+};
+
 // How an extraction went: a line for each report, and what it comes to.
 struct Outcome {
     std::string reports = {};
@@ -397,8 +411,6 @@ TEST(Extraction, AnyNumberOfFilesMayShareTheirData) {
         description.fields[node + "size"] = kSize;
     }
     const std::string bytes = BuildArchive(description).bytes;
-    rlimit before = {};
-    ASSERT_EQ(0, getrlimit(RLIMIT_NOFILE, &before));
     for (const rlim_t descriptors : {16, 64, 1'024}) {
         SCOPED_TRACE(descriptors);
         const TemporaryFolder folder;
@@ -406,12 +418,13 @@ TEST(Extraction, AnyNumberOfFilesMayShareTheirData) {
         CountingSource& counts = *source;
         zarvo::archive archive = *zarvo::archive::open(std::move(source));
         counts.bytesRead = 0;
-        const rlimit few = {descriptors, before.rlim_max};
-        ASSERT_EQ(0, setrlimit(RLIMIT_NOFILE, &few));
-        const zarvo::run_result result = archive.extract(folder / "out", {.threads = 2});
-        const SystemFault fault({.call = "pwrite", .number = 400, .error = ENOSPC});
-        const zarvo::run_result failed = archive.extract(folder / "failed", {.threads = 2});
-        ASSERT_EQ(0, setrlimit(RLIMIT_NOFILE, &before));
+        zarvo::run_result result, failed;
+        {
+            const FewDescriptors few(descriptors);
+            result = archive.extract(folder / "out", {.threads = 2});
+            const SystemFault fault({.call = "pwrite", .number = 400, .error = ENOSPC});
+            failed = archive.extract(folder / "failed", {.threads = 2});
+        }
         EXPECT_EQ(kFiles + 1, result.summary.files);
         EXPECT_LE(counts.bytesRead.load(), 2 * archive.info().stored_size);
         const Tree tree = TreeOf(folder / "out");
@@ -455,12 +468,11 @@ TEST(Extraction, TakenTemporaryIsNotWritten) {
     swapping.folder = &folder;
     swapping.bytes = &bytes;
     zarvo::archive archive = *zarvo::archive::open(std::move(source));
-    rlimit before = {};
-    ASSERT_EQ(0, getrlimit(RLIMIT_NOFILE, &before));
-    const rlimit few = {12, before.rlim_max}; // none for a file that stays open
-    ASSERT_EQ(0, setrlimit(RLIMIT_NOFILE, &few));
-    const zarvo::run_result result = archive.extract(folder / "out", {.threads = 1});
-    ASSERT_EQ(0, setrlimit(RLIMIT_NOFILE, &before));
+    zarvo::run_result result;
+    {
+        const FewDescriptors few(12); // none for a file that stays open
+        result = archive.extract(folder / "out", {.threads = 1});
+    }
     EXPECT_EQ(true, swapping.hasSwapped);
     EXPECT_EQ(1u, result.summary.failures);
     EXPECT_EQ("mine", ReadFile(folder / "mine"));
@@ -850,13 +862,45 @@ TEST(Extraction, MissingBlocksCostNextToNothing) {
     EXPECT_EQ("a: block 0 ends after the archive's last byte\n", Extract(bytes, folder.Path()).reports);
 }
 
-// Every call fails once, on file systems of all abilities: what has a name is whole, nothing else is left, and the next
-// run completes it.
-TEST(Extraction, FailingCallsLeaveNothingHalfDone) {
-    const std::string text = SampleText(1'200'000);
-    const std::string bytes =
-        Archive({{.path = "a/b", .bytes = text.substr(0, 100)}, {.path = "c/d", .bytes = text}, {.path = "e"}});
-    const Tree whole = {{"a", "/"}, {"a/b", text.substr(0, 100)}, {"c", "/"}, {"c/d", text}, {"e", ""}};
+class FailingCalls : public testing::Test {
+protected:
+    static constexpr FaultDescription kFaults[] = {
+        {.call = "openat", .error = EMFILE}, {.call = "openat", .error = EINTR},  {.call = "mkdirat", .error = EIO},
+        {.call = "linkat", .error = EIO},    {.call = "renameat2", .error = EIO}, {.call = "pwrite", .error = EIO},
+        {.call = "pwrite", .error = EINTR},  {.call = "pwrite", .error = ENOSPC}, {.call = "pthread_create"},
+    };
+    const std::string m_Text = SampleText(1'200'000);
+    const std::vector<ArchiveEntry> m_Entries = {
+        {.path = "a/b", .bytes = m_Text.substr(0, 100)}, {.path = "c/d", .bytes = m_Text}, {.path = "e"}};
+    const Tree m_Whole = {{"a", "/"}, {"a/b", m_Text.substr(0, 100)}, {"c", "/"}, {"c/d", m_Text}, {"e", ""}};
+
+    // Every call fails once: what has a name is whole, nothing else is left, and the next run completes it.
+    void FailEach(const std::string& bytes) const {
+        for (FaultDescription description : kFaults) {
+            bool hasStruck = true;
+            for (description.number = 1; hasStruck; ++description.number) {
+                SCOPED_TRACE(std::string(description.call) + " " + std::to_string(description.number) + " fails with " +
+                             std::to_string(description.error));
+                const TemporaryFolder folder;
+                const size_t descriptors = CountOpenDescriptors();
+                {
+                    const SystemFault fault(description);
+                    const Outcome outcome = Extract(bytes, folder / "out");
+                    hasStruck = fault.HasStruck();
+                    EXPECT_EQ(3u, outcome.files + outcome.failures) << outcome;
+                    EXPECT_EQ(true, hasStruck || outcome.files == 3) << outcome;
+                }
+                EXPECT_EQ(descriptors, CountOpenDescriptors());
+                for (const auto& [name, there] : TreeOf(folder / "out"))
+                    EXPECT_EQ(true, m_Whole.contains(name) && m_Whole.at(name) == there) << name;
+                EXPECT_EQ(0u, Extract(bytes, folder / "out").failures);
+                EXPECT_EQ(true, m_Whole == TreeOf(folder / "out"));
+            }
+        }
+    }
+};
+
+TEST_F(FailingCalls, LeaveNothingHalfDoneOnAnyFileSystem) {
     const struct {
         const char* what;
         std::vector<FaultDescription> lacks;
@@ -871,36 +915,25 @@ TEST(Extraction, FailingCallsLeaveNothingHalfDone) {
                    {.call = "RENAME_NOREPLACE", .error = EINVAL},
                    {.call = "link of a name", .error = EPERM}}},
     };
-    const FaultDescription faults[] = {
-        {.call = "openat", .error = EMFILE}, {.call = "openat", .error = EINTR},  {.call = "mkdirat", .error = EIO},
-        {.call = "linkat", .error = EIO},    {.call = "renameat2", .error = EIO}, {.call = "pwrite", .error = EIO},
-        {.call = "pwrite", .error = EINTR},  {.call = "pwrite", .error = ENOSPC}, {.call = "pthread_create"},
-    };
     for (const auto& fileSystem : fileSystems) {
+        SCOPED_TRACE(fileSystem.what);
         std::deque<SystemFault> lacking;
         for (const FaultDescription& lack : fileSystem.lacks)
             lacking.emplace_back(lack);
-        for (FaultDescription description : faults) {
-            bool hasStruck = true;
-            for (description.number = 1; hasStruck; ++description.number) {
-                SCOPED_TRACE(std::string(fileSystem.what) + ": " + description.call + " " +
-                             std::to_string(description.number) + " fails with " + std::to_string(description.error));
-                const TemporaryFolder folder;
-                const size_t descriptors = CountOpenDescriptors();
-                {
-                    const SystemFault fault(description);
-                    const Outcome outcome = Extract(bytes, folder / "out");
-                    hasStruck = fault.HasStruck();
-                    EXPECT_EQ(true, hasStruck || outcome.files == 3) << outcome;
-                }
-                EXPECT_EQ(descriptors, CountOpenDescriptors());
-                for (const auto& [name, there] : TreeOf(folder / "out"))
-                    EXPECT_EQ(true, whole.contains(name) && whole.at(name) == there) << name;
-                EXPECT_EQ(0u, Extract(bytes, folder / "out").failures);
-                EXPECT_EQ(true, whole == TreeOf(folder / "out"));
-            }
-        }
+        FailEach(Archive(m_Entries));
     }
+}
+
+TEST_F(FailingCalls, LeaveNothingHalfDoneOfAStream) {
+    const std::string bytes =
+        BuildArchive({.entries = m_Entries, .chunkSize = 0, .type = kCompressionLzma, .streamed = true}).bytes;
+    FailEach(bytes);
+}
+
+// Files in several parts are opened again for each.
+TEST_F(FailingCalls, LeaveNothingHalfDoneWithFewDescriptors) {
+    const FewDescriptors few(16);
+    FailEach(Archive(m_Entries));
 }
 
 // A name that a killed process with this one's number has left is passed over.
@@ -927,12 +960,11 @@ TEST(Extraction, FewDescriptorsAreEnough) {
     }
     const std::string bytes = Archive(entries, kCompressionNone);
     const TemporaryFolder folder;
-    rlimit before = {};
-    ASSERT_EQ(0, getrlimit(RLIMIT_NOFILE, &before));
-    const rlimit few = {16, before.rlim_max};
-    ASSERT_EQ(0, setrlimit(RLIMIT_NOFILE, &few));
-    const Outcome outcome = Extract(bytes, folder / "out", {.threads = 8});
-    ASSERT_EQ(0, setrlimit(RLIMIT_NOFILE, &before));
+    Outcome outcome;
+    {
+        const FewDescriptors few(16);
+        outcome = Extract(bytes, folder / "out", {.threads = 8});
+    }
     EXPECT_EQ(0u, outcome.failures) << outcome;
     EXPECT_EQ(entries.size(), outcome.files);
 }
