@@ -8,8 +8,9 @@ import shutil
 import sys
 import tempfile
 
-from compare import DEFAULT_FOLDER, KINDS, print_comparison
+from compare import print_comparison
 from flat import print_flatness
+from packing import DEFAULT_FOLDER, KINDS
 
 
 def roomiest_memory_folder():
@@ -23,8 +24,10 @@ def write_docs(name, text):
     """Replaces the text between the two comments of that name in docs/performance.md."""
     path = os.path.join(os.path.dirname(os.path.abspath(__file__)), "..", "docs", "performance.md")
     with open(path) as file:
-        before, _, rest = file.read().partition(f"<!-- {name}: begin -->\n")
-    after = rest.partition(f"<!-- {name}: end -->")[2]
+        before, begin, rest = file.read().partition(f"<!-- {name}: begin -->\n")
+    _, end, after = rest.partition(f"<!-- {name}: end -->")
+    if not begin or not end:
+        sys.exit(f"docs/performance.md has no place for {name}")
     with open(path, "w") as file:
         file.write(f"{before}<!-- {name}: begin -->\n{text.strip()}\n<!-- {name}: end -->{after}")
 
@@ -36,7 +39,8 @@ def main():
     parser.add_argument("--flat", action="store_true",
                         help="instead of comparing, measure the cost per file and per byte as their number grows")
     parser.add_argument("--write-docs", action="store_true", help="also put the tables into docs/performance.md")
-    parser.add_argument("--kinds", help=f"only these archives, and those they are compared with: {','.join(KINDS)}")
+    parser.add_argument("--kinds", default=",".join(KINDS),
+                        help="only these archives, and those they are compared with (default: %(default)s)")
     parser.add_argument("--rounds", type=int, default=7)
     parser.add_argument("--scratch", default=f"{temporary}/varnex-bench", help="where packed archives are kept (default: %(default)s)")
     parser.add_argument("--memory", default=roomiest_memory_folder(),
@@ -44,6 +48,7 @@ def main():
     parser.add_argument("--disk", default=temporary, help="a folder on a disk, or '' not to measure it")
     parser.add_argument("--build", help=argparse.SUPPRESS)
     options = parser.parse_args()
+    options.kinds = options.kinds.split(",")
     if not options.memory:
         sys.exit("there is no writable memory file system: name one with --memory")
     os.makedirs(options.scratch, exist_ok=True)

@@ -1,13 +1,12 @@
 """Measures whether the cost per file and per byte stays the same as one archive holds more of them."""
 
-import os
-import re
 import shutil
-import sys
 import tempfile
 
-from compare import DEFAULT_FOLDER, make_tree
-from measuring import Row, count_calls, cpu, measure, median, run, table
+from compare import varnex_row
+from measuring import count_calls, cpu, has_room, measure, median, progress, run
+from packing import make_tree, write_data
+from tables import table
 
 FILE_COUNTS = [1_000, 10_000, 100_000, 1_000_000]
 FILES_WITH_COUNTED_CALLS = 10_000  # strace slows calls down a lot
@@ -17,36 +16,13 @@ ARCHIVE = "flat.zarvo"
 
 def measure_archive(options, kind, source, counts_calls=False):
     """Packs the source on the disk. Returns the median cost of extracting it in memory, and the system calls."""
-    row = Row("", ARCHIVE, [f"{options.build}/Varnex", ARCHIVE], ARCHIVE + "_data")
+    row = varnex_row("", options.build, ARCHIVE)
     with tempfile.TemporaryDirectory(prefix="varnex-flat-", dir=options.memory) as folder:
         with tempfile.TemporaryDirectory(dir=options.scratch) as packed:
             run([f"{options.build}/Benchmarks/PackFolder", kind, str(source), f"{packed}/{ARCHIVE}"])
             shutil.copyfile(f"{packed}/{ARCHIVE}", f"{folder}/{ARCHIVE}")
         calls = count_calls(row, folder) if counts_calls else None
         return median([measure(options.build, row, folder) for _ in range(options.rounds)]), calls
-
-
-def write_data(tree, path, size):
-    """Writes a file of that size: the tree's files one after another, repeated."""
-    with open(path, "wb") as out:
-        while True:
-            for parent, folders, names in os.walk(tree):
-                folders.sort()
-                for name in sorted(names):
-                    with open(os.path.join(parent, name), "rb") as source:
-                        out.write(source.read(size - out.tell()))
-                    if out.tell() == size:
-                        return
-
-
-def progress(text):
-    print(text, file=sys.stderr, flush=True)
-
-
-def has_room(folder, size):
-    with open("/proc/meminfo") as file:
-        available = int(re.search(r"MemAvailable:\s*(\d+)", file.read()).group(1)) * 1024
-    return min(available, shutil.disk_usage(folder).free) > size
 
 
 def print_flatness(options):
@@ -60,7 +36,7 @@ def print_flatness(options):
     print(f"Empty files in folders of 1,000, on a memory file system, medians of {options.rounds} rounds:")
     table(["files", "wall, s", "wall per file, µs", "processor per file, µs", "peak, MiB", "system calls per file"], lines)
 
-    tree = make_tree(os.path.abspath(options.folder or DEFAULT_FOLDER), options.folder is None, options.scratch)
+    tree = make_tree(options)
     lines = []
     for size in BYTE_COUNTS:
         if not has_room(options.memory, 2.1 * size):  # the archive and the extracted file
