@@ -145,4 +145,5 @@ def print_huge(options):
 def print_small(options):
     """Only what the target needs, and only in memory: on a disk, making and removing the files would take minutes."""
     title = f"{SMALL_FILES:,} files of at most {SMALL_FILE} bytes"
-    print_one_archive(options, make_small(options), title, WANTED_SMALL_TO_VARNEX, ("single-lz4hc", "test-lz4hc"), False)
+    print_one_archive(options, make_small(options), title, WANTED_SMALL_TO_VARNEX,
+                      left_out=("single-lz4hc", "test-lz4hc"), on_disk=False)

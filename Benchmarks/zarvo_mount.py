@@ -8,15 +8,15 @@ import time
 from collections import namedtuple
 
 from measuring import Sample, parse_measured, place, progress, run, sizes_of, take_turns
-from packing import PEERS, describe_tree, make_tree, pack_all
+from packing import KINDS, PEERS, describe_tree, make_tree, pack_all
 from tables import Target, describe_machine, print_costs, print_targets
 from zarvo_extract import HUGE_FILE, command, make_huge
 
 POINT = "mnt"
 RANDOM_READS = f"python3 -B {os.path.dirname(os.path.abspath(__file__))}/random_reads.py {POINT}/data "
 
-# What is read of which archive: the name, its name in the tables, the folder of the archives, our archive, who has packed
-# the one for squashfuse, and the command in the language of the shell.
+# What is read of which archive: a name, its name in the tables, the folder of the archives, the kind of ours, the peer
+# that packs for squashfuse (None: it stands beside zarvo test instead), and the command in the language of the shell.
 Case = namedtuple("Case", "name title folder kind peer command")
 CASES = [
     # tar reads no files if it writes to /dev/null; what it writes to a pipe it has read.
@@ -26,8 +26,8 @@ CASES = [
          f"find {POINT} -type f -print0 | xargs -0 -n 100 -P 2 grep -a -c ."),
     Case("random-lz4hc", "10,000 random reads, LZ4HC", "huge", "lz4hc", "squashfs-lz4hc", RANDOM_READS + "10000"),
     Case("random-lzma", "1,000 random reads, LZMA or xz", "huge", "lzma", "squashfs-xz", RANDOM_READS + "1000"),
-    Case("sequential-lz4hc", "`cat`, LZ4HC", "huge", "lz4hc", "squashfs-lz4hc", f"cat {POINT}/data"),
-    Case("sequential-lzma", "`cat`, LZMA or xz", "huge", "lzma", "squashfs-xz", f"cat {POINT}/data"),
+    Case("sequential-lz4hc", "`cat`, LZ4HC", "huge", "lz4hc", None, f"cat {POINT}/data"),
+    Case("sequential-lzma", "`cat`, LZMA", "huge", "lzma", None, f"cat {POINT}/data"),
 ]
 SQUASHFUSES = ["squashfuse", "squashfuse_ll"]
 
@@ -42,15 +42,17 @@ def make_rows(build):
     rows = {}
     for case in CASES:
         reader = ["bash", "-o", "pipefail", "-c", case.command]
-        archive, squashed = f"{case.folder}/{case.kind}.zarvo", f"{case.folder}/{PEERS[case.peer].archive}"
+        archive = f"{case.folder}/{case.kind}.zarvo"
         rows[case.name] = MountedRow(f"**`mount`: {case.title}**", archive,
                                      [f"{build}/zarvo", "mount", "-f", archive, POINT], reader)
+        if case.peer is None:
+            rows["test-" + case.name] = MountedRow(f"`zarvo test`, {KINDS[case.kind]}", archive, None,
+                                                   command(build, "test", archive))
+            continue
+        squashed = f"{case.folder}/{PEERS[case.peer].archive}"
         for program in SQUASHFUSES:
             rows[f"{program}-{case.name}"] = MountedRow(f"`{program}`: {case.title}", squashed,
                                                         [program, "-f", squashed, POINT], reader)
-        if case.name.startswith("sequential"):
-            rows["test-" + case.name] = MountedRow(f"`zarvo test`, {case.title}", archive, None,
-                                                   command(build, "test", archive))
     return rows
 
 
@@ -96,7 +98,8 @@ def print_mounts(options):
         os.mkdir(f"{folder}/{POINT}")
         for name, source in sources.items():
             cases = [case for case in CASES if case.folder == name]
-            archives = pack_all(options.build, source, {case.kind for case in cases}, {case.peer for case in cases})
+            archives = pack_all(options.build, source, {case.kind for case in cases},
+                                {case.peer for case in cases if case.peer})
             os.mkdir(f"{folder}/{name}")
             place(archives, {os.path.basename(row.archive) for row in rows.values() if row.archive.startswith(name)},
                   f"{folder}/{name}")
@@ -107,7 +110,6 @@ def print_mounts(options):
           f"medians of {options.rounds} rounds")
     describe_machine()
     print_costs(rows, sizes, medians, {})
-    print_targets(rows, medians,
-                  [Target(case.name, f"squashfuse-{case.name}", "wall", WANTED_TO_SQUASHFUSE) for case in CASES] +
-                  [Target(name, f"test-{name}", "wall", WANTED_SEQUENTIAL_TO_TEST)
-                   for name in ("sequential-lz4hc", "sequential-lzma")], [])
+    targets = [Target(case.name, f"squashfuse-{case.name}", "wall", WANTED_TO_SQUASHFUSE) if case.peer else
+               Target(case.name, f"test-{case.name}", "wall", WANTED_SEQUENTIAL_TO_TEST) for case in CASES]
+    print_targets(rows, medians, targets, [])
