@@ -87,7 +87,7 @@ def main():
     parser.add_argument("--write-docs", action="store_true", help="also put the tables into docs/performance.md")
     parser.add_argument("--kinds", default=",".join(KINDS),
                         help="only these archives, and those they are compared with (default: %(default)s)")
-    parser.add_argument("--rounds", type=int, help="how often each command runs (default: 7, and 5 with --zarvo)")
+    parser.add_argument("--rounds", type=int, help="how often each command runs (default: 7, and 4 with --zarvo)")
     parser.add_argument("--scratch", default=f"{temporary}/varnex-bench",
                         help="where packed archives are kept (default: %(default)s)")
     parser.add_argument("--memory", default=roomiest_memory_folder(),
@@ -96,7 +96,7 @@ def main():
     parser.add_argument("--build", help=argparse.SUPPRESS)
     options = parser.parse_args()
     options.kinds = options.kinds.split(",")
-    options.rounds = options.rounds or (5 if options.zarvo else 7)
+    options.rounds = options.rounds or (4 if options.zarvo else 7)
     if not options.memory:
         sys.exit("there is no writable memory file system: name one with --memory")
     os.makedirs(options.scratch, exist_ok=True)
