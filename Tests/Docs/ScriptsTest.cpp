@@ -40,17 +40,20 @@ TEST_F(Scripts, AskForAllTheirPackagesAtOnce) {
     Replace("sudo", "exit 1");
     Replace("id", "echo 1000");
     const std::string build = "g++ cmake ninja-build liblz4-dev lzma-dev libcli11-dev nlohmann-json3-dev libssl-dev ",
-                      test = build + "libgtest-dev clang libclang-rt-14-dev llvm",
+                      test = build + "libgtest-dev clang libclang-rt-14-dev llvm jq",
                       lint = build + "libgtest-dev libbenchmark-dev liblzma-dev clang clang-tidy-14 gcovr git python3";
     struct Row {
         std::string script;
         std::vector<std::string> arguments;
         std::string packages;
     };
-    for (const Row& row : {Row{.script = "test", .arguments = {}, .packages = test + " pkgconf dpkg-dev file"},
-                           Row{.script = "test", .arguments = {"debug"}, .packages = test},
-                           Row{.script = "bench", .arguments = {"--help"}, .packages = "python3"},
-                           Row{.script = "includes", .arguments = {}, .packages = lint}})
+    for (const Row& row :
+         {Row{.script = "test",
+         .arguments = {},
+         .packages = test + " build-essential debhelper lintian pkgconf shared-mime-info libglib2.0-bin"},
+          Row{.script = "test", .arguments = {"debug"}, .packages = test},
+          Row{.script = "bench", .arguments = {"--help"}, .packages = "python3"},
+          Row{.script = "includes", .arguments = {}, .packages = lint}})
         EXPECT_EQ(Transcript(1, "Installing " + row.packages + "\n"), Run(row.script, row.arguments)) << row.script;
 }
 
