@@ -1,36 +1,22 @@
 // What the scripts print, with small programs in place of the system's.
-#include "Tests/Support/RunVarnex.h"
-#include "Tests/Support/TemporaryFolder.h"
+#include "Tests/Docs/ScriptFolder.h"
 
 namespace fs = std::filesystem;
 
-class Scripts : public testing::Test {
+class Scripts : public ScriptFolder {
 protected:
-    Scripts() {
-        fs::copy(VARNEX_SOURCE_DIR "/scripts", m_Folder / "scripts");
-        Replace("apt-get", "exit 1");
-    }
+    Scripts() { Replace("apt-get", "exit 1"); }
 
-    // Makes a program that runs a line of shell, and that is found before the system's program of the same name.
-    void Replace(const std::string& name, const std::string& line) {
-        fs::create_directory(m_Folder / "bin");
-        WriteFile(m_Folder / ("bin/" + name), "#!/bin/sh\n" + line + "\n");
-        fs::permissions(m_Folder / ("bin/" + name), fs::perms::owner_all);
+    Transcript RunScript(const std::string& script, const std::vector<std::string>& arguments) {
+        return Run(m_Folder / ("scripts/" + script), arguments);
     }
-
-    Transcript Run(const std::string& script, const std::vector<std::string>& arguments) {
-        const auto findReplaced = [&] { return setenv("PATH", (m_Folder / "bin:" + getenv("PATH")).c_str(), 1) == 0; };
-        return RunProgram((m_Folder / ("scripts/" + script)).c_str(), arguments, m_Folder.Path(), findReplaced);
-    }
-
-    const TemporaryFolder m_Folder;
 };
 
 TEST_F(Scripts, SayWhenThereIsNoCheckout) {
     for (const std::string script : {"format", "lines", "includes"}) {
         const std::vector<std::string> arguments(script == "format" ? 1 : 0, "--check");
         const std::string said = m_Folder / ("scripts/" + script) + ": needs a git checkout, which lists the sources\n";
-        EXPECT_EQ(Transcript(1, said), Run(script, arguments));
+        EXPECT_EQ(Transcript(1, said), RunScript(script, arguments));
     }
 }
 
@@ -54,11 +40,12 @@ TEST_F(Scripts, AskForAllTheirPackagesAtOnce) {
           Row{.script = "test", .arguments = {"debug"}, .packages = test},
           Row{.script = "bench", .arguments = {"--help"}, .packages = "python3"},
           Row{.script = "includes", .arguments = {}, .packages = lint}})
-        EXPECT_EQ(Transcript(1, "Installing " + row.packages + "\n"), Run(row.script, row.arguments)) << row.script;
+        EXPECT_EQ(Transcript(1, "Installing " + row.packages + "\n"), RunScript(row.script, row.arguments))
+            << row.script;
 }
 
 TEST_F(Scripts, ExtractHelps) {
-    const auto [status, said] = Run("extract", {"--help"});
+    const auto [status, said] = RunScript("extract", {"--help"});
     EXPECT_EQ(0, status);
     EXPECT_EQ("Usage: " + (m_Folder / "scripts/extract") + " [ARCHIVE]", said.substr(0, said.find('\n')));
 }
@@ -67,9 +54,9 @@ TEST_F(Scripts, ExtractSaysHowFarItsBuildIs) {
     Replace("dpkg-query", "echo installed");
     Replace("cmake", "printf '[0/9] Looking\\n[3/9] Building\\n[4/9] Linking\\n'\n"
                      "mkdir -p build/release && ln -sf /bin/true build/release/Varnex");
-    EXPECT_EQ(Transcript(0, "Building, step 3 of 9\n"), Run("extract", {"a.zarvo"}));
+    EXPECT_EQ(Transcript(0, "Building, step 3 of 9\n"), RunScript("extract", {"a.zarvo"}));
     Replace("cmake", "printf '[3/9] broken\\n'; exit 1");
-    const auto [status, said] = Run("extract", {"a.zarvo"});
+    const auto [status, said] = RunScript("extract", {"a.zarvo"});
     EXPECT_EQ(1, status);
     EXPECT_NE(std::string::npos, said.find("\n[3/9] broken\n")) << said;
 }
@@ -82,7 +69,7 @@ TEST_F(Scripts, TestSaysWhyATestWasSkipped) {
     WriteFile(m_Folder / "build/debug/Testing/Temporary/LastTest.log",
               "[ RUN      ] A.B\na.cpp:12: Skipped\nno such device\n\n[  SKIPPED ] A.B (0 ms)\n[  SKIPPED ] 1 test, "
               "listed below:\n");
-    const auto [status, said] = Run("test", {"debug"});
+    const auto [status, said] = RunScript("test", {"debug"});
     EXPECT_EQ(0, status);
     EXPECT_TRUE(said.ends_with("\nSkipped (debug): A.B: no such device\n1 passed, 0 failed, 1 skipped\n")) << said;
 }
