@@ -20,6 +20,7 @@ zarvo_code Extraction::Extract(const char* folder, Failure* failure) {
                             static_cast<unsigned long long>(bytes), static_cast<unsigned long long>(m_How.max_bytes));
     if (code == ZARVO_OK) code = OpenFolder(folder, failure);
     if (code == ZARVO_OK) code = AddPlanned(m_Plan, failure);
+    m_Looker = {};
     if (code == ZARVO_OK) return Run(failure);
     SetAllFailed();
     return code;
@@ -189,10 +190,12 @@ zarvo_code Extraction::CutShared(Worker* worker, OutputFile* file, Failure* fail
 // Removes the file unless it has its name.
 void Extraction::FreeShared(Worker* worker, OutputFile* file) {
     Failure failure;
-    if (file->isOpen)
+    if (file->isOpen) {
         m_OpenFiles.fetch_sub(1, std::memory_order_relaxed);
-    else if (const int folder = FindFolder(worker, file->entry, &failure); folder >= 0)
-        file->file.Remove(folder);
+    } else if (file->file.IsNamed()) {
+        const int folder = FindFolder(worker, file->entry, &failure);
+        if (folder >= 0) file->file.Remove(folder);
+    }
     Delete(file, kMemLabelFileSystem);
 }
 

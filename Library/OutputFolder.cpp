@@ -339,7 +339,7 @@ zarvo_code NewFile::CutClosed(int folder, UInt64 size, Failure* failure) const {
 }
 
 void NewFile::Remove(int folder) {
-    if (m_Name[0] != '\0') unlinkat(folder, m_Name, 0);
+    if (IsNamed()) unlinkat(folder, m_Name, 0);
     m_Name[0] = '\0';
 }
 
@@ -375,7 +375,7 @@ int NewFile::Close() {
 }
 
 zarvo_code NewFile::Place(int folder, const char* name, bool replaces, Failure* failure) {
-    const bool isNamed = m_Name[0] != '\0';
+    const bool isNamed = IsNamed();
     if (isNamed && Close() != 0) return failure->SetSystem(errno);
     const int answer = isNamed ? RenameToNew(folder, m_Name, name) : LinkFile(m_Descriptor, folder, name);
     if (answer == 0) {

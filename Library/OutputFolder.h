@@ -119,6 +119,7 @@ public:
     zarvo_code WriteClosed(int folder, UInt64 offset, const UInt8* bytes, UInt64 size, Failure* failure) const;
     zarvo_code CutClosed(int folder, UInt64 size, Failure* failure) const;
     void Remove(int folder);
+    bool IsNamed() const { return m_Name[0] != '\0'; } // temporarily
 
     // Gives the file its name in the folder that it was created in. A file, link, device, pipe or socket of that name
     // is never opened. If replaces is true, it is replaced; otherwise it is left alone, the failure is EEXIST, and
