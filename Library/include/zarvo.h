@@ -1,6 +1,6 @@
 /* SPDX-License-Identifier: MIT */
 /*
- * libzarvo: reads archives of the Zarvo engine's formats.
+ * libzarvo: reads and makes archives of the Zarvo engine's formats.
  *
  *     zarvo_error *error = NULL;
  *     zarvo_archive *archive = NULL;
@@ -21,9 +21,9 @@
  * as they are or compressed. Each entry of the directory names a range of the data. All four layouts are opened alike.
  *
  * Threads. Any number of threads may use one archive at once, or call functions that take no handle. A zarvo_stream, a
- * zarvo_patterns and a zarvo_error belong to one thread at a time. Close an archive only when no call is using it and
- * its streams have been freed. After fork(), parent and child may both go on using an archive, if no call was using it
- * at that moment.
+ * zarvo_patterns, a zarvo_writer and a zarvo_error belong to one thread at a time. Close an archive only when no call
+ * is using it and its streams have been freed. After fork(), parent and child may both go on using an archive, if no
+ * call was using it at that moment.
  *
  * Errors. A function that can fail returns a zarvo_code. Where its last parameter is a zarvo_error**, that may be NULL,
  * or point to a pointer that is NULL: a failure stores an error there, which the caller frees. Results that a function
@@ -72,7 +72,7 @@ enum {
     ZARVO_ERROR_CHANGED = 8,        /* the archive's file has changed since it was opened */
     ZARVO_ERROR_NOT_FOUND = 9,      /* no entry has that path */
     ZARVO_ERROR_STOPPED = 10,       /* the progress callback stopped the run */
-    ZARVO_ERROR_REFUSED = 11        /* extraction refuses the entry's path, or another entry has its place */
+    ZARVO_ERROR_REFUSED = 11        /* the entry's path is refused, or another entry has its place */
 };
 
 typedef struct zarvo_error zarvo_error;
@@ -367,8 +367,8 @@ typedef struct zarvo_progress {
     uint64_t files_total; /* entries that will have one */
 } zarvo_progress;
 
-/* What zarvo_extract, zarvo_test and zarvo_visit have in common. A zero, or NULL, asks for the default. The callbacks
- * are called on the calling thread unless they say otherwise, with no lock held. */
+/* What all runs have in common: zarvo_extract, zarvo_test, zarvo_visit and those that make archives. A zero, or NULL,
+ * asks for the default. The callbacks are called on the calling thread unless they say otherwise, with no lock held. */
 typedef struct zarvo_run_options {
     size_t struct_size;
 
@@ -389,10 +389,11 @@ typedef struct zarvo_run_options {
 
 /* What became of an entry. */
 enum {
-    ZARVO_OUTCOME_DONE = 0,   /* put in place */
-    ZARVO_OUTCOME_KEPT = 1,   /* what was there was left (ZARVO_OVERWRITE_NEVER) */
-    ZARVO_OUTCOME_FAILED = 2, /* see code and text */
-    ZARVO_OUTCOME_BROKEN = 3  /* failed, but the bytes before the damage were put in place (keep_broken) */
+    ZARVO_OUTCOME_DONE = 0,    /* put in place */
+    ZARVO_OUTCOME_KEPT = 1,    /* what was there was left (ZARVO_OVERWRITE_NEVER) */
+    ZARVO_OUTCOME_FAILED = 2,  /* see code and text */
+    ZARVO_OUTCOME_BROKEN = 3,  /* failed, but the bytes before the damage were put in place (keep_broken) */
+    ZARVO_OUTCOME_LEFT_OUT = 4 /* not put into the archive that is made; see text */
 };
 typedef struct zarvo_report {
     size_t struct_size;
@@ -435,9 +436,10 @@ typedef struct zarvo_summary {
                           failed, but for ZARVO_ERROR_STOPPED (zarvo_test: entries with unreadable bytes) */
     uint64_t bytes;    /* of these files */
     uint64_t damaged_blocks;
+    uint64_t archive_bytes; /* of the archive that was made */
 } zarvo_summary;
 #define ZARVO_SUMMARY_INIT                                                                                             \
-    { sizeof(zarvo_summary), 0, 0, 0, 0, 0, 0 }
+    { sizeof(zarvo_summary), 0, 0, 0, 0, 0, 0, 0 }
 
 /* Writes entries below folder, which is made if it is missing, with the folders above it. Nothing is written elsewhere:
  * links below it are not followed, and paths with ".." are refused. A new file gets its name only when it is whole, and
@@ -489,6 +491,94 @@ typedef struct zarvo_visit_options {
 /* Hands the bytes of files to a callback, and decodes each block once. Otherwise as zarvo_extract. */
 ZARVO_API zarvo_code zarvo_visit(zarvo_archive* archive, const zarvo_run_options* options,
                                  const zarvo_visit_options* what, zarvo_summary* summary, zarvo_error** error);
+
+/* ---- Making archives ------------------------------------------------------------------------------------------- */
+
+#define ZARVO_DEFAULT (-1)
+
+/* What became of a file or folder that was to be put into an archive. */
+typedef struct zarvo_create_report {
+    size_t struct_size;
+    const char* path;   /* in the archive: NUL-terminated, valid until the callback returns. Empty: the folder itself */
+    size_t path_length; /* bytes */
+    int32_t kind;       /* ZARVO_FILE or ZARVO_FOLDER */
+    int32_t outcome;    /* ZARVO_OUTCOME_DONE, _LEFT_OUT, or _FAILED: no archive is made, for the reason in text */
+    zarvo_code code;    /* of a failure, else ZARVO_OK */
+    int system_code;    /* an errno, or 0 */
+    const char* text;   /* as zarvo_error_text; valid until the callback returns */
+} zarvo_create_report;
+
+/* What an archive is to be like. A zero, or NULL, asks for the default, except where ZARVO_DEFAULT does. What the
+ * layout gives no choice of has to be the default. */
+typedef struct zarvo_create_options {
+    size_t struct_size;
+    int32_t layout;      /* ZARVO_LAYOUT_... Default: ZARVO_LAYOUT_FS */
+    int32_t compression; /* ZARVO_KIND_... of the blocks. ZARVO_DEFAULT: LZ4HC, or LZMA if is_streamed is set. No choice
+                            in ZARVO_LAYOUT_WEB (one LZMA stream) and ZARVO_LAYOUT_RAW (stored as is). A block that does
+                            not shrink is stored as it is */
+    int32_t level;       /* of the coder: 1 to 12 for LZ4HC, 0 to 9 for LZMA. ZARVO_DEFAULT: 9 and 5. The others have no
+                            levels. The bytes of an archive depend on the version of the coder, too */
+    int32_t is_streamed; /* 1: blocks can only be decoded from their start on. Not with LZ4 and LZ4HC. No choice in
+                            ZARVO_LAYOUT_WEB and ZARVO_LAYOUT_RAW */
+    uint64_t block_size; /* decoded bytes, 4,096 to 2^30. Default: 131,072. No choice in ZARVO_LAYOUT_WEB and
+                            ZARVO_LAYOUT_RAW */
+    const char* engine_version;  /* that the archive says it is for. Default: "5.x.x" */
+    const char* engine_revision; /* Default: "7041.3.0b12" */
+    int32_t force;               /* 1: replace a file, or a link, that has the archive's name */
+    int32_t dry_run;             /* 1: nothing is written, and only folders are read */
+
+    /* Called for each file or folder that is left out or fails, and if the run succeeds, at its end for each that was
+     * put into the archive, in the archive's order. May be NULL. */
+    void (*report)(void* context, const zarvo_create_report* report);
+
+    /* Receives remarks that are not an error: a line without a newline. May be NULL. */
+    void (*log)(void* context, const char* message);
+} zarvo_create_options;
+#define ZARVO_CREATE_OPTIONS_INIT                                                                                      \
+    { sizeof(zarvo_create_options), 0, ZARVO_DEFAULT, ZARVO_DEFAULT, 0, 0, NULL, NULL, 0, 0, NULL, NULL }
+
+/* Makes an archive of what lies below a folder. The entries are sorted by the bytes of their paths, so the same files
+ * and options give the same bytes, for any number of threads. Hard links become files of their own. Links, devices,
+ * pipes and sockets are left out, and so are folders where the layout has none: a folder that holds files is left out
+ * without a report. The archive itself is never put into it.
+ *
+ * path: where the archive goes. It is written beside that, to a file named ".NAME.zarvo-part", and gets its name when
+ * it is whole and on the disk. What was there is kept unless how says force: then ZARVO_ERROR_SYSTEM with EEXIST.
+ *
+ * options, how and summary may be NULL; options may not have wanted patterns. Each thread takes twice the size of a
+ * block and the memory of its coder, which for LZMA is about 12 times the dictionary. A file that changes its size,
+ * vanishes or can't be read, and whatever the layout can't hold, is an error of its entry, and no archive is made.
+ * summary counts what was left out as failures. */
+ZARVO_API zarvo_code zarvo_create(const char* path, const char* folder, const zarvo_run_options* options,
+                                  const zarvo_create_options* how, zarvo_summary* summary, zarvo_error** error);
+
+/* Collects entries from memory and callbacks, and makes an archive of them. The order of adding does not matter. */
+typedef struct zarvo_writer zarvo_writer;
+
+ZARVO_API zarvo_code zarvo_writer_new(zarvo_writer** writer, zarvo_error** error);
+
+/* These functions add an entry. path: components separated by "/", none of them empty, "." or "..", and without "\\".
+ * ZARVO_ERROR_REFUSED if it is anything else.
+ *
+ * data: must stay unchanged, and allocated, until the writer is freed. */
+ZARVO_API zarvo_code zarvo_writer_add_memory(zarvo_writer* writer, const char* path, size_t length, const void* data,
+                                             size_t size, zarvo_error** error);
+
+/* source: copied. Its size is asked for at once, its bytes while an archive is made. Closed when the writer is freed,
+ * or the entry could not be added. */
+ZARVO_API zarvo_code zarvo_writer_add_source(zarvo_writer* writer, const char* path, size_t length,
+                                             const zarvo_source* source, zarvo_error** error);
+
+ZARVO_API zarvo_code zarvo_writer_add_folder(zarvo_writer* writer, const char* path, size_t length,
+                                             zarvo_error** error);
+
+/* As zarvo_create, of the entries that were added. Two entries with the same path, and a file in the place of a folder,
+ * are ZARVO_ERROR_REFUSED. Patterns are not used. May be called again. */
+ZARVO_API zarvo_code zarvo_writer_write(zarvo_writer* writer, const char* path, const zarvo_run_options* options,
+                                        const zarvo_create_options* how, zarvo_summary* summary, zarvo_error** error);
+
+/* NULL is allowed. */
+ZARVO_API void zarvo_writer_free(zarvo_writer* writer);
 
 #ifdef __cplusplus
 }

@@ -124,6 +124,29 @@ public:
     virtual int64_t size() = 0;
 };
 
+namespace detail {
+
+inline zarvo_source callbacks_of(source* from) {
+    zarvo_source callbacks = ZARVO_SOURCE_INIT;
+    callbacks.context = from;
+    callbacks.read_at = [](void* context, void* buffer, size_t size, uint64_t offset) {
+        return guard(
+            [&] {
+                return static_cast<source*>(context)->read_at({static_cast<std::byte*>(buffer), size}, offset);
+            },
+            int64_t{-EIO});
+    };
+    callbacks.get_size = [](void* context, uint64_t* size) {
+        const int64_t answer = guard([&] { return static_cast<source*>(context)->size(); }, int64_t{-EIO});
+        if (answer < 0) return static_cast<int>(answer);
+        *size = static_cast<uint64_t>(answer);
+        return 0;
+    };
+    return callbacks;
+}
+
+} // namespace detail
+
 // See zarvo_open_options; 0 is the default of each.
 struct open_options {
     uint64_t offset = 0;
@@ -298,6 +321,21 @@ struct [[nodiscard]] run_result {
     zarvo::error error;
 };
 
+// See zarvo_create_options.
+struct create_options {
+    int32_t layout = ZARVO_LAYOUT_FS;
+    int32_t compression = ZARVO_DEFAULT;
+    int32_t level = ZARVO_DEFAULT;
+    bool is_streamed = false;
+    uint64_t block_size = 0;                         // 0: the default
+    std::optional<std::string> engine_version = {};  // without NUL
+    std::optional<std::string> engine_revision = {}; // as above
+    bool force = false;
+    bool dry_run = false;
+    std::function<void(const zarvo_create_report& report)> report = {};
+    std::function<void(std::string_view message)> log = {};
+};
+
 namespace detail {
 
 // The callbacks of a run. Once one of them has thrown, on any thread, none is called again, and the run stops when it
@@ -383,21 +421,7 @@ public:
                          [&](auto... rest) { return zarvo_open_memory(data.data(), data.size(), rest...); });
     }
     static result<archive> open(std::unique_ptr<source> from, open_options options = {}) {
-        zarvo_source callbacks = ZARVO_SOURCE_INIT;
-        callbacks.context = from.get();
-        callbacks.read_at = [](void* context, void* buffer, size_t size, uint64_t offset) {
-            return detail::guard(
-                [&] {
-                    return static_cast<source*>(context)->read_at({static_cast<std::byte*>(buffer), size}, offset);
-                },
-                int64_t{-EIO});
-        };
-        callbacks.get_size = [](void* context, uint64_t* size) {
-            const int64_t answer = detail::guard([&] { return static_cast<source*>(context)->size(); }, int64_t{-EIO});
-            if (answer < 0) return static_cast<int>(answer);
-            *size = static_cast<uint64_t>(answer);
-            return 0;
-        };
+        const zarvo_source callbacks = detail::callbacks_of(from.get());
         return open_with(std::move(options), std::move(from),
                          [&](auto... rest) { return zarvo_open_source(&callbacks, rest...); });
     }
@@ -569,6 +593,87 @@ private:
 
     std::unique_ptr<callbacks> m_Callbacks; // outlives the archive that calls them
     std::unique_ptr<zarvo_archive, close_archive> m_Archive;
+};
+
+namespace detail {
+
+// Makes an archive; call: (run options, create options, summary, error) -> code.
+template <typename Call>
+run_result create_with(const run_options& options, const create_options& how, Call&& call) {
+    using calls = run_callbacks<create_options>;
+    zarvo_create_options plain = ZARVO_CREATE_OPTIONS_INIT;
+    plain.layout = how.layout;
+    plain.compression = how.compression;
+    plain.level = how.level;
+    plain.is_streamed = how.is_streamed ? 1 : 0;
+    plain.block_size = how.block_size;
+    if (how.engine_version) plain.engine_version = how.engine_version->c_str();
+    if (how.engine_revision) plain.engine_revision = how.engine_revision->c_str();
+    plain.force = how.force ? 1 : 0;
+    plain.dry_run = how.dry_run ? 1 : 0;
+    if (how.report)
+        plain.report = [](void* context, const zarvo_create_report* report) {
+            calls::call(context, [&](const create_options& own) { own.report(*report); });
+        };
+    if (how.log)
+        plain.log = [](void* context, const char* message) {
+            calls::call(context, [&](const create_options& own) { own.log(message); });
+        };
+    return calls(options, how).make([&](zarvo_run_options* run, zarvo_summary* summary, zarvo_error** why) {
+        return call(run, &plain, summary, why);
+    });
+}
+
+} // namespace detail
+
+// Makes an archive of what lies below a folder: see zarvo_create.
+inline run_result create(const std::string& path, const std::string& folder, const run_options& options = {},
+                         const create_options& how = {}) {
+    return detail::create_with(options, how,
+                               [&](auto... rest) { return zarvo_create(path.c_str(), folder.c_str(), rest...); });
+}
+
+// Makes archives of entries from memory and callbacks: see zarvo_writer.
+class writer {
+public:
+    // When memory is refused, every other operation fails.
+    writer() {
+        zarvo_writer* made = nullptr;
+        (void)zarvo_writer_new(&made, nullptr);
+        m_Writer.reset(made);
+    }
+
+    // data must stay as it is until the writer is destroyed.
+    error add(std::string_view path, std::span<const std::byte> data) {
+        return detail::check([&](zarvo_error** why) {
+            return zarvo_writer_add_memory(m_Writer.get(), path.data(), path.size(), data.data(), data.size(), why);
+        });
+    }
+    // An exception of the source's read_at is not passed on: the archive is not made.
+    error add(std::string_view path, std::unique_ptr<source> from) {
+        zarvo_source callbacks = detail::callbacks_of(from.release());
+        callbacks.close = [](void* context) { delete static_cast<source*>(context); };
+        error failure = detail::check([&](zarvo_error** why) {
+            return zarvo_writer_add_source(m_Writer.get(), path.data(), path.size(), &callbacks, why);
+        });
+        detail::rethrow();
+        return failure;
+    }
+    error add_folder(std::string_view path) {
+        return detail::check(
+            [&](zarvo_error** why) { return zarvo_writer_add_folder(m_Writer.get(), path.data(), path.size(), why); });
+    }
+
+    run_result write(const std::string& path, const run_options& options = {}, const create_options& how = {}) {
+        return detail::create_with(
+            options, how, [&](auto... rest) { return zarvo_writer_write(m_Writer.get(), path.c_str(), rest...); });
+    }
+
+private:
+    struct free_writer {
+        void operator()(zarvo_writer* writer) const { zarvo_writer_free(writer); }
+    };
+    std::unique_ptr<zarvo_writer, free_writer> m_Writer;
 };
 
 // See zarvo_normalize_path.
