@@ -1,29 +1,13 @@
 #include "Library/ArchiveRun.h"
 
+#include "Library/Resources.h"
+
 #include <algorithm>
-#include <chrono>
-#include <cstdio>
 #include <cstring>
 
 namespace {
 
 constexpr UInt32 kMaxThreads = 1'024;
-constexpr auto kProgressInterval = std::chrono::milliseconds(100);
-
-// Half of the memory that programs can have without anything being pushed out.
-UInt64 DefaultMemory() {
-    constexpr UInt64 kUnknown = UInt64{1} << 30;
-    FILE* const file = fopen("/proc/meminfo", "re");
-    if (file == nullptr) return kUnknown;
-    char line[128];
-    unsigned long long kibibytes = 0;
-    while (fgets(line, sizeof(line), file) != nullptr)
-        if (sscanf(line, "MemAvailable: %llu kB", &kibibytes) == 1) break;
-    fclose(file);
-    return kibibytes != 0 ? kibibytes * 1'024 / 2 : kUnknown;
-}
-
-UInt64 MemoryOf(const zarvo_run_options& options) { return options.memory != 0 ? options.memory : DefaultMemory(); }
 
 // A block takes its decoded bytes, and its stored ones, which are no more.
 UInt64 MaxBlockBytes(zarvo_archive* archive, UInt64 memory) { return std::min(archive->MaxBlockBytes(), memory / 2); }
@@ -46,8 +30,8 @@ UInt32 CountThreads(zarvo_archive* archive, const zarvo_run_options& options, UI
 ArchiveRun::ArchiveRun(zarvo_archive* archive, const zarvo_run_options& options)
     : m_Archive(archive),
       m_Options(options),
-      m_MaxBlockBytes(MaxBlockBytes(archive, MemoryOf(options))),
-      m_ThreadCount(CountThreads(archive, options, MemoryOf(options), m_MaxBlockBytes)),
+      m_MaxBlockBytes(MaxBlockBytes(archive, MemoryBudget(options))),
+      m_ThreadCount(CountThreads(archive, options, MemoryBudget(options), m_MaxBlockBytes)),
       m_Data(&archive->Blocks(), archive->Nodes(), m_MaxBlockBytes, m_ThreadCount, this) {}
 
 zarvo_code ArchiveRun::Plan(OutputPlan* plan, UInt64* bytes, Failure* failure) {
@@ -144,9 +128,7 @@ void ArchiveRun::Work(UInt32 number) {
         MessageScope scope(&m_Messages);
         m_Data.Work(number);
     }
-    std::lock_guard lock(m_Lock);
-    ++m_Ended;
-    m_HasEnded.notify_one();
+    m_Workers.AddEnded();
 }
 
 void ArchiveRun::WorkAlone() {
@@ -171,12 +153,7 @@ void ArchiveRun::Look() {
 }
 
 void ArchiveRun::Watch(UInt32 count) {
-    std::unique_lock lock(m_Lock);
-    while (!m_HasEnded.wait_for(lock, kProgressInterval, [&] { return m_Ended == count; })) {
-        lock.unlock();
-        Look();
-        lock.lock();
-    }
+    m_Workers.WaitFor(count, [&] { Look(); });
 }
 
 // Tells the results that have no missing one before them.

@@ -95,9 +95,9 @@ private:
     UInt64 m_Expected = 0;
     std::atomic<UInt64> m_Results{0};
 
+    WorkerCount m_Workers;
+
     std::mutex m_Lock;
-    std::condition_variable m_HasEnded;
-    UInt32 m_Ended = 0; // workers
     FailureList m_Failures;
     dynamic_array<UInt32> m_FailureOf{kMemLabelFileSystem}; // by entry; empty until there is one
 };

@@ -1,10 +1,10 @@
 #include "Library/Extraction.h"
 
+#include "Library/Resources.h"
 #include "Runtime/Allocator/Allocator.h"
 
 #include <algorithm>
 #include <cerrno>
-#include <sys/resource.h>
 
 Extraction::~Extraction() {
     for (Worker* worker : m_Workers)
@@ -49,9 +49,7 @@ size_t Extraction::ShareDescriptors() {
     constexpr UInt64 kPerThread = 3;     // a file, its folder, and one more on the way to it
     constexpr UInt64 kPerSharedFile = 2; // the file, and the folder of its temporary name
     constexpr UInt64 kMaxFolders = 16;
-    rlimit limit = {};
-    if (getrlimit(RLIMIT_NOFILE, &limit) != 0) return kMaxFolders;
-    const UInt64 free = std::max<UInt64>(limit.rlim_cur, kOthers + kPerThread + 1) - kOthers;
+    const UInt64 free = std::max(FreeDescriptors(kOthers), kPerThread + 1);
     LimitThreads(static_cast<UInt32>(std::min<UInt64>(ThreadCount(), free / (kPerThread + 1))));
     const UInt64 share = free / ThreadCount();
     const UInt64 folders = std::clamp<UInt64>(share / 2 - std::min(share / 2, kPerThread), 1, kMaxFolders);

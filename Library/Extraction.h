@@ -24,7 +24,8 @@ private:
         RareFailure failure VARNEX_GUARDED_BY(lock); // of making or writing it
     };
     struct Worker {
-        Worker(const OutputFolder* output, size_t maxFolders, bool makes) : folders(output, maxFolders, makes) {}
+        Worker(const OutputFolder* output, size_t maxFolders, bool makes)
+            : folders(output, maxFolders, makes ? FolderCache::kMake : FolderCache::kLook) {}
 
         FolderCache folders;
         core::string name{kMemLabelGeneral}; // of the entry at hand

@@ -78,6 +78,11 @@ zarvo_code OutputFolder::OpenToLook(const char* path, Failure* failure) {
     }
 }
 
+zarvo_code OutputFolder::OpenToRead(const char* path, Failure* failure) {
+    m_Descriptor = RepeatOnInterrupt([&] { return open(path, O_PATH | O_DIRECTORY | O_CLOEXEC); });
+    return m_Descriptor >= 0 ? ZARVO_OK : failure->SetSystem(errno);
+}
+
 FolderCache::~FolderCache() { (void)Close(); }
 
 bool FolderCache::Close() {
@@ -88,16 +93,16 @@ bool FolderCache::Close() {
     return hadAny;
 }
 
-// Opens a folder in another one, and makes it where it is missing.
+// Opens a folder in another one.
 int FolderCache::Enter(int above, const char* name, Failure* failure) {
-    if (m_Makes && RepeatOnInterrupt([&] { return mkdirat(above, name, 0777); }) != 0 && errno != EEXIST) {
+    if (m_Missing == kMake && RepeatOnInterrupt([&] { return mkdirat(above, name, 0777); }) != 0 && errno != EEXIST) {
         (void)failure->SetSystem(errno);
         return -1;
     }
     const int descriptor = RepeatOnInterrupt([&] { return openat(above, name, kFolderFlags); });
     if (descriptor >= 0) return descriptor;
     const int error = errno;
-    if (!m_Makes && error == ENOENT) {
+    if (m_Missing == kLook && error == ENOENT) {
         (void)CheckCanMakeIn(above, failure);
         return -1;
     }
@@ -266,7 +271,7 @@ zarvo_code NewFile::CreateNamed(int folder, Failure* failure) {
     return failure->code;
 }
 
-static zarvo_code WriteAll(int descriptor, UInt64 offset, const UInt8* bytes, UInt64 size, Failure* failure) {
+zarvo_code WriteAt(int descriptor, UInt64 offset, const UInt8* bytes, UInt64 size, Failure* failure) {
     while (size != 0) {
         const ssize_t written = RepeatOnInterrupt(
             [&] { return pwrite(descriptor, bytes, static_cast<size_t>(size), static_cast<off_t>(offset)); });
@@ -284,7 +289,7 @@ static zarvo_code CutFile(int descriptor, UInt64 size, Failure* failure) {
 }
 
 zarvo_code NewFile::Write(UInt64 offset, const UInt8* bytes, UInt64 size, Failure* failure) {
-    return WriteAll(m_Descriptor, offset, bytes, size, failure);
+    return WriteAt(m_Descriptor, offset, bytes, size, failure);
 }
 
 zarvo_code NewFile::Cut(UInt64 size, Failure* failure) { return CutFile(m_Descriptor, size, failure); }
@@ -331,7 +336,7 @@ static zarvo_code DoAndClose(int descriptor, Failure* failure, Work&& work) {
 
 zarvo_code NewFile::WriteClosed(int folder, UInt64 offset, const UInt8* bytes, UInt64 size, Failure* failure) const {
     return DoAndClose(OpenAgain(folder), failure,
-                      [&](int descriptor) { return WriteAll(descriptor, offset, bytes, size, failure); });
+                      [&](int descriptor) { return WriteAt(descriptor, offset, bytes, size, failure); });
 }
 
 zarvo_code NewFile::CutClosed(int folder, UInt64 size, Failure* failure) const {
@@ -351,8 +356,7 @@ static int LinkFile(int descriptor, int folder, const char* name) {
     return linkat(AT_FDCWD, path.text, folder, name, AT_SYMLINK_FOLLOW);
 }
 
-// Gives a temporary file its last name; EEXIST where something has it.
-static int RenameToNew(int folder, const char* from, const char* to) {
+int RenameToNew(int folder, const char* from, const char* to) {
     if (renameat2(folder, from, folder, to, RENAME_NOREPLACE) == 0) return 0;
     if (errno != EINVAL && errno != ENOSYS) return -1;
     // The file system can't refuse what is there when it renames, but when it links.

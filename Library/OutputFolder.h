@@ -3,7 +3,7 @@
 //
 //   OutputFolder output;
 //   output.Open("game_data", failure);
-//   FolderCache folders(&output);              // one per thread
+//   FolderCache folders(&output, 8, FolderCache::kMake);   // one per thread
 //   int folder = folders.Get("road/of", failure);
 //   NewFile file;
 //   file.Create(folder, failure), file.Write(0, bytes, size, failure), file.Place(folder, "one.txt", overwrite,
@@ -35,6 +35,9 @@ public:
     // As Open, but makes nothing. If the folder IsMissing, the Descriptor is that of the nearest one above it.
     zarvo_code OpenToLook(const char* path, Failure* failure);
 
+    // Opens a folder that is there, to read what lies below it.
+    zarvo_code OpenToRead(const char* path, Failure* failure);
+
     int Descriptor() const { return m_Descriptor; }
     bool IsMissing() const { return m_IsMissing; }
 
@@ -46,15 +49,18 @@ private:
 // Keeps open the folders that a thread has used lately. One thread.
 class FolderCache : private NonCopyable {
 public:
-    // Keeps up to maxFolders open, at least 1. makes: whether folders that are missing are made.
-    FolderCache(const OutputFolder* output, size_t maxFolders, bool makes)
-        : m_Output(output), m_MaxFolders(maxFolders), m_Makes(makes) {}
+    // What is done with folders that are missing: they are made, or looked at as for a dry run, or are a failure.
+    enum Missing { kMake, kLook, kRefuse };
+
+    // Keeps up to maxFolders open, at least 1.
+    FolderCache(const OutputFolder* output, size_t maxFolders, Missing missing)
+        : m_Output(output), m_MaxFolders(maxFolders), m_Missing(missing) {}
     ~FolderCache();
 
-    // The descriptor of a folder, or -1 after a failure. Makes the folder if it is missing, with those above it. The
+    // The descriptor of a folder, or -1 after a failure. With kMake, makes the folder and those above it. The
     // descriptor belongs to the cache, and is valid until the next call. path need not be in normal form, but holds no
-    // "..". When descriptors run out, the cache closes other folders. If it makes none, -1 without a failure says that
-    // the folder is missing and can be made.
+    // "..". When descriptors run out, the cache closes other folders. With kLook, -1 without a failure says that the
+    // folder is missing and can be made.
     int Get(core::string_ref path, Failure* failure);
 
     // Closes all folders, to free descriptors. False if none was open.
@@ -77,7 +83,7 @@ private:
 
     const OutputFolder* m_Output;
     const size_t m_MaxFolders;
-    const bool m_Makes;
+    const Missing m_Missing;
     dynamic_array<Folder> m_Folders{kMemLabelFileSystem};
     core::string m_Normal{kMemLabelGeneral};
     UInt64 m_Uses = 0;
@@ -88,6 +94,12 @@ bool IsOutOfDescriptors(const Failure& failure);
 
 // Whether the disk is full or can't be written, so that other files would fail, too.
 bool IsDiskFailure(const Failure& failure);
+
+// Writes at a place of an open file.
+zarvo_code WriteAt(int descriptor, UInt64 offset, const UInt8* bytes, UInt64 size, Failure* failure);
+
+// Gives a file another name in its folder, unless something has it. Returns 0, or -1 with errno: EEXIST.
+int RenameToNew(int folder, const char* from, const char* to);
 
 // What stands in the place of a file.
 struct Standing {

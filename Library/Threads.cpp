@@ -49,3 +49,9 @@ void RunOnThreads(UInt32 count, ThreadedWork* work) {
     for (UInt32 number = 0; number < started; ++number)
         pthread_join(jobs[number].thread, nullptr);
 }
+
+void WorkerCount::AddEnded() {
+    std::lock_guard lock(m_Lock);
+    ++m_Ended;
+    m_HasEnded.notify_one();
+}

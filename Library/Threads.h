@@ -4,8 +4,15 @@
 
 #include "Runtime/Core/Types.h"
 
+#include <chrono>
+#include <condition_variable>
+#include <mutex>
+
 // How many threads the process may use at once, by the processors that it may run on.
 UInt32 ProcessorCount();
+
+// How often a run tells its progress.
+constexpr auto kProgressInterval = std::chrono::milliseconds(100);
 
 // Work that several threads do while the calling thread watches.
 class ThreadedWork {
@@ -24,3 +31,26 @@ public:
 
 // Returns when all threads have ended. When the system refuses threads, fewer than count work.
 void RunOnThreads(UInt32 count, ThreadedWork* work);
+
+// How the thread that watches learns that the workers have ended.
+class WorkerCount {
+public:
+    // Called by each worker when it ends.
+    void AddEnded();
+
+    // Returns when count workers have ended, and calls meanwhile() at each interval until then, with no lock held.
+    template <typename Meanwhile>
+    void WaitFor(UInt32 count, Meanwhile&& meanwhile) {
+        std::unique_lock lock(m_Lock);
+        while (!m_HasEnded.wait_for(lock, kProgressInterval, [&] { return m_Ended == count; })) {
+            lock.unlock();
+            meanwhile();
+            lock.lock();
+        }
+    }
+
+private:
+    std::mutex m_Lock;
+    std::condition_variable m_HasEnded;
+    UInt32 m_Ended = 0;
+};
