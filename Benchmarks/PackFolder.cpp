@@ -5,7 +5,7 @@
 //   data OFFSET                         where the data starts in the archive
 //   block STORED SIZE TYPE CODED        stored and uncompressed size; where the coded bytes start in the stored ones
 //   node FLAGS OFFSET SIZE PATH         place in the data stream
-#include "Tools/ArchiveWriter/ArchiveWriter.h"
+#include "Tests/Support/ArchiveBuilder.h"
 
 #include <cstdio>
 #include <cstdlib>

@@ -4,7 +4,7 @@
 // and prints the best of each and their ratio. The rows "decoder alone" read nothing: they show the ratio that the
 // machine allows. All bytes are compared with the source.
 #include "Runtime/VirtualFileSystem/ArchiveFileSystem/ArchiveStorageReader.h"
-#include "Tools/ArchiveWriter/ArchiveWriter.h"
+#include "Tests/Support/ArchiveBuilder.h"
 
 #include <algorithm>
 #include <chrono>

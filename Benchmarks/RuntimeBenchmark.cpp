@@ -5,7 +5,7 @@
 #include "Runtime/Utilities/FileUtilities.h"
 #include "Runtime/Utilities/PathNameUtility.h"
 #include "Runtime/VirtualFileSystem/ArchiveFileSystem/ArchiveStorageReader.h"
-#include "Tools/ArchiveWriter/ArchiveWriter.h"
+#include "Tests/Support/ArchiveBuilder.h"
 
 #include <benchmark/benchmark.h>
 #include <cstdlib>

@@ -2,7 +2,7 @@
 #pragma once
 
 #include "Fuzz/FuzzSupport.h"
-#include "Tools/ArchiveWriter/ArchiveWriter.h"
+#include "Tests/Support/ArchiveBuilder.h"
 
 constexpr UInt64 kMaxFuzzStream = 1 << 18; // nobody reads on after that
 

@@ -1,5 +1,5 @@
 // Makes the seed corpora of the fuzzers, one folder per fuzzer: MakeSeeds FOLDER
-#include "Tools/ArchiveWriter/ArchiveWriter.h"
+#include "Tests/Support/ArchiveBuilder.h"
 
 #include <cstdio>
 #include <filesystem>

@@ -2,7 +2,7 @@
 // and implied folders are found, and hang in the tree, as a map of normal forms says.
 #include "Fuzz/FuzzSupport.h"
 #include "Library/include/zarvo.h"
-#include "Tools/ArchiveWriter/ArchiveWriter.h"
+#include "Tests/Support/ArchiveBuilder.h"
 
 #include <algorithm>
 #include <map>

@@ -1,5 +1,5 @@
 // Makes the sample archives, one per layout: MakeSamples FOLDER
-#include "Tools/ArchiveWriter/ArchiveWriter.h"
+#include "Tests/Support/ArchiveBuilder.h"
 
 #include <cstdio>
 #include <string>

@@ -1,5 +1,6 @@
 #include "Library/Writer/WritePlan.h"
 
+#include "Runtime/Utilities/ZarvoConfig.h"
 #include "Runtime/VirtualFileSystem/ArchiveFileSystem/ArchiveStorageHeader.h"
 
 #include <algorithm>
@@ -7,6 +8,8 @@
 #include <lz4hc.h>
 
 namespace {
+
+constexpr const char* kEngineVersion = "5.x.x"; // of every version of the engine
 
 constexpr UInt64 kMinBlockSize = 4'096;
 constexpr UInt64 kMaxBlockSize = UInt64{1} << 30;
@@ -36,8 +39,8 @@ zarvo_code WritePlan::ReadOptions(const zarvo_create_options& options, Failure* 
     m_Layout = options.layout;
     m_BlockSize = options.block_size != 0 ? options.block_size : kDefaultBlockSize;
     m_IsStreamed = options.is_streamed != 0;
-    if (options.engine_version != nullptr) m_Form.engineVersion = options.engine_version;
-    if (options.engine_revision != nullptr) m_Form.engineRevision = options.engine_revision;
+    m_Form.engineVersion = options.engine_version != nullptr ? options.engine_version : kEngineVersion;
+    m_Form.engineRevision = options.engine_revision != nullptr ? options.engine_revision : ZarvoConfig::ZarvoVersion;
     switch (m_Layout) {
     case ZARVO_LAYOUT_FS: m_Form.signature = ArchiveStorageHeader::kSignature, m_Form.version = 8; break;
     case ZARVO_LAYOUT_WEB: m_Form.signature = ArchiveStorageHeader::kSignatureWeb, m_Form.version = 3; break;

@@ -1,8 +1,8 @@
 // Every example, in C and in C++, with archives that are whole, damaged, and none.
 #include "Runtime/Utilities/Format.h"
+#include "Tests/Support/ArchiveBuilder.h"
 #include "Tests/Support/RunVarnex.h"
 #include "Tests/Support/TemporaryFolder.h"
-#include "Tools/ArchiveWriter/ArchiveWriter.h"
 
 namespace {
 

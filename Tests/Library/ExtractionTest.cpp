@@ -1,7 +1,7 @@
 #include "Tests/Library/LibraryTest.h"
 #include "Tests/Library/SystemFaults.h"
+#include "Tests/Support/ArchiveBuilder.h"
 #include "Tests/Support/TemporaryFolder.h"
-#include "Tools/ArchiveWriter/ArchiveWriter.h"
 
 #include <deque>
 #include <fcntl.h>

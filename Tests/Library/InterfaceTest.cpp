@@ -1,7 +1,7 @@
 // What programs that are already compiled rely on: names, sizes and places.
 #include "Tests/Library/LibraryTest.h"
+#include "Tests/Support/ArchiveBuilder.h"
 #include "Tests/Support/TemporaryFolder.h"
-#include "Tools/ArchiveWriter/ArchiveWriter.h"
 
 #include <malloc.h>
 #include <regex>

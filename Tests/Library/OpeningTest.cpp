@@ -1,6 +1,6 @@
 #include "Tests/Library/LibraryTest.h"
+#include "Tests/Support/ArchiveBuilder.h"
 #include "Tests/Support/TemporaryFolder.h"
-#include "Tools/ArchiveWriter/ArchiveWriter.h"
 
 #include <fcntl.h>
 #include <stdexcept>

@@ -1,5 +1,5 @@
 #include "Tests/Library/LibraryTest.h"
-#include "Tools/ArchiveWriter/ArchiveWriter.h"
+#include "Tests/Support/ArchiveBuilder.h"
 
 #include <malloc.h>
 #include <map>

@@ -205,7 +205,11 @@ std::optional<Arguments> Arguments::Parse(const std::vector<std::string>& argume
         *complaint = operands.empty() ? MakeMessage("no subcommand is named")
                                       : MakeMessage("no such subcommand: '%'", {operands[0]});
     else if (operands.size() < needed)
-        *complaint = operands.empty() ? MakeMessage("no archive is named") : MakeMessage("no pattern is given");
+        *complaint = operands.empty()       ? MakeMessage("no archive is named")
+                     : *subcommand == &kCat ? MakeMessage("no pattern is given")
+                                            : MakeMessage("no folder is named");
+    else if (operands.size() > (*subcommand)->maxOperands)
+        *complaint = MakeMessage("'%' is one argument too many", {operands[(*subcommand)->maxOperands]});
     if (!complaint->empty()) return std::nullopt;
     return parsed;
 }

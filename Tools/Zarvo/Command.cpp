@@ -9,16 +9,12 @@
 
 namespace {
 
-constexpr int kWrongUsage = 2;
-
 int RunSubcommand(const World& world, OutputBuffer& output, Console& console, std::string& done) {
     const Subcommand* subcommand = nullptr;
     std::string complaint;
     const std::optional<Arguments> arguments = Arguments::Parse(world.arguments, &subcommand, &complaint);
-    const std::string name(subcommand->name);
     if (!arguments) {
-        const std::string help = "zarvo " + name + (name.empty() ? "" : " ") + "--help";
-        console.Say(MakeMessage("%; see '%'", {complaint, help}));
+        console.Say(DescribeWrongUsage(*subcommand, complaint));
         return kWrongUsage;
     }
     if (arguments->Has(kHelp)) {
@@ -36,6 +32,7 @@ int RunSubcommand(const World& world, OutputBuffer& output, Console& console, st
     if (subcommand == &kExtract) return RunExtract(run);
     if (subcommand == &kCat) return RunCat(run);
     if (subcommand == &kTest) return RunTest(run);
+    if (subcommand == &kCreate) return RunCreate(run);
     return RunSum(run);
 }
 

@@ -3,7 +3,6 @@
 #include "Tools/Zarvo/Text.h"
 
 #include <chrono>
-#include <cstdio>
 
 namespace {
 
@@ -17,12 +16,6 @@ zarvo::extract_options ReadOptions(const Arguments& arguments) {
     how.keep_broken = arguments.Has(kKeepBroken);
     how.dry_run = arguments.Has(kDryRun);
     return how;
-}
-
-std::string FormatSeconds(std::chrono::duration<double> time) {
-    char text[32];
-    (void)snprintf(text, sizeof(text), "%.2f", time.count());
-    return text;
 }
 
 } // namespace

@@ -31,6 +31,34 @@ const Option kAlgorithm = {.letter = 'a',
                            .kind = ValueKind::kChoice,
                            .choices = "sha256|sha1|md5|sha512|blake2b512",
                            .help = "sha256 (the default), sha1, md5, sha512 or blake2b512"};
+const Option kLayout = {.name = "layout",
+                        .value = "NAME",
+                        .kind = ValueKind::kChoice,
+                        .choices = "fs|web|raw|archive",
+                        .help = "fs (ZarvoFS, in blocks; the default), web (ZarvoWeb), raw (ZarvoRaw), archive "
+                                "(ZarvoArchive)"};
+const Option kCompression = {.letter = 'c',
+                             .value = "KIND",
+                             .kind = ValueKind::kChoice,
+                             .choices = "none|lz4|lz4hc|lzma",
+                             .help = "none, lz4, lz4hc (the default) or lzma"};
+const Option kLevel = {.letter = 'l',
+                       .value = "LEVEL",
+                       .kind = ValueKind::kNumber,
+                       .help = "1 to 12 for lz4hc (default: 9), 0 to 9 for lzma (default: 5)"};
+const Option kBlockSize = {.letter = 'b',
+                           .value = "SIZE",
+                           .kind = ValueKind::kSize,
+                           .help = "bytes of a block before it is compressed (K, M, G; default: 128K)"};
+const Option kStreamed = {.name = "streamed",
+                          .help = "make blocks that are decoded from their start on (lzma, its default, and none)"};
+const Option kEngineVersion = {
+    .name = "engine-version", .value = "TEXT", .help = "the engine that the archive says it is for (default: 5.x.x)"};
+const Option kEngineRevision = {
+    .name = "engine-revision", .value = "TEXT", .help = "and its revision (default: 7041.3.0b12)"};
+const Option kForce = {.name = "force", .help = "replace ARCHIVE if it is there"};
+const Option kDryRunOfCreate = {.name = "dry-run",
+                                .help = "print what would be put into the archive, and write nothing"};
 const Option kMemory = {.name = "memory",
                         .value = "SIZE",
                         .kind = ValueKind::kSize,
@@ -61,6 +89,9 @@ constexpr const Option* kExtractOptions[] = {&kOutputFolder, &kExclude,  &kOverw
 constexpr const Option* kTestOptions[] = {&kNulOutput, &kJson, &kMemory, &kQuiet, &kThreads, &kProgress, &kHelp};
 constexpr const Option* kSumOptions[] = {&kAlgorithm, &kNulInput, &kFilesFrom, &kMemory,
                                          &kQuiet,     &kThreads,  &kProgress,  &kHelp};
+constexpr const Option* kCreateOptions[] = {&kLayout,        &kCompression,    &kLevel,   &kBlockSize, &kStreamed,
+                                            &kEngineVersion, &kEngineRevision, &kExclude, &kForce,     &kDryRunOfCreate,
+                                            &kMemory,        &kQuiet,          &kThreads, &kProgress,  &kHelp};
 constexpr const Option* kOptions[] = {&kQuiet, &kThreads, &kProgress, &kHelp, &kVersion};
 
 constexpr std::string_view kAboutPatterns =
@@ -69,6 +100,11 @@ constexpr std::string_view kAboutPatterns =
     "the next character as it is. One that matches a folder takes all below it.\n";
 constexpr std::string_view kAboutExtract =
     "Nothing is written outside of DIR. A new file gets its name when it is whole; a damaged one is left out.\n";
+constexpr std::string_view kAboutCreate =
+    "Entries are sorted by their paths: the same files and options give the same bytes. ARCHIVE gets its name when it "
+    "is\n"
+    "whole. Links, devices, pipes and sockets are left out. A block that does not shrink is stored as it is.\n"
+    "web is one lzma stream and raw is not compressed: neither has folders or takes -c, -b or --streamed.\n";
 constexpr std::string_view kAboutTest =
     "The formats hold no checksums: damage that can be decoded is not seen. To see it, keep what 'zarvo sum' prints.\n";
 constexpr std::string_view kAboutSum = "'cd DIR && sha256sum -c' checks what was extracted into DIR against this.\n";
@@ -111,15 +147,22 @@ const Subcommand kSum = {.name = "sum",
                          .about = kAboutSum,
                          .options = kSumOptions,
                          .minOperands = 1};
+const Subcommand kCreate = {.name = "create",
+                            .operands = "ARCHIVE FOLDER",
+                            .summary = "make an archive of what a folder holds",
+                            .about = kAboutCreate,
+                            .options = kCreateOptions,
+                            .minOperands = 2,
+                            .maxOperands = 2};
 const Subcommand kNoSubcommand = {.name = {},
                                   .operands = "SUBCOMMAND [OPTION...] ARCHIVE [ARGUMENT...]",
-                                  .summary = "read archives of the Zarvo engine's formats",
+                                  .summary = "read and make archives of the Zarvo engine's formats",
                                   .about = {},
                                   .options = kOptions,
                                   .minOperands = 0};
 
 std::span<const Subcommand* const> GetSubcommands() {
-    static constexpr const Subcommand* kSubcommands[] = {&kList, &kInfo, &kExtract, &kCat, &kTest, &kSum};
+    static constexpr const Subcommand* kSubcommands[] = {&kList, &kInfo, &kExtract, &kCat, &kTest, &kSum, &kCreate};
     return kSubcommands;
 }
 

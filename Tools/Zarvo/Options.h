@@ -3,6 +3,7 @@
 #pragma once
 
 #include <cstddef>
+#include <cstdint>
 #include <span>
 #include <string>
 #include <string_view>
@@ -28,12 +29,15 @@ struct Subcommand {
     std::string_view about;    // lines of help
     std::span<const Option* const> options;
     size_t minOperands;
+    size_t maxOperands = SIZE_MAX;
 };
 
 extern const Option kLong, kNul, kNulInput, kNulOutput, kJson, kFilesFrom, kOutputFolder, kExclude, kOverwrite, kStrip,
     kKeepBroken, kDryRun, kVerbose, kAlgorithm, kMemory, kQuiet, kThreads, kProgress, kHelp, kVersion;
+extern const Option kLayout, kCompression, kLevel, kBlockSize, kStreamed, kEngineVersion, kEngineRevision, kForce,
+    kDryRunOfCreate;
 
-extern const Subcommand kList, kInfo, kExtract, kCat, kTest, kSum;
+extern const Subcommand kList, kInfo, kExtract, kCat, kTest, kSum, kCreate;
 
 // What zarvo itself takes when no subcommand is named.
 extern const Subcommand kNoSubcommand;

@@ -27,11 +27,7 @@ unsigned long long Run::GetMemory() const {
 }
 
 std::optional<zarvo::archive> Run::OpenArchive(const std::string& path) const {
-    if (path == "-") {
-        console.Say(
-            path, MakeMessage("an archive must be a file that can be read at any place (a file of this name is ./-)"));
-        return std::nullopt;
-    }
+    if (RefuseStream(path)) return std::nullopt;
     zarvo::open_options options;
     // A block in memory is held twice: as it is stored and as it is decoded.
     options.max_block_bytes = std::max(GetMemory() / 2, 1ull);
@@ -42,6 +38,24 @@ std::optional<zarvo::archive> Run::OpenArchive(const std::string& path) const {
         return std::nullopt;
     }
     return *std::move(archive);
+}
+
+bool Run::RefuseStream(const std::string& path) const {
+    if (path != "-") return false;
+    console.Say(path,
+                MakeMessage("an archive must be a file that can be read at any place (a file of this name is ./-)"));
+    return true;
+}
+
+std::string DescribeWrongUsage(const Subcommand& subcommand, const std::string& complaint) {
+    const std::string name(subcommand.name);
+    const std::string help = "zarvo " + name + (name.empty() ? "" : " ") + "--help";
+    return MakeMessage("%; see '%'", {complaint, help});
+}
+
+int Run::SayWrongUsage(const std::string& complaint) const {
+    console.Say(DescribeWrongUsage(arguments.GetSubcommand(), complaint));
+    return kWrongUsage;
 }
 
 zarvo::run_options Run::MakeOptions(Progress& progress) const {
@@ -57,10 +71,10 @@ zarvo::run_options Run::MakeOptions(Progress& progress) const {
     return options;
 }
 
-void Run::WritePath(const zarvo::entry& entry, std::string_view end) const {
+void Run::WritePath(std::string_view path, bool isFolder, std::string_view end) const {
     if (output.IsTerminal()) console.WipeProgress(); // which is there, too
-    output.WriteText(entry.path());
-    if (entry.is_folder() && !entry.path().ends_with('/')) output.Write("/");
+    output.WriteText(path);
+    if (isFolder && !path.ends_with('/')) output.Write("/");
     output.Write(end);
 }
 

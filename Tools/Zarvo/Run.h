@@ -25,12 +25,21 @@ struct Run {
     // reports meanwhile and later becomes messages.
     std::optional<zarvo::archive> OpenArchive(const std::string& path) const;
 
+    // Whether an archive's path stands for a standard stream, which no archive can be; then there is a message.
+    bool RefuseStream(const std::string& path) const;
+
+    // What is wrong with the arguments, and where help is. Returns the run's status.
+    int SayWrongUsage(const std::string& complaint) const;
+
     // The options of a run on a whole archive: those that all subcommands take, and progress, which is shown and stops
     // a run that nobody waits for. This object and progress must outlive them.
     zarvo::run_options MakeOptions(Progress& progress) const;
 
     // A path as list shows it, and its end: a newline, or NUL.
-    void WritePath(const zarvo::entry& entry, std::string_view end = "\n") const;
+    void WritePath(const zarvo::entry& entry, std::string_view end = "\n") const {
+        WritePath(entry.path(), entry.is_folder(), end);
+    }
+    void WritePath(std::string_view path, bool isFolder, std::string_view end = "\n") const;
 
     // A message on an entry of an archive, or on a pattern.
     void SayOfEntry(const std::string& archive, std::string_view entry, std::string_view text) const;
@@ -42,6 +51,7 @@ private:
 constexpr int kAllDone = 0;
 constexpr int kSomethingWrong = 1;
 constexpr int kNoArchive = 2;
+constexpr int kWrongUsage = 2;
 
 int RunList(const Run& run);
 int RunInfo(const Run& run);
@@ -49,3 +59,7 @@ int RunExtract(const Run& run);
 int RunCat(const Run& run);
 int RunTest(const Run& run);
 int RunSum(const Run& run);
+int RunCreate(const Run& run);
+
+// What is wrong with the arguments of a subcommand, and where help is.
+std::string DescribeWrongUsage(const Subcommand& subcommand, const std::string& complaint);

@@ -138,6 +138,12 @@ std::string MakeMessage(std::string_view form, std::initializer_list<std::string
 
 std::string QuoteEmpty(std::string_view name) { return name.empty() ? "''" : std::string(name); }
 
+std::string FormatSeconds(std::chrono::duration<double> time) {
+    char text[32];
+    (void)snprintf(text, sizeof(text), "%.2f", time.count());
+    return text;
+}
+
 std::string DescribeBytes(double bytes) {
     constexpr const char* kUnits[] = {"bytes", "KiB", "MiB", "GiB", "TiB", "PiB", "EiB"};
     size_t unit = 0;

@@ -1,6 +1,7 @@
 // Texts that come from archives and the command line, made fit for terminals, messages and JSON.
 #pragma once
 
+#include <chrono>
 #include <initializer_list>
 #include <string>
 #include <string_view>
@@ -25,6 +26,9 @@ std::string MakeMessage(std::string_view form, std::initializer_list<std::string
 
 // A name in a message: an empty one is "''".
 std::string QuoteEmpty(std::string_view name);
+
+// "0.25"
+std::string FormatSeconds(std::chrono::duration<double> time);
 
 // "512 bytes", "1.5 MiB".
 std::string DescribeBytes(double bytes);

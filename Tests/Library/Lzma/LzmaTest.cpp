@@ -1,6 +1,6 @@
 #include "Library/Lzma/Lzma.h"
 #include "Library/Lzma/BitDecoder.h"
-#include "Tools/ArchiveWriter/Compressors.h"
+#include "Tests/Support/Compressors.h"
 
 #include <algorithm>
 #include <gtest/gtest.h>

@@ -7,9 +7,9 @@
 //           .output = "a:"});
 #pragma once
 
+#include "Tests/Support/ArchiveBuilder.h"
 #include "Tests/Support/RunVarnex.h"
 #include "Tests/Support/TemporaryFolder.h"
-#include "Tools/ArchiveWriter/ArchiveWriter.h"
 
 #include <algorithm>
 #include <cstring>
@@ -140,7 +140,7 @@ inline FolderTree ReadFolderTree(const std::string& folder) {
 // when there are no entries.
 inline FolderTree Output(const std::vector<ArchiveEntry>& entries, const std::string& folder = "a.zarvo_data") {
     FolderTree tree;
-    for (const auto& [path, bytes, flags, sourceFile, isListed] : entries)
+    for (const auto& [path, bytes, flags, isListed] : entries)
         if (isListed) tree[path.empty() ? folder : folder + "/" + path] = flags != 0 ? kFolder : Brief(bytes);
     return tree.empty() ? FolderTree{{folder, kFolder}} : tree;
 }

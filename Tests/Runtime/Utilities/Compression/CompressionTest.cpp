@@ -1,7 +1,7 @@
 #include "Runtime/Allocator/Owned.h"
+#include "Tests/Support/Compressors.h"
 #include "Tests/Support/RefusedMemory.h"
 #include "Tests/Support/ReportRecorder.h"
-#include "Tools/ArchiveWriter/Compressors.h"
 
 #include <algorithm>
 #include <gtest/gtest.h>

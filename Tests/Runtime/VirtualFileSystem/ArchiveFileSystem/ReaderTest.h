@@ -2,9 +2,9 @@
 #pragma once
 
 #include "Runtime/VirtualFileSystem/ArchiveFileSystem/CachedBlock.h"
+#include "Tests/Support/ArchiveBuilder.h"
 #include "Tests/Support/FaultyFileSystem.h"
 #include "Tests/Support/TemporaryFolder.h"
-#include "Tools/ArchiveWriter/ArchiveWriter.h"
 
 #include <gtest/gtest.h>
 #include <random>

@@ -1,15 +1,12 @@
-// Encoders for the kinds of compression that archives use. Any thread.
+// The encoders of libzarvo for texts, with settings of their own. Any thread.
 //
 //   std::string stored = CompressLzma(plain, {.endMark = true});
 #pragma once
 
 #include "Runtime/Utilities/Compression/Compression.h"
 
-#include <functional>
 #include <string>
 #include <string_view>
-
-constexpr size_t kLzmaPropertiesSize = 5;
 
 struct LzmaSettings {
     bool endMark = false;           // ends the stream with the end mark
@@ -17,13 +14,7 @@ struct LzmaSettings {
     UInt32 dictionarySize = 65'536; // at least 4,096
 };
 
-// Returns the next bytes to compress, at most size, and none at the end.
-using ByteSource = std::function<std::string_view(size_t size)>;
-using ByteSink = std::function<void(std::string_view bytes)>;
-
-// Writes the properties, then the coded bytes, as archives store them, without the legacy size field. The properties
-// get their own call of the sink. The form with source and sink holds only the encoder's state in memory.
-void CompressLzma(const ByteSource& source, const ByteSink& sink, const LzmaSettings& settings);
+// The properties and the coded bytes, as archives store them, without the size field of the legacy layouts.
 std::string CompressLzma(std::string_view plain, const LzmaSettings& settings = {});
 
 // Each returns one LZ4 block.

@@ -1,19 +1,17 @@
-// Makes archives of every layout: a description of entries, blocks and form becomes the bytes of an archive. Each
-// stored field can be given another value by its name.
+// Makes archives of every layout and version, with the encoders and frames of libzarvo: a description of entries,
+// blocks and form becomes the bytes of an archive. Each stored field can be given another value by its name.
 //
 //   ArchiveDescription archive;
 //   archive.entries = {{.path = "a.txt", .bytes = "text"}};
 //   archive.type = kCompressionLz4;
 //   archive.fields = {{"version", 9}};
 //   BuiltArchive built = BuildArchive(archive);      // built.bytes, and where its parts lie
-//   PackFolder("/some/folder", "/some/file", {});    // the same, from disk to disk, one block in memory at a time
 //
-// A wrong description (an unknown field name, a file that can't be read) is the caller's fault and ends the program
-// with a message. Any thread.
+// A wrong description (an unknown field name) is the caller's fault and ends the program with a message. Any thread.
 #pragma once
 
 #include "Runtime/Core/Types.h"
-#include "Tools/ArchiveWriter/Compressors.h"
+#include "Tests/Support/Compressors.h"
 
 #include <map>
 #include <optional>
@@ -32,9 +30,8 @@ enum class ArchiveLayout {
 struct ArchiveEntry {
     std::string path = {};
     std::string bytes = {};
-    UInt32 flags = 0;            // of the node; the legacy layouts don't store them
-    std::string sourceFile = {}; // path of a file that is used instead of bytes
-    bool listed = true;          // false: the bytes are in the data stream, but no node names them
+    UInt32 flags = 0;   // of the node; the legacy layouts don't store them
+    bool listed = true; // false: the bytes are in the data stream, but no node names them
 };
 
 constexpr UInt32 kFolderEntry = 1;
@@ -73,7 +70,7 @@ struct ArchiveDescription {
 
     UInt32 levelCount = 1; // for kWeb and kRaw: only the last level has a meaning
 
-    // Values that are stored instead of the right ones. The names are those in the layout tables of ArchiveFrames.cpp,
+    // Values that are stored instead of the right ones. The names are those in the layout tables of Frames.cpp,
     // with [i] for the i-th of a list: "block[2].compressedSize", "node[0].offset".
     std::map<std::string, UInt64> fields = {};
 };
@@ -95,30 +92,5 @@ struct BuiltArchive {
 
 BuiltArchive BuildArchive(const ArchiveDescription& description);
 
-struct StoredBlock {
-    UInt64 uncompressedSize;
-    UInt64 compressedSize;
-    CompressionType type;
-    bool streamed;
-};
-
-// Where everything is in an archive that has been written to a file.
-struct ArchivePlan {
-    struct Node {
-        std::string path;
-        UInt32 flags;
-        UInt64 offset; // in the data stream
-        UInt64 size;
-    };
-    UInt64 dataOffset;
-    std::vector<StoredBlock> blocks; // one after another, from dataOffset on
-    std::vector<Node> nodes;
-};
-
-// Writes the archive to a file. Never holds all of the data in memory: only the description, the section, and one LZ4
-// block or the LZMA encoder's state.
-ArchivePlan WriteArchive(const ArchiveDescription& description, const std::string& outputFile);
-
-// Writes an archive of every file and folder below a folder, in the order of their paths. form describes everything but
-// the entries. The legacy layouts hold only files.
-ArchivePlan PackFolder(const std::string& folder, const std::string& outputFile, ArchiveDescription form);
+// The same, into a file.
+void WriteArchive(const ArchiveDescription& description, const std::string& outputFile);
