@@ -146,7 +146,8 @@ void PutArchivePrologue(FieldSink& sink, core::string_ref signature, UInt64 posi
 //      the nodes
 // 4    blockCount
 // 8    blockCount + 1 times, if there are blocks: running[i].uncompressed
-// 16   blockCount + 1 times, if there are blocks: 8 running[i].stored, 4 running[i].type, 4 running[i].streamed (bit 0)
+// 16   blockCount times: 8 running[i].stored, 4 running[i].type, 4 running[i].streamed (bit 0)
+// 16   if there are blocks: 8 running[blockCount].stored, 4 endType, 4 endStreamed; nobody reads the last two
 void PutArchiveHeader(FieldSink& sink, const ArchiveForm& form, UInt64 dataPosition, const BlockRecords& blocks,
                       const EntryList& entries) {
     sink.PutNumber({"version"}, form.version, 4);
@@ -170,11 +171,14 @@ void PutArchiveHeader(FieldSink& sink, const ArchiveForm& form, UInt64 dataPosit
         sink.PutNumber({"uncompressed", "running", index + 1}, position, 8);
     }
     position = 0;
-    for (size_t index = 0; index <= blocks.size(); ++index) {
-        const UInt32 flags = index < blocks.size() ? blocks[index].flags : 0; // of the end, nobody reads them
+    for (size_t index = 0; index < blocks.size(); ++index) {
+        const UInt32 flags = blocks[index].flags;
         sink.PutNumber({"stored", "running", index}, position, 8);
         sink.PutNumber({"type", "running", index}, flags & kStorageBlockCompressionTypeMask, 4);
         sink.PutNumber({"streamed", "running", index}, (flags & kStorageBlockStreamed) != 0 ? 1 : 0, 4);
-        if (index < blocks.size()) position += blocks[index].storedSize;
+        position += blocks[index].storedSize;
     }
+    sink.PutNumber({"stored", "running", blocks.size()}, position, 8);
+    sink.PutNumber({"endType"}, 0, 4);
+    sink.PutNumber({"endStreamed"}, 0, 4);
 }

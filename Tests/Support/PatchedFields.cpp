@@ -16,6 +16,8 @@ UInt64 MakeOdd(const FieldName& name, UInt64 value, const ArchiveDescription& de
     // Only differences of the running values count.
     if (list == "running" && field == "uncompressed") return value + 1'000;
     if (list == "running" && field == "stored") return value + 5'000;
+    if (field == "endType") return 4;
+    if (field == "endStreamed") return 1;
     if (field == "levelBound" || field == "levelCount") return description.levelCount;
     return value;
 }
@@ -23,7 +25,7 @@ UInt64 MakeOdd(const FieldName& name, UInt64 value, const ArchiveDescription& de
 } // namespace
 
 void PatchedFields::PutNumber(const FieldName& name, UInt64 value, UInt32 size) {
-    if (name.list == std::string("level"))
+    if (name.list != nullptr && name.list == std::string("level"))
         PutLevel(name, value);
     else
         Put(name, MakeOdd(name, value, m_Given.description), size);
