@@ -5,7 +5,8 @@
 //   data OFFSET                         where the data starts in the archive
 //   block STORED SIZE TYPE CODED        stored and uncompressed size; where the coded bytes start in the stored ones
 //   node FLAGS OFFSET SIZE PATH         place in the data stream
-#include "Tests/Support/ArchiveBuilder.h"
+#include "Library/include/zarvo.hpp"
+#include "Runtime/VirtualFileSystem/ArchiveFileSystem/ArchiveStorageReader.h"
 
 #include <cstdio>
 #include <cstdlib>
@@ -13,55 +14,60 @@
 
 namespace {
 
-// The strongest level of the encoder's fast mode. The archives of the other programs are packed with the same level,
-// dictionary and match finder.
+// The strongest level of the encoder's fast mode. Its dictionary has 4 MiB, or the size of a block. The archives of the
+// other programs are packed with the same level and match finder.
 constexpr int kLzmaLevel = 4;
-constexpr UInt32 kChunk = 131'072;
-constexpr UInt32 kStream = 8'388'608;
+constexpr uint64_t kStream = 8'388'608;
 
 struct Kind {
     const char* name;
-    ArchiveLayout layout;
-    CompressionType type = kCompressionNone;
-    UInt32 blockSize = kChunk; // also the dictionary's; the legacy layouts have one block
-    bool streamed = false;
+    zarvo::create_options how;
 };
 
-constexpr Kind kKinds[] = {
-    {"lz4hc", ArchiveLayout::kBlockBased, kCompressionLz4HC},
-    {"lzma", ArchiveLayout::kBlockBased, kCompressionLzma},
-    {"streamed", ArchiveLayout::kBlockBased, kCompressionLzma, kStream, true},
-    {"stored", ArchiveLayout::kBlockBased},
-    {"web", ArchiveLayout::kWeb, kCompressionLzma, kStream},
-    {"raw", ArchiveLayout::kRaw},
+const Kind kKinds[] = {
+    {"lz4hc", {}},
+    {"lzma", {.compression = ZARVO_KIND_LZMA, .level = kLzmaLevel}},
+    {"streamed", {.level = kLzmaLevel, .is_streamed = true, .block_size = kStream}},
+    {"stored", {.compression = ZARVO_KIND_NONE}},
+    {"web", {.layout = ZARVO_LAYOUT_WEB, .level = kLzmaLevel}},
+    {"raw", {.layout = ZARVO_LAYOUT_RAW}},
 };
 
-ArchivePlan WriteEmptyFiles(unsigned long count, const char* outputFile, ArchiveDescription form) {
+zarvo::error WriteEmptyFiles(unsigned long count, const char* archive, const zarvo::create_options& how) {
     constexpr unsigned long kFilesInFolder = 1'000;
-    char path[64];
+    const bool hasFolders = how.layout == ZARVO_LAYOUT_FS;
+    zarvo::writer writer;
     for (unsigned long index = 0; index < count; ++index) {
-        const unsigned long folder = index / kFilesInFolder;
-        if (index % kFilesInFolder == 0 && form.layout == ArchiveLayout::kBlockBased) {
-            snprintf(path, sizeof(path), "%04lu", folder);
-            form.entries.push_back({.path = path, .flags = kFolderEntry});
-        }
-        snprintf(path, sizeof(path), "%04lu/%03lu", folder, index % kFilesInFolder);
-        form.entries.push_back({.path = path});
+        char path[64];
+        snprintf(path, sizeof(path), "%04lu", index / kFilesInFolder);
+        zarvo::error error;
+        if (index % kFilesInFolder == 0 && hasFolders) error = writer.add_folder(path);
+        snprintf(path, sizeof(path), "%04lu/%03lu", index / kFilesInFolder, index % kFilesInFolder);
+        if (!error) error = writer.add(path, std::span<const std::byte>());
+        if (error) return error;
     }
-    return WriteArchive(form, outputFile);
+    return writer.write(archive, {}, how).error;
 }
 
-bool WritePlan(const ArchivePlan& plan, ArchiveLayout layout, const std::string& outputFile) {
-    FILE* file = fopen(outputFile.c_str(), "w");
-    if (file == nullptr) return false;
-    fprintf(file, "data %llu\n", plan.dataOffset);
-    for (const StoredBlock& block : plan.blocks) {
+bool WritePlan(const char* archive) {
+    ArchiveStorageReader reader(kMemLabelGeneral);
+    if (reader.Initialize(core::string(archive), 0) != 0 || !reader.FindDirectory()) return false;
+    zarvo::result<zarvo::archive> opened = zarvo::archive::open(archive);
+    FILE* const file = fopen((std::string(archive) + ".plan").c_str(), "w");
+    if (!opened || file == nullptr) return false;
+    fprintf(file, "data %llu\n",
+            static_cast<unsigned long long>(ArchiveStorageHeader::GetDataOffset(reader.GetHeader())));
+    for (uint64_t index = 0; index < opened->block_count(); ++index) {
+        const zarvo_block block = opened->block(index);
         // The legacy stream has a size field after the properties.
-        const unsigned codedOffset = block.type != kCompressionLzma ? 0 : layout == ArchiveLayout::kWeb ? 13 : 5;
-        fprintf(file, "block %llu %llu %u %u\n", block.compressedSize, block.uncompressedSize, block.type, codedOffset);
+        const bool isWeb = opened->info().layout == ZARVO_LAYOUT_WEB;
+        const int coded = block.kind != ZARVO_KIND_LZMA ? 0 : isWeb ? 13 : 5;
+        fprintf(file, "block %u %u %d %d\n", block.stored_size, block.size, block.kind, coded);
     }
-    for (const ArchivePlan::Node& node : plan.nodes)
-        fprintf(file, "node %u %llu %llu %s\n", node.flags, node.offset, node.size, node.path.c_str());
+    for (const ArchiveStorageHeader::Node& node : reader.GetDirectoryInfo().nodes)
+        fprintf(file, "node %u %llu %llu %s\n", node.flags & ArchiveStorageHeader::kNodeDirectory,
+                static_cast<unsigned long long>(node.offset), static_cast<unsigned long long>(node.size),
+                node.path.c_str());
     return fclose(file) == 0;
 }
 
@@ -70,18 +76,14 @@ bool WritePlan(const ArchivePlan& plan, ArchiveLayout layout, const std::string&
 int main(int argumentCount, char** arguments) {
     for (const Kind& kind : kKinds) {
         if (argumentCount != 4 || strcmp(arguments[1], kind.name) != 0) continue;
-        ArchiveDescription form;
-        form.layout = kind.layout;
-        form.type = kind.type;
-        form.chunkSize = kind.blockSize;
-        form.streamed = kind.streamed;
-        form.lzma = {.level = kLzmaLevel, .dictionarySize = kind.blockSize};
+        zarvo::create_options how = kind.how;
+        how.force = true;
         char* numberEnd;
         const unsigned long count = strtoul(arguments[2], &numberEnd, 10);
-        const bool isCount = *numberEnd == '\0';
-        const ArchivePlan plan =
-            isCount ? WriteEmptyFiles(count, arguments[3], form) : PackFolder(arguments[2], arguments[3], form);
-        return WritePlan(plan, form.layout, std::string(arguments[3]) + ".plan") ? 0 : 1;
+        const zarvo::error error = *numberEnd == '\0' ? WriteEmptyFiles(count, arguments[3], how)
+                                                      : zarvo::create(arguments[3], arguments[2], {}, how).error;
+        if (error) fprintf(stderr, "PackFolder: %s\n", std::string(error.text()).c_str());
+        return !error && WritePlan(arguments[3]) ? 0 : 1;
     }
     fprintf(stderr, "Usage: PackFolder KIND FOLDER|COUNT ARCHIVE, where KIND is one of:");
     for (const Kind& kind : kKinds)

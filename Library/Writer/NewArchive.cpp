@@ -1,6 +1,7 @@
 #include "Library/Writer/NewArchive.h"
 
 #include "Library/OutputFolder.h"
+#include "PlatformDependent/Linux/FileDescriptor.h"
 #include "PlatformDependent/Linux/RepeatOnInterrupt.h"
 
 #include <cerrno>
@@ -52,45 +53,45 @@ zarvo_code NewArchive::CheckPlace(bool isReplacing, Failure* failure) const {
     return isReplacing ? ZARVO_OK : failure->SetSystem(EEXIST);
 }
 
-// *isOurs: whether the lock is on the file that has the name. Another run may have finished or removed it meanwhile.
-zarvo_code NewArchive::OpenLocked(bool* hasLeftover, bool* isOurs, Failure* failure) {
+// Makes the file, or removes one that a killed run has left; *isDone says which. A lock is on the file that it opened,
+// which another run may have finished or removed meanwhile.
+zarvo_code NewArchive::OpenLocked(bool* hasLeftover, bool* isDone, Failure* failure) {
     constexpr int kFlags = O_RDWR | O_CREAT | O_NOFOLLOW | O_NONBLOCK | O_CLOEXEC;
+    constexpr char kInTheWay[] = "something is in the unfinished file's place";
     const char* const name = m_Unfinished.c_str();
-    *isOurs = false;
     bool isNew = true;
-    int descriptor = RepeatOnInterrupt([&] { return openat(m_Folder, name, kFlags | O_EXCL, 0666); });
-    if (descriptor < 0 && errno == EEXIST) {
+    int opened = RepeatOnInterrupt([&] { return openat(m_Folder, name, kFlags | O_EXCL, 0666); });
+    if (opened < 0 && errno == EEXIST) {
         isNew = false;
-        descriptor = RepeatOnInterrupt([&] { return openat(m_Folder, name, kFlags, 0666); });
+        opened = RepeatOnInterrupt([&] { return openat(m_Folder, name, kFlags, 0666); });
+        if (opened < 0) return failure->SetSystem(errno, kInTheWay);
     }
-    if (descriptor < 0)
-        return failure->SetSystem(errno, isNew ? nullptr : "something is in the unfinished file's place");
-    const int locked = RepeatOnInterrupt([&] { return flock(descriptor, LOCK_EX | LOCK_NB); });
+    if (opened < 0) return failure->SetSystem(errno);
+    FileDescriptor file(opened);
+    const int locked = RepeatOnInterrupt([&] { return flock(opened, LOCK_EX | LOCK_NB); });
     const int error = locked == 0 ? 0 : errno;
-    struct stat status;
-    struct stat named;
-    const bool isFile = fstat(descriptor, &status) == 0 && S_ISREG(status.st_mode);
-    const bool hasName = fstatat(m_Folder, name, &named, AT_SYMLINK_NOFOLLOW) == 0 && named.st_dev == status.st_dev &&
-                         named.st_ino == status.st_ino;
-    // A new file can do without a lock where the file system has none.
-    if (isFile && hasName && (locked == 0 || (isNew && error != EWOULDBLOCK))) {
-        *isOurs = true;
-        *hasLeftover = !isNew;
-        m_Descriptor = descriptor;
-        return ZARVO_OK;
-    }
-    close(descriptor);
-    if (!isFile) return failure->SetSystem(EEXIST, "something is in the unfinished file's place");
     if (error == EWOULDBLOCK) return failure->SetSystem(EBUSY, "another run is making this archive");
-    return error == 0 ? ZARVO_OK : failure->SetSystem(error, "an unfinished file can't be locked");
+    struct stat status;
+    if (fstat(opened, &status) != 0 || !S_ISREG(status.st_mode)) return failure->SetSystem(EEXIST, kInTheWay);
+    // A new file can do without a lock where the file system has none.
+    if (error != 0 && !isNew) return failure->SetSystem(error, "an unfinished file can't be locked");
+    const Standing named = LookAt(m_Folder, name);
+    if (!named.isThere || named.device != status.st_dev || named.inode != status.st_ino) return ZARVO_OK;
+    if (!isNew) {
+        *hasLeftover = true;
+        return unlinkat(m_Folder, name, 0) == 0 ? ZARVO_OK : failure->SetSystem(errno);
+    }
+    *isDone = true;
+    m_Descriptor = file.Release();
+    return ZARVO_OK;
 }
 
 zarvo_code NewArchive::Open(bool isReplacing, bool* hasLeftover, Failure* failure) {
     m_IsReplacing = isReplacing;
-    for (bool isOurs = false; !isOurs;)
-        if (const zarvo_code code = OpenLocked(hasLeftover, &isOurs, failure); code != ZARVO_OK) return code;
-    const int cut = *hasLeftover ? RepeatOnInterrupt([&] { return ftruncate(m_Descriptor, 0); }) : 0;
-    return cut == 0 ? ZARVO_OK : failure->SetSystem(errno);
+    *hasLeftover = false;
+    for (bool isDone = false; !isDone;)
+        if (const zarvo_code code = OpenLocked(hasLeftover, &isDone, failure); code != ZARVO_OK) return code;
+    return ZARVO_OK;
 }
 
 zarvo_code NewArchive::Write(UInt64 offset, const UInt8* bytes, UInt64 size, Failure* failure) {
@@ -103,10 +104,10 @@ zarvo_code NewArchive::Finish(Failure* failure) {
     const int named = m_IsReplacing ? renameat(m_Folder, unfinished, m_Folder, m_Name.c_str())
                                     : RenameToNew(m_Folder, unfinished, m_Name.c_str());
     if (named != 0) return failure->SetSystem(errno);
-    const int closed = close(m_Descriptor); // its bytes are on the disk
+    close(m_Descriptor); // its bytes are on the disk
     m_Descriptor = -1;
-    if (closed != 0 && errno != EINTR) return failure->SetSystem(errno);
     // Not every file system can do that with folders.
-    if (RepeatOnInterrupt([&] { return fsync(m_Folder); }) != 0 && errno != EINVAL) return failure->SetSystem(errno);
-    return ZARVO_OK;
+    const int synced = RepeatOnInterrupt([&] { return fsync(m_Folder); });
+    if (synced == 0 || errno == EINVAL) return ZARVO_OK;
+    return failure->SetSystem(errno, "the archive has its name, but its folder may not be on the disk");
 }

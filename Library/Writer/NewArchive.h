@@ -38,7 +38,7 @@ public:
     zarvo_code Finish(Failure* failure);
 
 private:
-    zarvo_code OpenLocked(bool* hasLeftover, bool* isOurs, Failure* failure);
+    zarvo_code OpenLocked(bool* hasLeftover, bool* isDone, Failure* failure);
 
     bool m_IsReplacing = false;
     int m_Folder = -1;

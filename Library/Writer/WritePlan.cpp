@@ -11,6 +11,8 @@ namespace {
 
 constexpr const char* kEngineVersion = "5.x.x"; // of every version of the engine
 
+constexpr size_t kMaxEngineText = 65'535;
+
 constexpr UInt64 kMinBlockSize = 4'096;
 constexpr UInt64 kMaxBlockSize = UInt64{1} << 30;
 constexpr UInt64 kDefaultBlockSize = 131'072;
@@ -48,6 +50,8 @@ zarvo_code WritePlan::ReadOptions(const zarvo_create_options& options, Failure* 
     case ZARVO_LAYOUT_ARCHIVE: m_Form.signature = ArchiveStorageHeader::kSignatureArchive, m_Form.version = 5; break;
     default: return failure->SetArgument("no such layout");
     }
+    if (m_Form.engineVersion.size() > kMaxEngineText || m_Form.engineRevision.size() > kMaxEngineText)
+        return failure->SetArgument("the engine's version or revision is too long");
     if (m_BlockSize < kMinBlockSize || m_BlockSize > kMaxBlockSize)
         return failure->SetArgument("a block has 4096 to 1073741824 bytes");
     const bool hasChoice = options.compression != ZARVO_DEFAULT || options.block_size != 0 || m_IsStreamed;
@@ -103,7 +107,7 @@ zarvo_code WritePlan::Place(EntryList* list, size_t* failed, Failure* failure) {
                                 static_cast<unsigned long long>(entry.size), static_cast<unsigned long long>(left));
         entry.offset = position; // of a folder, nobody reads it
         position += entry.size;
-        directorySize += 21 + entry.pathSize;
+        directorySize += (HasLegacyDirectory() ? 9 : 21) + entry.pathSize;
         const UInt64 blocks = HasLegacyDirectory() ? 0 : 10 * (position / m_BlockSize + 1);
         if (m_Layout != ZARVO_LAYOUT_ARCHIVE && directorySize + blocks > kMaxDirectorySize)
             return failure->Set(ZARVO_ERROR_LIMIT, "up to here, the directory has %llu bytes, and the limit is %llu",

@@ -67,8 +67,9 @@ zarvo_code WriteRun::Write(NewArchive* file, Failure* failure) {
     const bool isStream = m_Plan.Layout() == ZARVO_LAYOUT_WEB;
     if (!isStream && !PrepareSlots(threads)) return failure->SetMemory();
     m_End = m_DataPlace = HeadSize();
-    if (m_Data.Size() != 0) RunOnThreads(threads, this);
-    (void)TellProgress(); // too late to stop anything
+    m_IsStoppedByCaller = !TellProgress();
+    if (m_Data.Size() != 0 && !m_IsStoppedByCaller) RunOnThreads(threads, this);
+    if (!m_IsStoppedByCaller) m_IsStoppedByCaller = !TellProgress();
     if (m_Fatal.code == ZARVO_OK && m_IsStoppedByCaller) (void)m_Fatal.Set(ZARVO_ERROR_STOPPED, "stopped");
     if (m_Fatal.code == ZARVO_OK) return WriteFrame(failure);
     *failure = m_Fatal;

@@ -65,6 +65,13 @@ TEST(Interface, StructuresAreWhereProgramsExpectThem) {
     EXPECT_EQ(48u, offsetof(zarvo_item, path_length));
     EXPECT_EQ(32u, sizeof(zarvo_block));
     EXPECT_EQ(28u, offsetof(zarvo_block, is_streamed));
+    EXPECT_EQ(64u, sizeof(zarvo_summary));
+    EXPECT_EQ(56u, offsetof(zarvo_summary, archive_bytes));
+    EXPECT_EQ(48u, sizeof(zarvo_create_report));
+    EXPECT_EQ(40u, offsetof(zarvo_create_report, text));
+    EXPECT_EQ(72u, sizeof(zarvo_create_options));
+    EXPECT_EQ(48u, offsetof(zarvo_create_options, force));
+    EXPECT_EQ(64u, offsetof(zarvo_create_options, log));
     EXPECT_EQ(9, ZARVO_ERROR_NOT_FOUND);
 }
 
@@ -171,6 +178,13 @@ TEST(Interface, NullAndPastTheEndAreArgumentErrors) {
         zarvo_read_block(archive, 0, nullptr, &count, nullptr),
         zarvo_patterns_new(nullptr, nullptr),
         zarvo_patterns_add(nullptr, "a", 1, nullptr),
+        zarvo_create(nullptr, "a", nullptr, nullptr, nullptr, nullptr),
+        zarvo_create("a", nullptr, nullptr, nullptr, nullptr, nullptr),
+        zarvo_writer_new(nullptr, nullptr),
+        zarvo_writer_add_memory(nullptr, "a", 1, "", 0, nullptr),
+        zarvo_writer_add_source(nullptr, "a", 1, nullptr, nullptr),
+        zarvo_writer_add_folder(nullptr, "a", 1, nullptr),
+        zarvo_writer_write(nullptr, "a", nullptr, nullptr, nullptr, nullptr),
     };
     for (size_t call = 0; call < std::size(codes); ++call)
         EXPECT_EQ(ZARVO_ERROR_ARGUMENT, codes[call]) << "call " << call;
@@ -178,6 +192,7 @@ TEST(Interface, NullAndPastTheEndAreArgumentErrors) {
     zarvo_close(nullptr);
     zarvo_stream_free(nullptr);
     zarvo_patterns_free(nullptr);
+    zarvo_writer_free(nullptr);
     zarvo_error_free(nullptr);
     EXPECT_EQ(std::string(""), zarvo_error_text(nullptr));
 }
@@ -231,6 +246,40 @@ TEST(Interface, EachRefusedRequestForMemoryIsAnError) {
             zarvo_error_free(error);
             zarvo_close(archive);
         }
+    }
+}
+
+// As above, for an archive that is made: it is whole, or there is none.
+TEST(Interface, EachRefusedRequestOfAWriterIsAnError) {
+    const std::string text = SampleText(30'000);
+    const TemporaryFolder folder;
+    const std::string path = folder / "a.zarvo";
+    for (const int32_t layout : {ZARVO_LAYOUT_FS, ZARVO_LAYOUT_WEB, ZARVO_LAYOUT_ARCHIVE}) {
+        zarvo_create_options how = ZARVO_CREATE_OPTIONS_INIT;
+        how.layout = layout;
+        zarvo_run_options run = ZARVO_RUN_OPTIONS_INIT;
+        run.threads = 1; // so that requests are counted in order
+        bool isClean = false;
+        for (int refused = 1; !isClean; ++refused) {
+            SCOPED_TRACE(refused);
+            ASSERT_LT(refused, 1'000);
+            zarvo_writer* writer = nullptr;
+            s_RequestsLeft = refused;
+            zarvo_code code = zarvo_writer_new(&writer, nullptr);
+            if (code == ZARVO_OK)
+                code = zarvo_writer_add_memory(writer, "folder/text", ZARVO_WHOLE, text.data(), text.size(), nullptr);
+            if (code == ZARVO_OK) code = zarvo_writer_write(writer, path.c_str(), &run, &how, nullptr, nullptr);
+            isClean = s_RequestsLeft > 0;
+            s_RequestsLeft = -1;
+            zarvo_writer_free(writer);
+            EXPECT_EQ(isClean ? ZARVO_OK : ZARVO_ERROR_MEMORY, code);
+            EXPECT_EQ(isClean, std::filesystem::exists(path));
+            EXPECT_EQ(isClean ? 1 : 0, std::distance(std::filesystem::directory_iterator(folder.Path()), {}));
+        }
+        zarvo::archive archive = *zarvo::archive::open(path);
+        const uint64_t last = archive.entries().size() - 1;
+        EXPECT_EQ(Delivered{text}, Read(archive, last, 0, text.size()));
+        std::filesystem::remove(path);
     }
 }
 

@@ -80,6 +80,27 @@ ssize_t pwrite(int file, const void* bytes, size_t size, off_t offset) {
     return Fails("pwrite") ? -1 : syscall(SYS_pwrite64, file, bytes, size, offset);
 }
 
+ssize_t pread(int file, void* bytes, size_t size, off_t offset) {
+    return Fails("pread") ? -1 : syscall(SYS_pread64, file, bytes, size, offset);
+}
+
+int fstatat(int folder, const char* path, struct stat* status, int flags) {
+    return Fails("fstatat") ? -1 : static_cast<int>(syscall(SYS_newfstatat, folder, path, status, flags));
+}
+
+int fsync(int file) {
+    struct stat status = {};
+    const bool isFolder = fstat(file, &status) == 0 && S_ISDIR(status.st_mode);
+    if ((isFolder && Fails("fsync of a folder")) || Fails("fsync")) return -1;
+    return static_cast<int>(syscall(SYS_fsync, file));
+}
+
+// A structure has the same name, which the compiler warns of.
+int FlockOrFail(int file, int operation) __asm__("flock");
+int FlockOrFail(int file, int operation) {
+    return Fails("flock") ? -1 : static_cast<int>(syscall(SYS_flock, file, operation));
+}
+
 #ifndef VARNEX_UNDER_SANITIZERS
 int pthread_create(pthread_t* thread, const pthread_attr_t* attributes, void* (*start)(void*), void* given) {
     static const auto s_Real = reinterpret_cast<decltype(&pthread_create)>(dlsym(RTLD_NEXT, "pthread_create"));

@@ -59,7 +59,7 @@ TEST(ZarvoManual, HasEverySubcommand) {
 // A message's fixed texts, with "%" for what varies: in the sources a literal, in the manual page words in turns.
 TEST(ZarvoManual, HasTheMessagesOfTheSources) {
     std::string code;
-    for (const char* const folder : {"Tools/Zarvo", "Library"})
+    for (const char* const folder : {"Tools/Zarvo", "Library", "Library/Writer"})
         for (const auto& entry : fs::directory_iterator(kRoot + folder))
             if (entry.path().extension() == ".cpp" || entry.path().stem() == "Failure") code += ReadFile(entry.path());
     code = std::regex_replace(code, std::regex("\n *//[^\n]*"), "");
@@ -75,8 +75,9 @@ TEST(ZarvoManual, HasTheMessagesOfTheSources) {
     }
     // Forms that others fill in, and what only programs that call the library hear.
     for (const char* const text :
-         {"%", "%: %", "no such entry", "the offset is past the end", "a read delivered more than was asked", "stopped",
-          "the files have % bytes; the limit (max_bytes) is %"})
+         {"%", "%: %", "no such entry", "the path is not in its normal form", "the source ends too early",
+          "another entry has the same path, or needs a folder in its place", "the offset is past the end",
+          "a read delivered more than was asked", "stopped", "the files have % bytes; the limit (max_bytes) is %"})
         EXPECT_EQ(1u, said.erase(text)) << text;
     EXPECT_EQ(said, explained);
 }
@@ -94,9 +95,9 @@ protected:
 
 TEST_F(ZarvoCompletionsTest, OfBashFollowTheSubcommand) {
     const std::pair<const char*, const char*> kCases[] = {
-        {"zarvo ''", "list info extract cat test sum"},
+        {"zarvo ''", "list info extract cat test sum create"},
         {"zarvo li", "list"},
-        {"zarvo -q c", "cat"},
+        {"zarvo -q c", "cat create"},
         {"zarvo --v", "--version"},
         {"zarvo list --j", "--json"},
         {"zarvo cat --j", ""},
