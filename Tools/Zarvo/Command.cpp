@@ -13,10 +13,7 @@ int RunSubcommand(const World& world, OutputBuffer& output, Console& console, st
     const Subcommand* subcommand = nullptr;
     std::string complaint;
     const std::optional<Arguments> arguments = Arguments::Parse(world.arguments, &subcommand, &complaint);
-    if (!arguments) {
-        console.Say(DescribeWrongUsage(*subcommand, complaint));
-        return kWrongUsage;
-    }
+    if (!arguments) return RefuseUsage(console, *subcommand, complaint);
     if (arguments->Has(kHelp)) {
         output.Write(DescribeSubcommand(*subcommand));
         return kAllDone;
@@ -33,7 +30,8 @@ int RunSubcommand(const World& world, OutputBuffer& output, Console& console, st
     if (subcommand == &kCat) return RunCat(run);
     if (subcommand == &kTest) return RunTest(run);
     if (subcommand == &kCreate) return RunCreate(run);
-    return RunSum(run);
+    if (subcommand == &kSum) return RunSum(run);
+    return RunMount(run);
 }
 
 } // namespace

@@ -61,7 +61,7 @@ int RunCreate(const Run& run) {
     const std::string &path = run.GetOperands()[0], &folder = run.GetOperands()[1];
     zarvo::create_options how;
     if (const std::string complaint = ReadForm(run.arguments, how); !complaint.empty())
-        return run.SayWrongUsage(complaint);
+        return RefuseUsage(run.console, kCreate, complaint);
     if (run.RefuseStream(path)) return kNoArchive;
     zarvo::patterns excluded;
     if (!AddPatterns(run, path, run.arguments.FindAll(kExclude), excluded)) return kSomethingWrong;

@@ -59,6 +59,9 @@ const Option kEngineRevision = {
 const Option kForce = {.name = "force", .help = "replace ARCHIVE if it is there"};
 const Option kDryRunOfCreate = {.name = "dry-run",
                                 .help = "print what would be put into the archive, and write nothing"};
+const Option kForeground = {.letter = 'f', .help = "stay in the foreground, and say on standard error what goes wrong"};
+const Option kMountOptions = {
+    .letter = 'o', .value = "OPTIONS", .help = "options of the mount, such as allow_other; may be given repeatedly"};
 const Option kMemory = {.name = "memory",
                         .value = "SIZE",
                         .kind = ValueKind::kSize,
@@ -92,6 +95,8 @@ constexpr const Option* kSumOptions[] = {&kAlgorithm, &kNulInput, &kFilesFrom, &
 constexpr const Option* kCreateOptions[] = {&kLayout,        &kCompression,    &kLevel,   &kBlockSize, &kStreamed,
                                             &kEngineVersion, &kEngineRevision, &kExclude, &kForce,     &kDryRunOfCreate,
                                             &kMemory,        &kQuiet,          &kThreads, &kProgress,  &kHelp};
+constexpr const Option* kMountSubcommandOptions[] = {&kForeground, &kMountOptions, &kMemory, &kQuiet,
+                                                     &kThreads,    &kProgress,     &kHelp};
 constexpr const Option* kOptions[] = {&kQuiet, &kThreads, &kProgress, &kHelp, &kVersion};
 
 constexpr std::string_view kAboutPatterns =
@@ -108,6 +113,8 @@ constexpr std::string_view kAboutCreate =
 constexpr std::string_view kAboutTest =
     "The formats hold no checksums: damage that can be decoded is not seen. To see it, keep what 'zarvo sum' prints.\n";
 constexpr std::string_view kAboutSum = "'cd DIR && sha256sum -c' checks what was extracted into DIR against this.\n";
+constexpr std::string_view kAboutMount =
+    "Goes to the background when FOLDER shows the archive. 'fusermount3 -u FOLDER' ends the mount.\n";
 
 } // namespace
 
@@ -154,6 +161,13 @@ const Subcommand kCreate = {.name = "create",
                             .options = kCreateOptions,
                             .minOperands = 2,
                             .maxOperands = 2};
+const Subcommand kMount = {.name = "mount",
+                           .operands = "ARCHIVE FOLDER",
+                           .summary = "show the entries as a read-only file system",
+                           .about = kAboutMount,
+                           .options = kMountSubcommandOptions,
+                           .minOperands = 2,
+                           .maxOperands = 2};
 const Subcommand kNoSubcommand = {.name = {},
                                   .operands = "SUBCOMMAND [OPTION...] ARCHIVE [ARGUMENT...]",
                                   .summary = "read and make archives of the Zarvo engine's formats",
@@ -162,7 +176,8 @@ const Subcommand kNoSubcommand = {.name = {},
                                   .minOperands = 0};
 
 std::span<const Subcommand* const> GetSubcommands() {
-    static constexpr const Subcommand* kSubcommands[] = {&kList, &kInfo, &kExtract, &kCat, &kTest, &kSum, &kCreate};
+    static constexpr const Subcommand* kSubcommands[] = {&kList, &kInfo, &kExtract, &kCat,
+                                                         &kTest, &kSum,  &kCreate,  &kMount};
     return kSubcommands;
 }
 

@@ -36,8 +36,9 @@ extern const Option kLong, kNul, kNulInput, kNulOutput, kJson, kFilesFrom, kOutp
     kKeepBroken, kDryRun, kVerbose, kAlgorithm, kMemory, kQuiet, kThreads, kProgress, kHelp, kVersion;
 extern const Option kLayout, kCompression, kLevel, kBlockSize, kStreamed, kEngineVersion, kEngineRevision, kForce,
     kDryRunOfCreate;
+extern const Option kForeground, kMountOptions;
 
-extern const Subcommand kList, kInfo, kExtract, kCat, kTest, kSum, kCreate;
+extern const Subcommand kList, kInfo, kExtract, kCat, kTest, kSum, kCreate, kMount;
 
 // What zarvo itself takes when no subcommand is named.
 extern const Subcommand kNoSubcommand;

@@ -26,12 +26,23 @@ unsigned long long Run::GetMemory() const {
     return memory != nullptr ? *ParseSize(*memory) : GetDefaultMemory();
 }
 
+int RefuseUsage(Console& console, const Subcommand& subcommand, std::string_view complaint) {
+    const std::string name(subcommand.name);
+    console.Say(MakeMessage("%; see '%'", {complaint, "zarvo " + name + (name.empty() ? "" : " ") + "--help"}));
+    return kWrongUsage;
+}
+
 std::optional<zarvo::archive> Run::OpenArchive(const std::string& path) const {
+    return OpenArchive(path, [this, path](std::string_view text) { console.Say(path, text); });
+}
+
+std::optional<zarvo::archive> Run::OpenArchive(const std::string& path,
+                                               std::function<void(std::string_view text)> log) const {
     if (RefuseStream(path)) return std::nullopt;
     zarvo::open_options options;
     // A block in memory is held twice: as it is stored and as it is decoded.
     options.max_block_bytes = std::max(GetMemory() / 2, 1ull);
-    options.log = [this, path](std::string_view text) { console.Say(path, text); };
+    options.log = std::move(log);
     zarvo::result<zarvo::archive> archive = zarvo::archive::open(path, std::move(options));
     if (!archive) {
         console.Say(path, archive.error().text());
@@ -45,17 +56,6 @@ bool Run::RefuseStream(const std::string& path) const {
     console.Say(path,
                 MakeMessage("an archive must be a file that can be read at any place (a file of this name is ./-)"));
     return true;
-}
-
-std::string DescribeWrongUsage(const Subcommand& subcommand, const std::string& complaint) {
-    const std::string name(subcommand.name);
-    const std::string help = "zarvo " + name + (name.empty() ? "" : " ") + "--help";
-    return MakeMessage("%; see '%'", {complaint, help});
-}
-
-int Run::SayWrongUsage(const std::string& complaint) const {
-    console.Say(DescribeWrongUsage(arguments.GetSubcommand(), complaint));
-    return kWrongUsage;
 }
 
 zarvo::run_options Run::MakeOptions(Progress& progress) const {

@@ -7,6 +7,7 @@
 #include "Tools/Zarvo/Progress.h"
 #include <zarvo.hpp>
 
+#include <functional>
 #include <optional>
 #include <string>
 #include <string_view>
@@ -25,11 +26,12 @@ struct Run {
     // reports meanwhile and later becomes messages.
     std::optional<zarvo::archive> OpenArchive(const std::string& path) const;
 
+    // The same, with a function that is called with what the library reports, on whatever thread it does.
+    std::optional<zarvo::archive> OpenArchive(const std::string& path,
+                                              std::function<void(std::string_view text)> log) const;
+
     // Whether an archive's path stands for a standard stream, which no archive can be; then there is a message.
     bool RefuseStream(const std::string& path) const;
-
-    // What is wrong with the arguments, and where help is. Returns the run's status.
-    int SayWrongUsage(const std::string& complaint) const;
 
     // The options of a run on a whole archive: those that all subcommands take, and progress, which is shown and stops
     // a run that nobody waits for. This object and progress must outlive them.
@@ -44,7 +46,7 @@ struct Run {
     // A message on an entry of an archive, or on a pattern.
     void SayOfEntry(const std::string& archive, std::string_view entry, std::string_view text) const;
 
-private:
+    // How many bytes blocks may take.
     unsigned long long GetMemory() const;
 };
 
@@ -53,6 +55,9 @@ constexpr int kSomethingWrong = 1;
 constexpr int kNoArchive = 2;
 constexpr int kWrongUsage = 2;
 
+// Says what is wrong with the arguments, and where help is. Returns the run's status.
+int RefuseUsage(Console& console, const Subcommand& subcommand, std::string_view complaint);
+
 int RunList(const Run& run);
 int RunInfo(const Run& run);
 int RunExtract(const Run& run);
@@ -60,6 +65,4 @@ int RunCat(const Run& run);
 int RunTest(const Run& run);
 int RunSum(const Run& run);
 int RunCreate(const Run& run);
-
-// What is wrong with the arguments of a subcommand, and where help is.
-std::string DescribeWrongUsage(const Subcommand& subcommand, const std::string& complaint);
+int RunMount(const Run& run);

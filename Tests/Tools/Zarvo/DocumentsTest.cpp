@@ -95,7 +95,7 @@ protected:
 
 TEST_F(ZarvoCompletionsTest, OfBashFollowTheSubcommand) {
     const std::pair<const char*, const char*> kCases[] = {
-        {"zarvo ''", "list info extract cat test sum create"},
+        {"zarvo ''", "list info extract cat test sum create mount"},
         {"zarvo li", "list"},
         {"zarvo -q c", "cat create"},
         {"zarvo --v", "--version"},
