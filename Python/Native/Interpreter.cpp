@@ -1,0 +1,24 @@
+#include "Interpreter.h"
+
+PyObject* DecodePath(std::string_view path) {
+    return PyUnicode_DecodeUTF8(path.data(), static_cast<Py_ssize_t>(path.size()), "surrogateescape");
+}
+
+Reference EncodePath(PyObject* text) { return Reference(PyUnicode_AsEncodedString(text, "utf-8", "surrogateescape")); }
+
+std::string_view GetBytes(const Reference& bytes) {
+    return {PyBytes_AsString(bytes.get()), static_cast<size_t>(PyBytes_Size(bytes.get()))};
+}
+
+int ConvertCount(PyObject* number, void* count) {
+    *static_cast<uint64_t*>(count) = PyLong_AsUnsignedLongLong(number);
+    if (PyErr_Occurred() == nullptr) return 1;
+    if (PyErr_ExceptionMatches(PyExc_OverflowError) != 0)
+        PyErr_Format(PyExc_ValueError, "%S is not a number from 0 to 2^64 - 1", number);
+    return 0;
+}
+
+bool AppendTo(const Reference& list, PyObject* item) {
+    const Reference owned(item);
+    return owned != nullptr && PyList_Append(list.get(), owned.get()) == 0;
+}

@@ -1,0 +1,34 @@
+// Python's C interface, in its stable form: one build of the module serves Python 3.11 and whatever comes later.
+//
+// Functions that return a PyObject* return a new reference, or null with an exception set, unless they say otherwise.
+#pragma once
+
+#define PY_SSIZE_T_CLEAN
+#define Py_LIMITED_API 0x030B0000
+#include <Python.h>
+
+#include <cstdint>
+#include <memory>
+#include <string_view>
+
+struct ReferenceDrop {
+    void operator()(PyObject* object) const { Py_DECREF(object); }
+};
+
+// Owns one reference, or none. Destroyed by a thread that has the interpreter's lock.
+using Reference = std::unique_ptr<PyObject, ReferenceDrop>;
+
+// Paths are any bytes, and texts in Python: what is not UTF-8 becomes lone surrogates, as in the names of files.
+PyObject* DecodePath(std::string_view path);
+
+// The bytes of a text, as a bytes object. A TypeError for anything but a str.
+Reference EncodePath(PyObject* text);
+
+// What lies in a bytes object, as long as that lives.
+std::string_view GetBytes(const Reference& bytes);
+
+// A converter of PyArg_ParseTuple ("O&"): stores a number from 0 on in a uint64_t.
+int ConvertCount(PyObject* number, void* count);
+
+// Appends to a list. False with an exception set; null is one that is set already.
+bool AppendTo(const Reference& list, PyObject* item);

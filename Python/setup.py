@@ -1,0 +1,26 @@
+"""The part of the build that pyproject.toml can't say: the extension, and the entry points, which CMake installs, too."""
+
+import pathlib
+import shlex
+import subprocess
+
+from setuptools import Extension, setup
+
+
+def ask_pkg_config(option: str) -> list[str]:
+    return shlex.split(subprocess.run(["pkg-config", option, "zarvo"], check=True, capture_output=True, text=True).stdout)
+
+
+setup(
+    entry_points=pathlib.Path("entry_points.txt").read_text(encoding="utf-8"),
+    ext_modules=[
+        Extension(
+            "zarvo._native",
+            sorted(str(path) for path in pathlib.Path("Native").glob("*.cpp")),
+            extra_compile_args=["-std=c++20", "-fvisibility=hidden", *ask_pkg_config("--cflags")],
+            extra_link_args=ask_pkg_config("--libs"),
+            py_limited_api=True,
+        )
+    ],
+    options={"bdist_wheel": {"py_limited_api": "cp311"}},
+)

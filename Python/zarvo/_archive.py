@@ -1,0 +1,441 @@
+"""Archives and their entries."""
+
+from __future__ import annotations
+
+import functools
+import io
+import os
+import threading
+from collections.abc import Callable, Iterable, Iterator, Mapping
+from typing import Any, BinaryIO, NamedTuple, Union
+
+from . import _native
+from ._errors import ExtractionFailed
+
+StrPath = Union[str, "os.PathLike[str]"]
+
+# What zarvo.h calls them.
+_LAYOUTS = ("ZarvoFS", "ZarvoWeb", "ZarvoRaw", "ZarvoArchive")
+_OVERWRITE = {"always": 0, "never": 1, "fail": 2}
+
+# A larger file is read piece by piece, so that the user can interrupt.
+_ONE_READ = 1 << 24
+
+
+class Blocks(NamedTuple):
+    """The blocks of an archive."""
+
+    count: int
+    #: Decoded bytes of the largest block.
+    largest: int
+    #: How many can only be decoded from their start on.
+    streamed: int
+    #: How many there are of each kind.
+    none: int
+    lzma: int
+    lz4: int
+    lz4hc: int
+    unknown: int
+
+
+class Info(NamedTuple):
+    """What an archive is. Sizes are in bytes."""
+
+    #: "ZarvoFS", "ZarvoWeb", "ZarvoRaw" or "ZarvoArchive".
+    layout: str
+    version: int
+    engine_version: str
+    engine_revision: str
+    #: Of the archive, as its writer recorded it; 0 where it did not.
+    recorded_size: int
+    file_size: int
+    #: Of the data, decoded.
+    data_size: int
+    #: Of the data, as the blocks are stored.
+    stored_size: int
+    blocks: Blocks
+    #: Of the directory: files and folders, also repeated ones.
+    entries: int
+    files: int
+    folders: int
+    #: Of all files, also repeated ones.
+    file_bytes: int
+
+
+class Progress(NamedTuple):
+    """How far an extraction or a test has come."""
+
+    bytes: int
+    bytes_total: int
+    files: int
+    files_total: int
+
+
+class Extracted(NamedTuple):
+    """What an extraction has put in place."""
+
+    files: int
+    folders: int
+    #: Files that were there and were left (overwrite="never").
+    kept: int
+    #: Of the files.
+    bytes: int
+
+
+class Damage(NamedTuple):
+    """An entry with bytes that can't be read."""
+
+    path: str
+    size: int
+    #: How many bytes from its start can be read.
+    readable: int
+
+
+class TestResult(NamedTuple):
+    """What a test has found."""
+
+    files: int
+    bytes: int
+    #: In the archive's order.
+    damaged: list[Damage]
+    #: Damaged blocks, also those that no file uses: number and reason.
+    blocks: dict[int, str]
+
+
+class _FileSource:
+    """Reads a file object at any place. One thread at a time, because it has one position."""
+
+    def __init__(self, file: BinaryIO) -> None:
+        self._file = file
+        self._lock = threading.Lock()
+
+    def size(self) -> int:
+        return self._file.seek(0, os.SEEK_END)
+
+    def read_at(self, offset: int, size: int) -> bytes:
+        with self._lock:
+            self._file.seek(offset)
+            return self._file.read(size)
+
+
+def _is_plain_file(file: object) -> bool:
+    """Whether a file object shows the bytes of its descriptor, as decompressing ones don't."""
+    raw = file.raw if type(file) in (io.BufferedReader, io.BufferedRandom) else file
+    return type(raw) is io.FileIO
+
+
+class _EntryFile(io.RawIOBase):
+    """A file of an archive, for an io.BufferedReader."""
+
+    mode = "rb"
+
+    def __init__(self, stream: _native.Stream, entry: Entry) -> None:
+        self._stream: _native.Stream | None = stream
+        self._position = 0
+        self._size = entry.size
+        # Of a file that passes the end of the data, only as much is asked for at once as tells that: a damaged size must
+        # not ask for memory.
+        self._end = min(entry.size, max(0, entry.archive.info.data_size - entry.offset) + 1)
+        self.name = entry.path
+
+    def _open_stream(self) -> _native.Stream:
+        if self._stream is None:
+            raise ValueError("I/O operation on closed file")
+        return self._stream
+
+    def close(self) -> None:
+        self._stream = None
+        super().close()
+
+    def readable(self) -> bool:
+        self._open_stream()
+        return True
+
+    def seekable(self) -> bool:
+        self._open_stream()
+        return True
+
+    def readinto(self, buffer: Any) -> int:
+        count = self._open_stream().readinto(buffer)
+        self._position += count
+        return count
+
+    def readall(self) -> bytes:
+        data = self._open_stream().read(max(0, self._end - self._position))
+        self._position += len(data)
+        return data
+
+    def seek(self, offset: int, whence: int = os.SEEK_SET) -> int:
+        stream = self._open_stream()
+        start = {os.SEEK_SET: 0, os.SEEK_CUR: self._position, os.SEEK_END: self._size}.get(whence)
+        if start is None:
+            raise ValueError(f"invalid whence ({whence})")
+        position = start + offset
+        if position < 0:
+            raise ValueError(f"negative seek position {position}")
+        stream.seek(position)
+        self._position = position
+        return position
+
+    def tell(self) -> int:
+        self._open_stream()
+        return self._position
+
+
+class Entry:
+    """A file or a folder of an archive. It can be used until the archive is closed."""
+
+    __slots__ = ("archive", "index", "path", "kind", "size", "offset", "flags")
+
+    archive: Archive
+    #: The number in the archive's directory.
+    index: int
+    #: As the archive stores it. Bytes that are not UTF-8 are lone surrogates, as in the names of files.
+    path: str
+    #: "file" or "folder".
+    kind: str
+    #: Bytes of the file.
+    size: int
+    #: Of the file's first byte in the archive's data.
+    offset: int
+    #: As stored.
+    flags: int
+
+    def __init__(self, archive: Archive, fields: _native.EntryFields) -> None:
+        self.archive = archive
+        self.index, self.path, self.kind, self.size, self.offset, self.flags = fields
+
+    def is_dir(self) -> bool:
+        """Whether it is a folder."""
+        return self.kind == "folder"
+
+    def read(self) -> bytes:
+        """Return the file's bytes."""
+        self._require_file()
+        if self.size > _ONE_READ:
+            with self.open() as file:
+                return file.read()
+        return self.archive._native.read(self.index, 0, self.size)
+
+    def open(self) -> io.BufferedReader:
+        """Open the file for reading: a binary file object that can seek.
+
+        Several may be open at once, in several threads. It stays usable when the archive is closed meanwhile.
+        """
+        self._require_file()
+        return io.BufferedReader(_EntryFile(self.archive._native.open_stream(self.index), self), 1 << 16)
+
+    def _read_range(self, start: int, end: int) -> bytes:
+        """Bytes [start, end) of the file; both lie in it."""
+        self._require_file()
+        return self.archive._native.read(self.index, start, end - start)
+
+    def _require_file(self) -> None:
+        if self.kind != "file":
+            raise IsADirectoryError(f"{self.archive.name}: {self.path} is a folder")
+
+    def __eq__(self, other: object) -> bool:
+        return isinstance(other, Entry) and other.archive is self.archive and other.index == self.index
+
+    def __hash__(self) -> int:
+        return hash((id(self.archive), self.index))
+
+    def __repr__(self) -> str:
+        return f"<zarvo.Entry {self.path!r} ({self.kind}, {self.size} bytes)>"
+
+    def __reduce__(self) -> tuple[Any, ...]:
+        return (_get_entry, (self.archive, self.index))
+
+
+def _get_entry(archive: Archive, index: int) -> Entry:
+    return Entry(archive, archive._native.entry(index))
+
+
+class Archive(Mapping[str, Entry]):
+    """An open archive: a mapping of the paths of its entries to the entries, in the archive's order.
+
+    The keys are paths as the archive stores them. A look-up takes any form of a path: "\\" is "/", and empty and "."
+    components don't count. Of entries with the same path, the last is in the mapping, as after extraction. Entries that
+    extraction refuses are not in it; entries() has all.
+
+    Use it in a with statement, or close it. Any number of threads may use it. It can be pickled, and is then opened
+    again where it is unpickled.
+    """
+
+    def __init__(self, file: StrPath | BinaryIO, *, offset: int = 0) -> None:
+        self._handle: _native.Archive | None = None
+        self._offset = offset
+        self._file: str | BinaryIO
+        if isinstance(file, (str, os.PathLike)):
+            self._file = os.path.abspath(file)  # where an unpickled copy finds it
+            #: The path that it was opened by, or the name of the file object.
+            self.name: str = os.fspath(file)
+            self._handle = _native.open_path(file, self.name, offset)
+            return
+        self._file = file
+        self.name = str(getattr(file, "name", file))
+        if _is_plain_file(file):
+            self._handle = _native.open_descriptor(file.fileno(), self.name, offset)
+        else:
+            source = _FileSource(file)
+            self._handle = _native.open_source(source.read_at, source.size(), self.name, offset)
+
+    @property
+    def _native(self) -> _native.Archive:
+        if self._handle is None:
+            raise ValueError(f"{self.name}: the archive is closed")
+        return self._handle
+
+    def close(self) -> None:
+        """Close the archive. Calls that go on, and files that are open, go on until their ends."""
+        self._handle = None
+
+    @property
+    def closed(self) -> bool:
+        """Whether the archive is closed."""
+        return self._handle is None
+
+    def __enter__(self) -> Archive:
+        self._native  # a closed one can't be entered
+        return self
+
+    def __exit__(self, *exception: object) -> None:
+        self.close()
+
+    @functools.cached_property
+    def info(self) -> Info:
+        """What the archive is."""
+        layout, *fields = self._native.info()
+        fields[7] = Blocks(*fields[7])
+        return Info(_LAYOUTS[layout], *fields)
+
+    def __getitem__(self, path: str) -> Entry:
+        fields = self._native.find_entry(path)
+        if fields is None:
+            raise KeyError(f"there is no entry {path!r} in {self.name}")
+        return Entry(self, fields)
+
+    def __contains__(self, path: object) -> bool:
+        return isinstance(path, str) and self._native.find_entry(path) is not None
+
+    @functools.cached_property
+    def _length(self) -> int:
+        return self._native.count_found()
+
+    def __len__(self) -> int:
+        self._native
+        return self._length
+
+    def __iter__(self) -> Iterator[str]:
+        found = self._native.next_found(0)
+        while found is not None:
+            index, path = found
+            yield path
+            found = self._native.next_found(index + 1)
+
+    # Archives are compared as objects, and not by their contents, as other mappings are.
+    def __eq__(self, other: object) -> bool:
+        return self is other
+
+    def __hash__(self) -> int:
+        return id(self)
+
+    def entries(self) -> Iterator[Entry]:
+        """Yield every entry of the directory, also those that a later one replaces or that extraction refuses."""
+        for index in range(self._native.entry_count()):
+            yield _get_entry(self, index)
+
+    def glob(self, pattern: str) -> list[Entry]:
+        """Return the entries that a pattern chooses, in the archive's order.
+
+        "*", "?" and "[...]" match anything but "/", "**" matches anything, and "\\" makes the next character stand for
+        itself. A pattern that matches a folder also chooses everything below it.
+        """
+        return [_get_entry(self, index) for index in self._native.match([pattern])]
+
+    def extract(
+        self,
+        folder: StrPath,
+        *,
+        patterns: Iterable[str] | None = None,
+        exclude: Iterable[str] | None = None,
+        threads: int = 0,
+        overwrite: str = "always",
+        strip: int = 0,
+        keep_broken: bool = False,
+        progress: Callable[[Progress], object] | None = None,
+    ) -> Extracted:
+        """Write entries below a folder, which is made if it is missing. Nothing is written outside it.
+
+        patterns: which entries to take, as for glob(). Default: all.
+        exclude: which of them to leave out.
+        threads: at most so many; 0 is one per processor.
+        overwrite: "always" replaces files that are there, "never" leaves them, and "fail" takes them for failures.
+        strip: how many leading components each path loses.
+        keep_broken: whether the bytes of a damaged file before the damage are written.
+        progress: called ten times a second. An exception that it raises ends the extraction.
+
+        Raises ExtractionFailed at the end if entries failed or a pattern matches nothing. A disk that is full or can't
+        be written ends the extraction with an OSError.
+        """
+        if overwrite not in _OVERWRITE:
+            raise ValueError(f"overwrite is {overwrite!r}, and not one of {', '.join(_OVERWRITE)}")
+        wanted = _to_list("patterns", patterns)
+        summary, failed, unused = self._native.extract(
+            folder,
+            wanted,
+            _to_list("exclude", exclude),
+            threads,
+            _OVERWRITE[overwrite],
+            strip,
+            keep_broken,
+            _wrap_progress(progress),
+        )
+        extracted = Extracted(*summary)
+        failures: list[tuple[str, Exception]] = [(_get_entry(self, index).path, error) for index, error in failed]
+        failures += [(wanted[index], KeyError("the pattern matches nothing")) for index in unused if wanted]
+        if failures:
+            raise ExtractionFailed(extracted, failures)
+        return extracted
+
+    def test(
+        self, *, threads: int = 0, progress: Callable[[Progress], object] | None = None
+    ) -> TestResult:
+        """Decode every block once, and write nothing. Parameters are those of extract().
+
+        The formats hold no checksums, so damage that still decodes is not found.
+        """
+        summary, entries, blocks = self._native.test(threads, _wrap_progress(progress))
+        damaged = []
+        for index, readable in entries:
+            entry = _get_entry(self, index)
+            damaged.append(Damage(entry.path, entry.size, readable))
+        return TestResult(summary[0], summary[3], damaged, dict(blocks))
+
+    def __repr__(self) -> str:
+        return f"<zarvo.Archive {self.name!r}{' (closed)' if self.closed else ''}>"
+
+    def __reduce__(self) -> tuple[Any, ...]:
+        return (functools.partial(Archive, offset=self._offset), (self._file,))
+
+
+def _to_list(name: str, patterns: Iterable[str] | None) -> list[str] | None:
+    if isinstance(patterns, str):
+        raise TypeError(f"{name} is a list of patterns, and not one str")
+    return None if patterns is None else list(patterns)
+
+
+def _wrap_progress(progress: Callable[[Progress], object] | None) -> Callable[..., object] | None:
+    return None if progress is None else lambda *numbers: progress(Progress(*numbers))
+
+
+def open(file: StrPath | BinaryIO, *, offset: int = 0) -> Archive:
+    """Open an archive, and read its header and directory.
+
+    file: a path, or a binary file object that can seek, which stays open when the archive is closed. Nobody else may
+    use the file object meanwhile. Exceptions that it raises come out of the call that reads.
+    offset: of the archive's first byte in the file.
+
+    Raises BadArchive when it is no archive, and OSError when it can't be read.
+    """
+    return Archive(file, offset=offset)

@@ -1,0 +1,60 @@
+"""What goes wrong with archives.
+
+Other errors are Python's own: OSError for files and disks, KeyError for paths that an archive does not have, ValueError
+for an archive that was closed, MemoryError.
+"""
+
+from __future__ import annotations
+
+from typing import TYPE_CHECKING
+
+if TYPE_CHECKING:
+    from ._archive import Extracted
+
+
+class Error(Exception):
+    """An archive can't be used as asked; the base of the other classes."""
+
+
+class BadArchive(Error):
+    """The file is no archive, has an unknown version, or is damaged in its header or directory."""
+
+
+class DamagedData(BadArchive):
+    """Data can't be decoded, ends too early, or lies outside the archive."""
+
+
+class UnsupportedData(Error, NotImplementedError):
+    """The data needs a kind of compression that is not known."""
+
+
+class LimitExceeded(Error):
+    """The archive needs more than a limit of the library allows."""
+
+
+class ArchiveChanged(Error):
+    """The archive's file has changed since it was opened."""
+
+
+class EntryRefused(Error):
+    """Extraction refuses the path of an entry, or another entry has its place."""
+
+
+class ExtractionFailed(Error):
+    """Some entries were not extracted. All others were."""
+
+    #: What was extracted.
+    extracted: Extracted
+
+    #: (path or pattern, exception) for each entry that failed, and each pattern that matches nothing.
+    failures: list[tuple[str, Exception]]
+
+    def __init__(self, extracted: Extracted, failures: list[tuple[str, Exception]]) -> None:
+        super().__init__(extracted, failures)
+        self.extracted = extracted
+        self.failures = failures
+
+    def __str__(self) -> str:
+        path, error = self.failures[0]
+        more = f", and {len(self.failures) - 1} more" if len(self.failures) > 1 else ""
+        return f"{path}: {error}{more}"
