@@ -1,0 +1,45 @@
+"""What documents and examples show."""
+
+import doctest
+import importlib.util
+import os
+import pathlib
+import shutil
+import subprocess
+import sys
+import tempfile
+import unittest
+
+ROOT = pathlib.Path(__file__).parents[2]
+
+
+class Documents(unittest.TestCase):
+    def setUp(self):
+        folder = tempfile.TemporaryDirectory()
+        self.addCleanup(folder.cleanup)
+        self.addCleanup(os.chdir, os.getcwd())
+        os.chdir(folder.name)
+        shutil.copy(ROOT / "Samples" / "road.zarvo", "game.zarvo")
+
+    def test_show_sessions_as_they_are(self):
+        ran = doctest.testfile(str(ROOT / "docs" / "python.md"), module_relative=False, verbose=False)
+        self.assertEqual(0, ran.failed)
+        self.assertGreater(ran.attempted, 15)
+
+    @unittest.skipUnless(importlib.util.find_spec("distributed"), "distributed is not installed")
+    def test_example_for_many_archives_names_what_failed(self):
+        data = pathlib.Path("game.zarvo").read_bytes()
+        pathlib.Path("broken.zarvo").write_bytes(data[:1000] + bytes(40_000) + data[41_000:])
+        command = [sys.executable, str(ROOT / "Examples" / "TestManyArchives.py")]
+        shown = subprocess.run(
+            [*command, "game.zarvo", "broken.zarvo", "missing.zarvo"], stdout=subprocess.PIPE, text=True, timeout=300
+        )
+        lines = sorted(shown.stdout.splitlines())
+        self.assertEqual(1, shown.returncode)
+        self.assertEqual("3 archives, 2 failed", lines[0])
+        self.assertRegex(lines[1], "^broken.zarvo\tValueError\t1 damaged files, the first is tables/squares.csv$")
+        self.assertRegex(lines[2], "^missing.zarvo\tFileNotFoundError\t")
+
+
+if __name__ == "__main__":
+    unittest.main()
