@@ -26,8 +26,9 @@ TEST_F(Scripts, AskForAllTheirPackagesAtOnce) {
     Replace("sudo", "exit 1");
     Replace("id", "echo 1000");
     const std::string build = "g++ cmake ninja-build liblz4-dev lzma-dev libcli11-dev nlohmann-json3-dev libssl-dev ",
-                      test = build + "libgtest-dev clang libclang-rt-14-dev llvm jq",
-                      lint = build + "libgtest-dev libbenchmark-dev liblzma-dev clang clang-tidy-14 gcovr git python3";
+                      test = build + "libgtest-dev clang libclang-rt-14-dev llvm jq python3-dev python3-fsspec",
+                      lint = build + "libgtest-dev libbenchmark-dev liblzma-dev clang clang-tidy-14 gcovr git python3 "
+                                     "python3-dev";
     struct Row {
         std::string script;
         std::vector<std::string> arguments;
@@ -36,7 +37,8 @@ TEST_F(Scripts, AskForAllTheirPackagesAtOnce) {
     for (const Row& row :
          {Row{.script = "test",
          .arguments = {},
-         .packages = test + " build-essential debhelper lintian pkgconf shared-mime-info libglib2.0-bin"},
+         .packages = test + " build-essential debhelper lintian pkgconf shared-mime-info libglib2.0-bin dh-python "
+                            "python3-pip python3-setuptools python3-wheel"},
           Row{.script = "test", .arguments = {"debug"}, .packages = test},
           Row{.script = "bench", .arguments = {"--help"}, .packages = "python3"},
           Row{.script = "includes", .arguments = {}, .packages = lint}})

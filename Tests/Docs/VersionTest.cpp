@@ -16,4 +16,8 @@ TEST(Version, IsTheNewestOfTheChangelogs) {
     EXPECT_EQ(VARNEX_VERSION, FirstBetween("debian/changelog", "varnex (", ")"));
 }
 
+TEST(Version, IsThatOfThePythonModule) {
+    EXPECT_EQ(VARNEX_VERSION, FirstBetween("Python/pyproject.toml", "\nversion = \"", "\""));
+}
+
 } // namespace
