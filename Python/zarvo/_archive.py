@@ -25,7 +25,7 @@ _ONE_READ = 1 << 24
 class Blocks(NamedTuple):
     """The blocks of an archive."""
 
-    count: int
+    total: int
     #: Decoded bytes of the largest block.
     largest: int
     #: How many can only be decoded from their start on.
@@ -120,8 +120,9 @@ class _FileSource:
 
 def _is_plain_file(file: object) -> bool:
     """Whether a file object shows the bytes of its descriptor, as decompressing ones don't."""
-    raw = file.raw if type(file) in (io.BufferedReader, io.BufferedRandom) else file
-    return type(raw) is io.FileIO
+    if isinstance(file, (io.BufferedReader, io.BufferedRandom)):
+        file = file.raw
+    return type(file) is io.FileIO
 
 
 class _EntryFile(io.RawIOBase):
@@ -305,9 +306,8 @@ class Archive(Mapping[str, Entry]):
     @functools.cached_property
     def info(self) -> Info:
         """What the archive is."""
-        layout, *fields = self._native.info()
-        fields[7] = Blocks(*fields[7])
-        return Info(_LAYOUTS[layout], *fields)
+        info = self._native.info()
+        return Info(_LAYOUTS[info[0]], *info[1:8], Blocks(*info[8]), *info[9:])
 
     def __getitem__(self, path: str) -> Entry:
         fields = self._native.find_entry(path)
@@ -426,7 +426,10 @@ def _to_list(name: str, patterns: Iterable[str] | None) -> list[str] | None:
 
 
 def _wrap_progress(progress: Callable[[Progress], object] | None) -> Callable[..., object] | None:
-    return None if progress is None else lambda *numbers: progress(Progress(*numbers))
+    if progress is None:
+        return None
+    told = progress
+    return lambda *numbers: told(Progress(*numbers))
 
 
 def open(file: StrPath | BinaryIO, *, offset: int = 0) -> Archive:

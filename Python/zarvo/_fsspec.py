@@ -5,8 +5,8 @@ from __future__ import annotations
 import io
 from typing import Any
 
-import fsspec
-from fsspec.implementations.local import LocalFileSystem
+import fsspec  # type: ignore[import]
+from fsspec.implementations.local import LocalFileSystem  # type: ignore[import]
 
 from ._archive import Archive, Entry, _get_entry
 
@@ -15,7 +15,7 @@ from ._archive import Archive, Entry, _get_entry
 _READ_AHEAD = 1 << 18
 
 
-class ZarvoFileSystem(fsspec.AbstractFileSystem):
+class ZarvoFileSystem(fsspec.AbstractFileSystem):  # type: ignore[misc]
     """The files and folders of an archive, read only.
 
         fsspec.open("zarvo://inside.csv::game.zarvo")

@@ -96,11 +96,12 @@ class Path:
 
     def iterdir(self) -> Iterator[Path]:
         """Yield what the folder holds, in the archive's order."""
-        if not self.exists():
+        folder = self._find()
+        if folder is None:
             raise FileNotFoundError(f"{self} is not there")
         if not self.is_dir():
             raise NotADirectoryError(f"{self} is not a folder")
-        for item, name, _, _ in self.root._native.children(self._find()):
+        for item, name, _, _ in self.root._native.children(folder):
             child = self.joinpath(name)
             child._item = item
             yield child
@@ -123,7 +124,7 @@ class Path:
 
     def read_text(self, *args: Any, **kwargs: Any) -> str:
         """Return the file's text, with the arguments of io.TextIOWrapper."""
-        with self.open("r", *args, **kwargs) as file:
+        with io.TextIOWrapper(self._entry().open(), *args, **kwargs) as file:
             return file.read()
 
     def _entry(self) -> Entry:
