@@ -8,7 +8,6 @@
 #include "PythonSource.h"
 
 #include <string>
-#include <type_traits>
 #include <zarvo.h>
 
 struct ArchiveObject {

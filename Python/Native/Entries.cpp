@@ -1,5 +1,6 @@
 #include "Entries.h"
 
+#include "ArchiveObject.h"
 #include "Runs.h"
 
 #include <new>

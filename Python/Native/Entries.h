@@ -2,7 +2,7 @@
 // path, kind, size, offset, flags. Kinds are "file" and "folder".
 #pragma once
 
-#include "ArchiveObject.h"
+#include "Interpreter.h"
 
 // Makes the names of kinds; false with an exception set. Call it first.
 bool LoadKinds();

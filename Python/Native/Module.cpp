@@ -1,4 +1,5 @@
 // The module zarvo._native: zarvo.h for Python. The classes that users see are made of it in Python.
+#include "ArchiveObject.h"
 #include "Errors.h"
 #include "StreamObject.h"
 

@@ -1,5 +1,6 @@
 #include "Runs.h"
 
+#include "ArchiveObject.h"
 #include "Errors.h"
 
 #include <algorithm>

@@ -1,7 +1,9 @@
 // Extraction and tests of a whole archive, and the patterns that choose entries.
 #pragma once
 
-#include "ArchiveObject.h"
+#include "Interpreter.h"
+
+#include <zarvo.h>
 
 // A zarvo_patterns, made of a list of texts.
 class Patterns {

@@ -1,5 +1,7 @@
 #include "StreamObject.h"
 
+#include "ArchiveObject.h"
+
 #include <algorithm>
 #include <mutex>
 

@@ -58,3 +58,7 @@ __all__ = [
     "UnsupportedData",
     "open",
 ]
+
+# In messages and in help(), they are called what users call them.
+for _name in __all__:
+    globals()[_name].__module__ = __name__
