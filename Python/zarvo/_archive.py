@@ -186,20 +186,22 @@ class _EntryFile(io.RawIOBase):
 class Entry:
     """A file or a folder of an archive. It can be used until the archive is closed."""
 
-    __slots__ = ("archive", "index", "path", "kind", "size", "offset", "flags")
+    __slots__ = {
+        "archive": "The archive that it is in.",
+        "index": "The number in the archive's directory.",
+        "path": "As the archive stores it. Bytes that are not UTF-8 are lone surrogates, as in the names of files.",
+        "kind": '"file" or "folder".',
+        "size": "Bytes of the file.",
+        "offset": "Of the file's first byte in the archive's data.",
+        "flags": "As stored.",
+    }
 
     archive: Archive
-    #: The number in the archive's directory.
     index: int
-    #: As the archive stores it. Bytes that are not UTF-8 are lone surrogates, as in the names of files.
     path: str
-    #: "file" or "folder".
     kind: str
-    #: Bytes of the file.
     size: int
-    #: Of the file's first byte in the archive's data.
     offset: int
-    #: As stored.
     flags: int
 
     def __init__(self, archive: Archive, fields: _native.EntryFields) -> None:

@@ -20,17 +20,20 @@ class Path:
             print(path.name, len(path.read_bytes()))
     """
 
-    __slots__ = ("root", "at", "_item")
+    __slots__ = {
+        "root": "The archive.",
+        "at": 'The place in it, without "/" at its ends; "" is the archive\'s root.',
+        "_item": "The number of what is there, once it is known.",
+    }
 
-    #: The archive.
     root: Archive
-    #: The place in it, without "/" at its ends; "" is the archive's root.
     at: str
+    _item: int | None
 
     def __init__(self, root: Archive | StrPath | BinaryIO, at: str = "") -> None:
         self.root = root if isinstance(root, Archive) else Archive(root)
         self.at = "/".join(part for part in at.replace("\\", "/").split("/") if part not in ("", "."))
-        self._item: int | None = None
+        self._item = None
 
     def _find(self) -> int | None:
         if self._item is None:
