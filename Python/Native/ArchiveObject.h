@@ -11,12 +11,13 @@
 #include <zarvo.h>
 
 struct ArchiveObject {
-    PyObject_HEAD zarvo_archive* archive; // null when it could not be opened
-    PythonSource* source;                 // owned; null unless Python delivers the bytes
-    std::string* name;                    // owned; for messages
-    int calls;                            // that go on
-    bool hasTree;                         // zarvo_find no longer takes long
-    bool isLost;                          // in a child process: another thread was in a call when the process forked
+    PyObject base;          // first, as Python asks for
+    zarvo_archive* archive; // null when it could not be opened
+    PythonSource* source;   // owned; null unless Python delivers the bytes
+    std::string* name;      // owned; for messages
+    int calls;              // that go on
+    bool hasTree;           // zarvo_find no longer takes long
+    bool isLost;            // in a child process: another thread was in a call when the process forked
 };
 
 inline ArchiveObject* AsArchive(PyObject* self) { return reinterpret_cast<ArchiveObject*>(self); }

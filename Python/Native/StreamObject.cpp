@@ -10,7 +10,8 @@ static PyObject* s_StreamType = nullptr;
 namespace {
 
 struct StreamObject {
-    PyObject_HEAD ArchiveObject* archive; // owned
+    PyObject base;          // first, as Python asks for
+    ArchiveObject* archive; // owned
     zarvo_stream* stream;
     uint64_t index;
     std::mutex* lock; // held while the stream is used

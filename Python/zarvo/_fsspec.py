@@ -10,8 +10,8 @@ from fsspec.implementations.local import LocalFileSystem  # type: ignore[import]
 
 from ._archive import Archive, Entry, _get_entry
 
-# The library asks for pieces of 16 KiB of the directory, and for one block of data at a time. An archive elsewhere is asked
-# for so much more than that, so that what lies in a row does not cost a request each.
+# The library asks for pieces of 16 KiB of the directory, and for one block of data at a time. Reading so much more at
+# once saves requests.
 _READ_AHEAD = 1 << 18
 
 
@@ -45,15 +45,11 @@ class ZarvoFileSystem(fsspec.AbstractFileSystem):  # type: ignore[misc]
         if not isinstance(fo, str):
             self.archive = Archive(fo)
             return
-        options = dict(target_options or {})
-        if target_protocol is not None:
-            options["protocol"] = target_protocol
-        self.target, path = fsspec.core.url_to_fs(fo, **options)
-        if isinstance(self.target, LocalFileSystem):
-            self.archive = Archive(path)
+        there = fsspec.open(fo, "rb", protocol=target_protocol, **(target_options or {}))
+        if isinstance(there.fs, LocalFileSystem):
+            self.archive = Archive(there.path)
         else:
-            file = self.target.open(path, "rb", block_size=_READ_AHEAD, cache_type="readahead")
-            self.archive = Archive(file)
+            self.archive = Archive(there.fs.open(there.path, "rb", block_size=_READ_AHEAD, cache_type="readahead"))
 
     @classmethod
     def _strip_protocol(cls, path: Any) -> Any:

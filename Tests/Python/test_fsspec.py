@@ -127,6 +127,10 @@ class FileSystem(unittest.TestCase):
         block = 1 << 18
         self.assertLessEqual(sum(Elsewhere.fetched), directory + block)
         before = sum(Elsewhere.fetched)
+        with fsspec.open(f"zarvo://a/7::elsewhere://{self.path}") as file:
+            self.assertEqual(entries[7][1], file.read())
+        self.assertGreater(sum(Elsewhere.fetched), before)
+        before = sum(Elsewhere.fetched)
         self.assertEqual(entries[250][1], there.cat("c/50"))
         self.assertLessEqual(sum(Elsewhere.fetched) - before, (1 << 16) * 2 + block)
 
