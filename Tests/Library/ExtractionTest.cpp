@@ -411,7 +411,7 @@ TEST(Extraction, AnyNumberOfFilesMayShareTheirData) {
         description.fields[node + "size"] = kSize;
     }
     const std::string bytes = BuildArchive(description).bytes;
-    for (const rlim_t descriptors : {16, 64, 1'024}) {
+    for (const rlim_t descriptors : {16u, 64u, 1'024u}) {
         SCOPED_TRACE(descriptors);
         const TemporaryFolder folder;
         auto source = std::make_unique<CountingSource>(bytes);
