@@ -54,6 +54,7 @@ protected:
         }
         Replace("cmake", "true");
         Replace("dpkg-query", "echo installed");
+        Replace("python3", "PYTHONPATH=" ZARVO_PYTHON_PATH " exec /usr/bin/python3 \"$@\"");
     }
 
     Transcript RunLine(const std::string& command) { return Run("/bin/bash", {"-c", command}); }
@@ -66,11 +67,22 @@ INSTANTIATE_TEST_SUITE_P(Documents, ConsoleOf, testing::Values("README.md", "doc
 TEST_P(ConsoleOf, PrintsWhatTheDocumentShows) {
     const std::vector<Step> steps = ReadSteps(VARNEX_SOURCE_DIR "/" + std::string(GetParam()));
     EXPECT_LT(3u, steps.size());
+    const bool canMount = access("/dev/fuse", R_OK | W_OK) == 0;
+    const bool canImport = *ZARVO_PYTHON_PATH != '\0' && !VARNEX_SANITIZED; // Python itself is not sanitized
+    std::string leftOut;
+    bool isMountLeftOut = false;
     for (const Step& step : steps) {
+        if (step.command.starts_with("zarvo mount")) isMountLeftOut = !canMount;
+        if (isMountLeftOut || (step.command.starts_with("python3") && !canImport)) {
+            leftOut += "\n" + step.command;
+            if (step.command.starts_with("fusermount3 -u")) isMountLeftOut = false;
+            continue;
+        }
         const auto [status, output] = RunLine(step.command);
         EXPECT_EQ(0, status) << step.command;
         EXPECT_EQ(WithoutSeconds(step.output), WithoutSeconds(output)) << step.command;
     }
+    if (!leftOut.empty()) GTEST_SKIP() << "this system can't run:" << leftOut;
 }
 
 TEST_F(Console, ScreenshotMakesThePictureOfTheReadme) {
