@@ -17,6 +17,7 @@ setup(
         Extension(
             "zarvo._native",
             sorted(str(path) for path in pathlib.Path("Native").glob("*.cpp")),
+            define_macros=[("Py_LIMITED_API", "0x030B0000"), ("PY_SSIZE_T_CLEAN", None)],
             extra_compile_args=["-std=c++20", "-fvisibility=hidden", *ask_pkg_config("--cflags")],
             extra_link_args=ask_pkg_config("--libs"),
             py_limited_api=True,

@@ -2,7 +2,7 @@
 // path, kind, size, offset, flags. Kinds are "file" and "folder".
 #pragma once
 
-#include "Interpreter.h"
+#include <Python.h>
 
 // Makes the names of kinds; false with an exception set. Call it first.
 bool LoadKinds();

@@ -1,10 +1,9 @@
-// Python's C interface, in its stable form: one build of the module serves Python 3.11 and whatever comes later.
+// Helpers for Python's C interface, which the build asks for in its stable form (Py_LIMITED_API): one build of the
+// module serves Python 3.11 and whatever comes later.
 //
 // Functions that return a PyObject* return a new reference, or null with an exception set, unless they say otherwise.
 #pragma once
 
-#define PY_SSIZE_T_CLEAN
-#define Py_LIMITED_API 0x030B0000
 #include <Python.h>
 
 #include <cstdint>

@@ -1,8 +1,7 @@
 // Extraction and tests of a whole archive, and the patterns that choose entries.
 #pragma once
 
-#include "Interpreter.h"
-
+#include <Python.h>
 #include <zarvo.h>
 
 // A zarvo_patterns, made of a list of texts.

@@ -1,7 +1,7 @@
 // The type _native.Stream: a file of an archive that is read from its start on. It keeps the archive open.
 #pragma once
 
-#include "Interpreter.h"
+#include <Python.h>
 
 bool AddStreamType(PyObject* module);
 
