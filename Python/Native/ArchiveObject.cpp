@@ -1,5 +1,6 @@
 #include "ArchiveObject.h"
 
+#include "Creation.h"
 #include "Entries.h"
 #include "Errors.h"
 #include "Runs.h"
@@ -183,6 +184,7 @@ PyMethodDef s_Functions[] = {
     {"open_path", OpenPath, METH_VARARGS, nullptr},
     {"open_descriptor", OpenDescriptor, METH_VARARGS, nullptr},
     {"open_source", OpenSource, METH_VARARGS, nullptr},
+    {"create", CreateArchive, METH_VARARGS, nullptr},
     {nullptr, nullptr, 0, nullptr},
 };
 

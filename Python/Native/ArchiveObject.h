@@ -22,7 +22,7 @@ struct ArchiveObject {
 
 inline ArchiveObject* AsArchive(PyObject* self) { return reinterpret_cast<ArchiveObject*>(self); }
 
-// Adds the type to the module, and the functions that open archives. False with an exception set.
+// Adds the type to the module, and the functions that open and make archives. False with an exception set.
 bool AddArchiveType(PyObject* module);
 
 // Python calls it in the child after a fork. Marks the archives that were in use: their locks will never be released.
@@ -47,14 +47,11 @@ public:
     // False, with an exception set, when a fork has left the archive unusable.
     bool IsAllowed() const;
 
-    // Runs a function without the interpreter's lock. Must be the innermost: nothing in function may throw.
+    // As WithoutInterpreter.
     template <typename Function>
     auto Unlocked(Function function) {
         m_HasInterpreter = false;
-        PyThreadState* const state = PyEval_SaveThread();
-        const auto result = function();
-        // Not in a destructor: when the interpreter is ending, Python ends this thread here by unwinding its stack.
-        PyEval_RestoreThread(state);
+        const auto result = WithoutInterpreter(function);
         m_HasInterpreter = true;
         return result;
     }

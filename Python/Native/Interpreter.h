@@ -29,5 +29,15 @@ std::string_view GetBytes(const Reference& bytes);
 // A converter of PyArg_ParseTuple ("O&"): stores a number from 0 on in a uint64_t.
 int ConvertCount(PyObject* number, void* count);
 
+// Runs a function without the interpreter's lock. The function must not throw.
+template <typename Function>
+auto WithoutInterpreter(Function function) {
+    PyThreadState* const state = PyEval_SaveThread();
+    const auto result = function();
+    // Not in a destructor: when the interpreter is ending, Python ends this thread here by unwinding its stack.
+    PyEval_RestoreThread(state);
+    return result;
+}
+
 // Appends to a list. False with an exception set; null is one that is set already.
 bool AppendTo(const Reference& list, PyObject* item);

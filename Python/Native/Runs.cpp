@@ -2,6 +2,7 @@
 
 #include "ArchiveObject.h"
 #include "Errors.h"
+#include "ProgressTeller.h"
 
 #include <algorithm>
 #include <new>
@@ -28,6 +29,8 @@ bool Patterns::Add(PyObject* texts) {
     return count >= 0;
 }
 
+uint32_t LimitThreads(uint64_t threads) { return static_cast<uint32_t>(std::min<uint64_t>(threads, UINT32_MAX)); }
+
 PyObject* Patterns::MakeUnusedList() const {
     Reference unused(PyList_New(0));
     if (unused == nullptr) return nullptr;
@@ -52,9 +55,8 @@ struct Run {
     }
 
     ArchiveObject* self;
-    PyObject* progress; // None or a function
+    ProgressTeller progress;
     int exceptionsBefore;
-    Reference exception; // raised meanwhile
 
     struct Failure {
         uint64_t index; // of an entry or a block
@@ -88,19 +90,9 @@ Run* AsRun(void* context) { return static_cast<Run*>(context); }
 int TellProgress(void* context, const zarvo_progress* progress) {
     Run* const run = AsRun(context);
     const PyGILState_STATE state = PyGILState_Ensure();
-    bool isStopped = run->HasSourceFailed();
-    if (!isStopped && run->exception == nullptr) {
-        Reference answer;
-        if (PyErr_CheckSignals() == 0)
-            answer.reset(run->progress == Py_None
-                             ? Py_NewRef(Py_None)
-                             : PyObject_CallFunction(run->progress, "KKKK", progress->bytes, progress->bytes_total,
-                                                     progress->files, progress->files_total));
-        if (answer == nullptr) run->exception.reset(TakeError());
-    }
-    isStopped = isStopped || run->exception != nullptr;
+    const bool isToGoOn = !run->HasSourceFailed() && run->progress.Tell(*progress);
     PyGILState_Release(state);
-    return isStopped ? 1 : 0;
+    return isToGoOn ? 0 : 1;
 }
 
 void TakeReport(void* context, const zarvo_report* report) {
@@ -121,8 +113,8 @@ void TakeDamagedEntry(void* context, uint64_t entry, uint64_t readable) {
 
 // False with an exception set when the run has ended early.
 bool HasEndedWell(Run* run, LibraryCall* call, zarvo_code code, const std::string& subject) {
-    if (run->exception != nullptr) {
-        RestoreError(std::move(run->exception));
+    if (run->progress.SetException()) {
+        return false;
     } else if (run->HasSourceFailed()) {
         RestoreError(Reference(run->self->source->LastException()));
     } else if (code != ZARVO_OK) {
@@ -137,7 +129,7 @@ bool HasEndedWell(Run* run, LibraryCall* call, zarvo_code code, const std::strin
 
 zarvo_run_options MakeRunOptions(Run* run, uint64_t threads) {
     zarvo_run_options options = ZARVO_RUN_OPTIONS_INIT;
-    options.threads = static_cast<uint32_t>(std::min<uint64_t>(threads, UINT32_MAX));
+    options.threads = LimitThreads(threads);
     options.progress = TellProgress;
     options.context = run;
     return options;

@@ -26,6 +26,9 @@ private:
     size_t m_Count = 0;
 };
 
+// For zarvo_run_options.
+uint32_t LimitThreads(uint64_t threads);
+
 // Archive.extract(folder, patterns, excluded, threads, overwrite, strip, keep_broken, progress). Returns the summary,
 // the failures of entries as (number, exception), and the numbers of patterns that matched nothing.
 PyObject* ExtractArchive(PyObject* self, PyObject* arguments);

@@ -1,4 +1,4 @@
-"""Reads archives of the Zarvo engine's formats.
+"""Reads and makes archives of the Zarvo engine's formats.
 
     import zarvo
 
@@ -17,17 +17,20 @@ Any number of threads may use one archive. All calls let other threads run while
 from ._archive import (
     Archive,
     Blocks,
+    Created,
     Damage,
     Entry,
     Extracted,
     Info,
     Progress,
     TestResult,
+    create,
     open,
 )
 from ._errors import (
     ArchiveChanged,
     BadArchive,
+    CreationFailed,
     DamagedData,
     EntryRefused,
     Error,
@@ -43,6 +46,8 @@ __all__ = [
     "ArchiveChanged",
     "BadArchive",
     "Blocks",
+    "Created",
+    "CreationFailed",
     "Damage",
     "DamagedData",
     "Entry",
@@ -56,6 +61,7 @@ __all__ = [
     "Progress",
     "TestResult",
     "UnsupportedData",
+    "create",
     "open",
 ]
 

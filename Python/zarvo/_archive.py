@@ -10,13 +10,14 @@ from collections.abc import Callable, Iterable, Iterator, Mapping
 from typing import Any, BinaryIO, NamedTuple, Union
 
 from . import _native
-from ._errors import ExtractionFailed
+from ._errors import CreationFailed, ExtractionFailed
 
 StrPath = Union[str, "os.PathLike[str]"]
 
 # What zarvo.h calls them.
 _LAYOUTS = ("ZarvoFS", "ZarvoWeb", "ZarvoRaw", "ZarvoArchive")
-_OVERWRITE = {"always": 0, "never": 1, "fail": 2}
+_COMPRESSIONS = ("none", "lzma", "lz4", "lz4hc")
+_OVERWRITE = ("always", "never", "fail")
 
 # A larger file is read piece by piece, so that the user can interrupt.
 _ONE_READ = 1 << 24
@@ -380,15 +381,13 @@ class Archive(Mapping[str, Entry]):
         Raises ExtractionFailed at the end if entries failed or a pattern matches nothing. A disk that is full or can't
         be written ends the extraction with an OSError.
         """
-        if overwrite not in _OVERWRITE:
-            raise ValueError(f"overwrite is {overwrite!r}, and not one of {', '.join(_OVERWRITE)}")
         wanted = _to_list("patterns", patterns)
         summary, failed, unused = self._native.extract(
             folder,
             wanted,
             _to_list("exclude", exclude),
             threads,
-            _OVERWRITE[overwrite],
+            _choose("overwrite", overwrite, _OVERWRITE),
             strip,
             keep_broken,
             _wrap_progress(progress),
@@ -421,6 +420,25 @@ class Archive(Mapping[str, Entry]):
         return (functools.partial(Archive, offset=self._offset), (self._file,))
 
 
+class Created(NamedTuple):
+    """What an archive was made of."""
+
+    files: int
+    folders: int
+    #: Of the files.
+    bytes: int
+    #: Of the archive.
+    archive_bytes: int
+    #: Links, devices, and folders that the layout does not hold: path and reason.
+    left_out: list[tuple[str, str]]
+
+
+def _choose(name: str, word: str, words: tuple[str, ...]) -> int:
+    if word not in words:
+        raise ValueError(f"{name} is {word!r}, and not one of {', '.join(words)}")
+    return words.index(word)
+
+
 def _to_list(name: str, patterns: Iterable[str] | None) -> list[str] | None:
     if isinstance(patterns, str):
         raise TypeError(f"{name} is a list of patterns, and not one str")
@@ -444,3 +462,54 @@ def open(file: StrPath | BinaryIO, *, offset: int = 0) -> Archive:
     Raises BadArchive when it is no archive, and OSError when it can't be read.
     """
     return Archive(file, offset=offset)
+
+
+def create(
+    file: StrPath,
+    folder: StrPath,
+    *,
+    layout: str = "ZarvoFS",
+    compression: str | None = None,
+    level: int | None = None,
+    streamed: bool = False,
+    block_size: int = 0,
+    engine_version: str | None = None,
+    engine_revision: str | None = None,
+    exclude: Iterable[str] | None = None,
+    force: bool = False,
+    threads: int = 0,
+    progress: Callable[[Progress], object] | None = None,
+) -> Created:
+    """Make an archive of the files and folders below a folder. The same files and options give the same bytes.
+
+    layout: "ZarvoFS", "ZarvoWeb", "ZarvoRaw" or "ZarvoArchive".
+    compression: "none", "lzma", "lz4" or "lz4hc". Default: "lz4hc", or "lzma" if streamed.
+    level: 1 to 12 for LZ4HC, 0 to 9 for LZMA.
+    streamed: whether blocks are decoded from their start on only, which LZMA and "none" allow.
+    block_size: decoded bytes of a block; 0 is 131,072.
+    engine_version, engine_revision: what the archive says it is for.
+    exclude: patterns of what is left out.
+    force: whether an archive that is there is replaced.
+    threads, progress: as for Archive.extract().
+
+    Raises CreationFailed if a file can't be read or the layout can't hold it, FileExistsError for an archive that is
+    there, and ValueError for options that the layout does not allow. Then there is no new archive.
+    """
+    files, folders, size, archive_size, left_out, failures = _native.create(
+        file,
+        folder,
+        _to_list("exclude", exclude),
+        threads,
+        _choose("layout", layout, _LAYOUTS),
+        -1 if compression is None else _choose("compression", compression, _COMPRESSIONS),
+        -1 if level is None else level,
+        streamed,
+        block_size,
+        engine_version,
+        engine_revision,
+        force,
+        _wrap_progress(progress),
+    )
+    if failures:
+        raise CreationFailed(failures)
+    return Created(files, folders, size, archive_size, left_out)

@@ -40,21 +40,33 @@ class EntryRefused(Error):
     """Extraction refuses the path of an entry, or another entry has its place."""
 
 
-class ExtractionFailed(Error):
-    """Some entries were not extracted. All others were."""
+class _Failures(Error):
+    """Several things failed."""
 
-    #: What was extracted.
-    extracted: Extracted
-
-    #: (path or pattern, exception) for each entry that failed, and each pattern that matches nothing.
+    #: (path or pattern, exception) for each of them.
     failures: list[tuple[str, Exception]]
-
-    def __init__(self, extracted: Extracted, failures: list[tuple[str, Exception]]) -> None:
-        super().__init__(extracted, failures)
-        self.extracted = extracted
-        self.failures = failures
 
     def __str__(self) -> str:
         path, error = self.failures[0]
         more = f", and {len(self.failures) - 1} more" if len(self.failures) > 1 else ""
         return f"{path}: {error}{more}"
+
+
+class CreationFailed(_Failures):
+    """Files could not be put into an archive, so none was made. failures says which, and why."""
+
+    def __init__(self, failures: list[tuple[str, Exception]]) -> None:
+        super().__init__(failures)
+        self.failures = failures
+
+
+class ExtractionFailed(_Failures):
+    """Some entries were not extracted, all others were. failures says which, or which pattern matches nothing."""
+
+    #: What was extracted.
+    extracted: Extracted
+
+    def __init__(self, extracted: Extracted, failures: list[tuple[str, Exception]]) -> None:
+        super().__init__(extracted, failures)
+        self.extracted = extracted
+        self.failures = failures

@@ -43,6 +43,22 @@ class Stream:
     def read(self, size: int, /) -> bytes: ...
     def seek(self, position: int, /) -> None: ...
 
+def create(
+    path: str | bytes | PathLike[str] | PathLike[bytes],
+    folder: str | bytes | PathLike[str] | PathLike[bytes],
+    exclude: list[str] | None,
+    threads: int,
+    layout: int,
+    compression: int,
+    level: int,
+    streamed: bool,
+    block_size: int,
+    engine_version: str | None,
+    engine_revision: str | None,
+    force: bool,
+    progress: _Progress | None,
+    /,
+) -> tuple[int, int, int, int, list[tuple[str, str]], list[tuple[str, Exception]]]: ...
 def open_path(
     path: str | bytes | PathLike[str] | PathLike[bytes], name: str, offset: int, /
 ) -> Archive: ...

@@ -345,7 +345,11 @@ class Extraction(ArchiveTest):
         def stop(progress):
             raise LookupError("enough")
 
-        for run in (lambda: archive.extract(self.folder / "out", progress=stop), lambda: archive.test(progress=stop)):
+        for run in (
+            lambda: archive.extract(self.folder / "out", progress=stop),
+            lambda: archive.test(progress=stop),
+            lambda: zarvo.create(self.folder / "new.zarvo", self.folder, progress=stop),
+        ):
             with self.assertRaisesRegex(LookupError, "enough"):
                 run()
 
@@ -373,6 +377,72 @@ class Extraction(ArchiveTest):
         self.assertEqual([("broken", len(TEXT))], [damage[:2] for damage in result.damaged])
         self.assertGreaterEqual(result.damaged[0].readable, (1 << 16) - 1)
         self.assertEqual([1], list(result.blocks))
+
+
+class Creation(ArchiveTest):
+    def setUp(self):
+        super().setUp()
+        self.new = self.folder / "new.zarvo"
+        self.made_of = self.folder / "folder"
+        for path, content in TREE:
+            place = self.made_of / path
+            if content is FOLDER:
+                place.mkdir(parents=True)
+            else:
+                place.parent.mkdir(parents=True, exist_ok=True)
+                place.write_bytes(content)
+
+    def test_makes_what_is_read_back(self):
+        everything = {path: content for path, content in TREE if content is not FOLDER}
+        for options, kind in (
+            ({}, "lz4hc"),
+            ({"compression": "lzma", "level": 1, "block_size": 65536, "threads": 2}, "lzma"),
+            ({"streamed": True}, "lzma"),
+            ({"compression": "lz4"}, "lz4"),
+            ({"compression": "none"}, "none"),
+            ({"layout": "ZarvoWeb", "engine_version": "9.1"}, "lzma"),
+        ):
+            created = zarvo.create(self.new, self.made_of, force=True, **options)
+            with zarvo.open(self.new) as archive:
+                files = {path: entry.read() for path, entry in archive.items() if entry.kind == "file"}
+                info = archive.info
+            self.assertEqual(everything, files, options)
+            self.assertEqual((len(files), info.file_bytes), (created.files, created.bytes), options)
+            self.assertEqual(self.new.stat().st_size, created.archive_bytes)
+            self.assertGreater(getattr(info.blocks, kind), 0, options)
+            self.assertEqual(options.get("layout", "ZarvoFS"), info.layout)
+            self.assertEqual(options.get("engine_version", "5.x.x"), info.engine_version)
+
+    def test_says_what_it_leaves_out(self):
+        (self.made_of / "link").symlink_to("readme.txt")
+        created = zarvo.create(self.new, self.made_of, exclude=["tables"])
+        self.assertEqual(["link"], [path for path, _ in created.left_out])
+        with zarvo.open(self.new) as archive:
+            self.assertEqual({"empty", "readme.txt", "road/of/one.txt"}, {e.path for e in archive.values() if not e.is_dir()})
+
+    def test_leaves_no_archive_when_it_fails(self):
+        (self.made_of / "a\\b").write_bytes(b"1")
+        with self.assertRaises(zarvo.CreationFailed) as caught:
+            zarvo.create(self.new, self.made_of)
+        self.assertEqual(
+            [("a\\b", zarvo.EntryRefused)], [(path, type(error)) for path, error in caught.exception.failures]
+        )
+        (self.made_of / "a\\b").unlink()
+        for options, error in (
+            ({"layout": "ZIP"}, ValueError),
+            ({"compression": "lz4", "streamed": True}, ValueError),
+            ({"level": 99}, ValueError),
+            ({"exclude": "a"}, TypeError),
+        ):
+            with self.assertRaises(error, msg=options):
+                zarvo.create(self.new, self.made_of, **options)
+        self.assertFalse(self.new.exists())
+        with self.assertRaises(FileNotFoundError):
+            zarvo.create(self.new, self.folder / "none")
+        self.new.write_bytes(b"old")
+        with self.assertRaises(FileExistsError):
+            zarvo.create(self.new, self.made_of)
+        self.assertEqual(b"old", self.new.read_bytes())
 
 
 class Paths(ArchiveTest):
