@@ -1,6 +1,7 @@
 #include "Creation.h"
 
 #include "Errors.h"
+#include "Interpreter.h"
 #include "ProgressTeller.h"
 #include "Runs.h"
 

@@ -1,7 +1,7 @@
 // Archives that are made of folders.
 #pragma once
 
-#include "Interpreter.h"
+#include <Python.h>
 
 // _native.create(path, folder, exclude, threads, layout, compression, level, streamed, block_size, engine_version,
 // engine_revision, force, progress). Returns files, folders, bytes, bytes of the archive, what was left out as (path,
