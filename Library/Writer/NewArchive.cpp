@@ -57,14 +57,13 @@ zarvo_code NewArchive::CheckPlace(bool isReplacing, Failure* failure) const {
 // which another run may have finished or removed meanwhile.
 zarvo_code NewArchive::OpenLocked(bool* hasLeftover, bool* isDone, Failure* failure) {
     constexpr int kFlags = O_RDWR | O_CREAT | O_NOFOLLOW | O_NONBLOCK | O_CLOEXEC;
-    constexpr char kInTheWay[] = "something is in the unfinished file's place";
     const char* const name = m_Unfinished.c_str();
     bool isNew = true;
     int opened = RepeatOnInterrupt([&] { return openat(m_Folder, name, kFlags | O_EXCL, 0666); });
     if (opened < 0 && errno == EEXIST) {
         isNew = false;
         opened = RepeatOnInterrupt([&] { return openat(m_Folder, name, kFlags, 0666); });
-        if (opened < 0) return failure->SetSystem(errno, kInTheWay);
+        if (opened < 0) return failure->SetSystem(errno, "something is in the unfinished file's place");
     }
     if (opened < 0) return failure->SetSystem(errno);
     FileDescriptor file(opened);
@@ -72,7 +71,8 @@ zarvo_code NewArchive::OpenLocked(bool* hasLeftover, bool* isDone, Failure* fail
     const int error = locked == 0 ? 0 : errno;
     if (error == EWOULDBLOCK) return failure->SetSystem(EBUSY, "another run is making this archive");
     struct stat status;
-    if (fstat(opened, &status) != 0 || !S_ISREG(status.st_mode)) return failure->SetSystem(EEXIST, kInTheWay);
+    if (fstat(opened, &status) != 0 || !S_ISREG(status.st_mode))
+        return failure->SetSystem(EEXIST, "something is in the unfinished file's place");
     // A new file can do without a lock where the file system has none.
     if (error != 0 && !isNew) return failure->SetSystem(error, "an unfinished file can't be locked");
     const Standing named = LookAt(m_Folder, name);

@@ -31,6 +31,7 @@ std::string ReadManualLine(const std::string& line, const std::string& mark = ""
         text += isQuoted || mark.empty() ? argument : mark;
     }
     text = std::regex_replace(text, std::regex("\\\\-"), "-");
+    text = std::regex_replace(text, std::regex("\\\\e"), "\\");
     text = std::regex_replace(text, std::regex("\\\\\\(dq"), "\"");
     return std::regex_replace(text, std::regex("\\\\\\(aq"), "'");
 }
