@@ -281,8 +281,9 @@ TEST_F(ZarvoMount, DecodesAStreamOnceForReadersInTurns) {
         close(files[0]);
         close(files[1]);
     }
-    // The first reader of b has to pass over a, which its own reader has begun.
-    EXPECT_LT(CountBytesRead(mount.Process()), 5 * fs::file_size("a.zarvo") / 2);
+    // Each of the four readers may have to pass once over what another one has begun. Without a place to go on from,
+    // each of the 90 reads would start anew.
+    EXPECT_LT(CountBytesRead(mount.Process()), 5 * fs::file_size("a.zarvo"));
 }
 
 TEST_F(ZarvoMount, GoesToTheBackgroundUntilItIsUnmounted) {
@@ -341,7 +342,7 @@ TEST_F(ZarvoMount, SaysWhyItCannotMount) {
         {{"none", "m"}, "none: No such file or directory\n"},
         {{"file", "m"}, "file: not a Zarvo archive\n"},
         {{"small.zarvo"}, "no folder is named" + help},
-        {{"small.zarvo", "m", "x"}, "one argument too many: 'x'" + help},
+        {{"small.zarvo", "m", "x"}, "'x' is one argument too many" + help},
         {{"-o", "ro,nonsense", "small.zarvo", "m"}, "-o OPTIONS: 'nonsense' is no option of a mount" + help},
         {{"-o", "noexec,rw", "small.zarvo", "m"}, "-o OPTIONS: 'rw' is no option of a mount" + help},
     };
