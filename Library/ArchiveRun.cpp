@@ -30,8 +30,8 @@ UInt32 CountThreads(zarvo_archive* archive, const zarvo_run_options& options, UI
 ArchiveRun::ArchiveRun(zarvo_archive* archive, const zarvo_run_options& options)
     : m_Archive(archive),
       m_Options(options),
-      m_MaxBlockBytes(MaxBlockBytes(archive, MemoryBudget(options))),
-      m_ThreadCount(CountThreads(archive, options, MemoryBudget(options), m_MaxBlockBytes)),
+      m_MaxBlockBytes(MaxBlockBytes(archive, MemoryBudget(options.memory))),
+      m_ThreadCount(CountThreads(archive, options, MemoryBudget(options.memory), m_MaxBlockBytes)),
       m_Data(&archive->Blocks(), archive->Nodes(), m_MaxBlockBytes, m_ThreadCount, this) {}
 
 zarvo_code ArchiveRun::Plan(OutputPlan* plan, UInt64* bytes, Failure* failure) {

@@ -4,9 +4,9 @@
 #include <cstdio>
 #include <sys/resource.h>
 
-UInt64 MemoryBudget(const zarvo_run_options& options) {
+UInt64 MemoryBudget(UInt64 wanted) {
     constexpr UInt64 kUnknown = UInt64{1} << 30;
-    if (options.memory != 0) return options.memory;
+    if (wanted != 0) return wanted;
     FILE* const file = fopen("/proc/meminfo", "re");
     if (file == nullptr) return kUnknown;
     char line[128];

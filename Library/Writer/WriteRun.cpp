@@ -31,7 +31,7 @@ UInt64 SlotBytes(const WritePlan& plan) {
 zarvo_code WriteRun::ChooseThreads(UInt32* threads, Failure* failure) const {
     constexpr UInt64 kOtherDescriptors = 16;   // the program's, and the archive
     constexpr UInt64 kDescriptorsOfThread = 3; // a file, its folder, and one more on the way to it
-    const UInt64 memory = MemoryBudget(m_Options);
+    const UInt64 memory = MemoryBudget(m_Options.memory);
     const bool isStream = m_Plan.Layout() == ZARVO_LAYOUT_WEB;
     const EncoderSettings encoding = m_Plan.BlockEncoding();
     const UInt64 needed = isStream ? StreamEncoderMemory(encoding) : SlotBytes(m_Plan) + BlockEncoderMemory(encoding);
