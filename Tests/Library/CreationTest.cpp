@@ -396,15 +396,15 @@ TEST_F(Creation, NamesAFileThatChangesMeanwhile) {
          },
          "the file has changed: it had 200000 bytes"},
     };
-    for (const auto& [name, change, text] : kCases) {
-        SCOPED_TRACE(name);
+    for (const auto& row : kCases) {
+        SCOPED_TRACE(row.name);
         fs::remove_all(In());
         Put("d/file", SampleText(200'000));
         WriteFile(m_Folder / ".a.zarvo.zarvo-part", "");
         const Made made =
-            Create(Archive(), In(), {.log = [&](std::string_view) { change(In() + "/d/file"); }}, {.threads = 2});
-        EXPECT_EQ(std::string("d/file failed: ") + text + "\n", made.reports);
-        EXPECT_EQ(text, made.text);
+            Create(Archive(), In(), {.log = [&](std::string_view) { row.change(In() + "/d/file"); }}, {.threads = 2});
+        EXPECT_EQ(std::string("d/file failed: ") + row.text + "\n", made.reports);
+        EXPECT_EQ(row.text, made.text);
         EXPECT_EQ(std::set<std::string>{}, Names());
     }
 }
