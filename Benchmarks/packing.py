@@ -25,10 +25,17 @@ KINDS = {
 
 # The settings of PackFolder's encoder for 7-Zip: level 4 is the fast mode with 32 fast bytes. There is no filter for
 # machine code. Blocks are as large as ours: solid blocks of LZMA, which 7-Zip extracts in one thread, or the blocks of
-# one LZMA2 stream, which it packs and extracts in as many threads as it is given.
-SEVEN_ZIP = "7zz a -bd -mf=off -mmt=1 -ms={size} -m0=LZMA:a=0:fb=32:mf=hc4:d={size} {archive} ."
-SEVEN_ZIP_2 = "7zz a -bd -mf=off -mmt=2 -ms=on -m0=LZMA2:a=0:fb=32:mf=hc4:d={size}:c={size} {archive} ."
+# one LZMA2 stream, which it packs and extracts in as many threads as it is given. So are dictionaries: as large as a
+# block, but at most the 4 MiB of that level.
+SEVEN_ZIP = "7zz a -bd -mf=off -mmt=1 -ms={size} -m0=LZMA:a=0:fb=32:mf=hc4:d={dictionary} {archive} ."
+SEVEN_ZIP_2 = "7zz a -bd -mf=off -mmt=2 -ms=on -m0=LZMA2:a=0:fb=32:mf=hc4:d={dictionary}:c={size} {archive} ."
 SEVEN_ZIP_EXTRACT = "7zz x -mmt={threads} -oout {archive}"
+
+
+def seven_zip(command, size, dictionary):
+    return command.replace("{size}", size).replace("{dictionary}", dictionary)
+
+
 SQUASHFS = "mksquashfs . {archive} -quiet -no-progress -noappend -processors 2 -b 131072 -comp "
 SQUASHFS_EXTRACT = "unsquashfs -no-progress -p {threads} -d out {archive}"
 
@@ -41,13 +48,13 @@ PEERS = {
     "squashfs-xz": Peer("`unsquashfs -p {threads}`, xz", "xz.squashfs", SQUASHFS + "xz", SQUASHFS_EXTRACT),
     "erofs": Peer("`fsck.erofs --extract`, lz4hc", "lz4hc.erofs", "mkfs.erofs -zlz4hc,9 -C131072 {archive} .",
                   "fsck.erofs --extract=out {archive}"),
-    "7z-128k": Peer("`7zz x -mmt={threads}`, blocks of 128 KiB", "128k.7z", SEVEN_ZIP.replace("{size}", "128k"),
+    "7z-128k": Peer("`7zz x -mmt={threads}`, blocks of 128 KiB", "128k.7z", seven_zip(SEVEN_ZIP, "128k", "128k"),
                     SEVEN_ZIP_EXTRACT),
-    "7z-8m": Peer("`7zz x -mmt={threads}`, blocks of 8 MiB", "8m.7z", SEVEN_ZIP.replace("{size}", "8m"),
+    "7z-8m": Peer("`7zz x -mmt={threads}`, blocks of 8 MiB", "8m.7z", seven_zip(SEVEN_ZIP, "8m", "4m"),
                   SEVEN_ZIP_EXTRACT),
     "7z2-128k": Peer("`7zz x -mmt={threads}`, LZMA2 blocks of 128 KiB", "128k-lzma2.7z",
-                     SEVEN_ZIP_2.replace("{size}", "128k"), SEVEN_ZIP_EXTRACT),
-    "7z2-8m": Peer("`7zz x -mmt={threads}`, LZMA2 blocks of 8 MiB", "8m-lzma2.7z", SEVEN_ZIP_2.replace("{size}", "8m"),
+                     seven_zip(SEVEN_ZIP_2, "128k", "128k"), SEVEN_ZIP_EXTRACT),
+    "7z2-8m": Peer("`7zz x -mmt={threads}`, LZMA2 blocks of 8 MiB", "8m-lzma2.7z", seven_zip(SEVEN_ZIP_2, "8m", "4m"),
                    SEVEN_ZIP_EXTRACT),
     "tar": Peer("`tar xf`", "plain.tar", "tar cf {archive} .", "tar xf {archive} -C out"),
 }

@@ -10,12 +10,12 @@ from tables import Bound, Target, describe_machine, print_costs, print_targets
 from zarvo_extract import THREADS, command
 
 # Name, title, options, block size, and what the coder needs for a thread: the state of LZ4HC, or ten times the
-# dictionary of LZMA, which is as large as the block.
+# dictionary of LZMA, which is as large as the block, but at most the 4 MiB of that level.
 OURS = [
     ("lz4hc-12", "LZ4HC, level 12", ["-c", "lz4hc", "-l", 12, "-b", "128K"], MIB // 8, MIB // 4),
     ("lz4hc-9", "LZ4HC, level 9", ["-c", "lz4hc", "-l", 9, "-b", "128K"], MIB // 8, MIB // 4),
     ("lzma", "LZMA chunks, level 4", ["-c", "lzma", "-l", 4, "-b", "128K"], MIB // 8, 10 * MIB // 8),
-    ("streamed", "LZMA, streamed, level 4", ["-c", "lzma", "-l", 4, "-b", "8M", "--streamed"], 8 * MIB, 80 * MIB),
+    ("streamed", "LZMA, streamed, level 4", ["-c", "lzma", "-l", 4, "-b", "8M", "--streamed"], 8 * MIB, 40 * MIB),
 ]
 
 # Those that pack with the same settings, and their names in the tables.
