@@ -1,7 +1,5 @@
 #include "Tools/Zarvo/MountSession.h"
 
-#include "Tools/Zarvo/Text.h"
-
 #include <array>
 #include <cerrno>
 #include <csignal>
