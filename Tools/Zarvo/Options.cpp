@@ -6,24 +6,24 @@ const Option kLong = {.letter = 'l', .help = "show kind (f or d), size, offset i
 const Option kNul = {.letter = '0', .help = "end each path with NUL instead of a newline, also in --files-from"};
 const Option kNulInput = {.letter = '0', .help = "patterns in --files-from end with NUL instead of a newline"};
 const Option kNulOutput = {.letter = '0', .help = "end each path with NUL instead of a newline"};
-const Option kJson = {.name = "json", .help = "print JSON Lines, one object a line"};
+const Option kJson = {.name = "json", .help = "print JSON Lines, one object per line"};
 const Option kFilesFrom = {.name = "files-from",
                            .value = "FILE",
                            .kind = ValueKind::kFile,
-                           .help = "take more patterns from FILE, one a line (-: standard input)"};
+                           .help = "take more patterns from FILE, one per line (-: standard input)"};
 const Option kOutputFolder = {.letter = 'o',
                               .value = "DIR",
                               .kind = ValueKind::kFile,
-                              .help = "write into DIR, made where it is missing (default: ARCHIVE_data)"};
-const Option kExclude = {.letter = 'x', .value = "PATTERN", .help = "leave out what matches; may be given repeatedly"};
+                              .help = "write into DIR, made if missing (default: ARCHIVE_data)"};
+const Option kExclude = {.letter = 'x', .value = "PATTERN", .help = "leave out what matches; repeatable"};
 const Option kOverwrite = {.name = "overwrite",
                            .value = "WHEN",
                            .kind = ValueKind::kChoice,
                            .choices = "always|never|fail",
-                           .help = "replace what is there (always, the default), leave it, or fail for it"};
+                           .help = "files that are there: replace (always, the default), keep (never), or fail"};
 const Option kStrip = {
     .name = "strip", .value = "N", .kind = ValueKind::kNumber, .help = "leave out the first N components of each path"};
-const Option kKeepBroken = {.name = "keep-broken", .help = "keep what lies before the damage of damaged files"};
+const Option kKeepBroken = {.name = "keep-broken", .help = "of damaged files, write the bytes before the damage"};
 const Option kDryRun = {.name = "dry-run", .help = "read everything, print what -v would, and write nothing"};
 const Option kVerbose = {.letter = 'v', .help = "print the path of each entry that is put in place"};
 const Option kAlgorithm = {.letter = 'a',
@@ -35,8 +35,7 @@ const Option kLayout = {.name = "layout",
                         .value = "NAME",
                         .kind = ValueKind::kChoice,
                         .choices = "fs|web|raw|archive",
-                        .help = "fs (ZarvoFS, in blocks; the default), web (ZarvoWeb), raw (ZarvoRaw), archive "
-                                "(ZarvoArchive)"};
+                        .help = "fs (ZarvoFS, the default), web, raw or archive"};
 const Option kCompression = {.letter = 'c',
                              .value = "KIND",
                              .kind = ValueKind::kChoice,
@@ -51,17 +50,18 @@ const Option kBlockSize = {.letter = 'b',
                            .kind = ValueKind::kSize,
                            .help = "bytes of a block before it is compressed (K, M, G; default: 128K)"};
 const Option kStreamed = {.name = "streamed",
-                          .help = "make blocks that are decoded from their start on (lzma, its default, and none)"};
-const Option kEngineVersion = {
-    .name = "engine-version", .value = "TEXT", .help = "the engine that the archive says it is for (default: 5.x.x)"};
+                          .help = "blocks that can only be decoded from their start on (lzma, or none)"};
+const Option kEngineVersion = {.name = "engine-version",
+                               .value = "TEXT",
+                               .help = "the engine's version, as the archive states it (default: 5.x.x)"};
 const Option kEngineRevision = {
-    .name = "engine-revision", .value = "TEXT", .help = "and its revision (default: 7041.3.0b12)"};
-const Option kForce = {.name = "force", .help = "replace ARCHIVE if it is there"};
+    .name = "engine-revision", .value = "TEXT", .help = "the engine's revision (default: 7041.3.0b12)"};
+const Option kForce = {.name = "force", .help = "replace ARCHIVE if it exists"};
 const Option kDryRunOfCreate = {.name = "dry-run",
                                 .help = "print what would be put into the archive, and write nothing"};
-const Option kForeground = {.letter = 'f', .help = "stay in the foreground, and say on standard error what goes wrong"};
+const Option kForeground = {.letter = 'f', .help = "stay in the foreground; messages go to standard error"};
 const Option kMountOptions = {
-    .letter = 'o', .value = "OPTIONS", .help = "options of the mount, such as allow_other; may be given repeatedly"};
+    .letter = 'o', .value = "OPTIONS", .help = "options of the mount, such as allow_other; repeatable"};
 const Option kMemory = {.name = "memory",
                         .value = "SIZE",
                         .kind = ValueKind::kSize,
@@ -100,21 +100,26 @@ constexpr const Option* kMountSubcommandOptions[] = {&kForeground, &kMountOption
 constexpr const Option* kOptions[] = {&kQuiet, &kThreads, &kProgress, &kHelp, &kVersion};
 
 constexpr std::string_view kAboutPatterns =
-    "A PATTERN is a path, or a glob over whole paths: * and ? and [...] stop at \"/\", ** takes everything, and \\ "
-    "takes\n"
-    "the next character as it is. One that matches a folder takes all below it.\n";
+    "A PATTERN is a path, or a glob that is matched with whole paths: * and ? and\n"
+    "[...] stop at \"/\", ** does not, and \\ takes the next character as it is. A\n"
+    "pattern that matches a folder also matches everything below it.\n";
 constexpr std::string_view kAboutExtract =
-    "Nothing is written outside of DIR. A new file gets its name when it is whole; a damaged one is left out.\n";
+    "Nothing is written outside DIR. A file gets its name when it is whole; a damaged\n"
+    "file is an error, and is not written.\n";
 constexpr std::string_view kAboutCreate =
-    "Entries are sorted by their paths: the same files and options give the same bytes. ARCHIVE gets its name when it "
-    "is\n"
-    "whole. Links, devices, pipes and sockets are left out. A block that does not shrink is stored as it is.\n"
-    "web is one lzma stream and raw is not compressed: neither has folders or takes -c, -b or --streamed.\n";
+    "Entries are sorted by their paths: the same files and options give the same\n"
+    "bytes. ARCHIVE gets its name when it is whole. Links, devices, pipes and sockets\n"
+    "are left out. A block that does not shrink is stored as it is. The layout web is\n"
+    "one lzma stream, and raw is not compressed: neither has folders, or takes -c, -b\n"
+    "or --streamed.\n";
 constexpr std::string_view kAboutTest =
-    "The formats hold no checksums: damage that can be decoded is not seen. To see it, keep what 'zarvo sum' prints.\n";
-constexpr std::string_view kAboutSum = "'cd DIR && sha256sum -c' checks what was extracted into DIR against this.\n";
+    "The formats hold no checksums, so damage that still decodes is not found. To find\n"
+    "it, keep what 'zarvo sum' prints while the archive is good, and compare later.\n";
+constexpr std::string_view kAboutSum = "This checks what was extracted into DIR:\n"
+                                       "    zarvo sum ARCHIVE | (cd DIR && sha256sum -c)\n";
 constexpr std::string_view kAboutMount =
-    "Goes to the background when FOLDER shows the archive. 'fusermount3 -u FOLDER' ends the mount.\n";
+    "Goes to the background when FOLDER shows the archive. 'fusermount3 -u FOLDER'\n"
+    "ends the mount.\n";
 
 } // namespace
 
@@ -150,7 +155,7 @@ const Subcommand kTest = {.name = "test",
                           .minOperands = 1};
 const Subcommand kSum = {.name = "sum",
                          .operands = "ARCHIVE [PATTERN...]",
-                         .summary = "print checksums, as sha256sum does of the extracted files",
+                         .summary = "print checksums, as sha256sum would of the extracted files",
                          .about = kAboutSum,
                          .options = kSumOptions,
                          .minOperands = 1};
@@ -227,7 +232,7 @@ std::string DescribeSubcommand(const Subcommand& subcommand) {
     for (const Option* const option : subcommand.options)
         rows.emplace_back(DescribeOption(*option), option->help);
     (text += "\nOptions, which may stand anywhere before --:\n") += DescribeRows(rows);
-    text += isNone ? "\n'zarvo SUBCOMMAND --help' says more of a subcommand, 'man zarvo' everything.\n"
+    text += isNone ? "\n'zarvo SUBCOMMAND --help' lists the options of a subcommand. 'man zarvo' says more.\n"
                    : "\n'man zarvo' says more.\n";
     return text;
 }
