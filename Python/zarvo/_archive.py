@@ -135,9 +135,7 @@ class _EntryFile(io.RawIOBase):
         self._stream: _native.Stream | None = stream
         self._position = 0
         self._size = entry.size
-        # Of a file that passes the end of the data, only as much is asked for at once as tells that: a damaged size must
-        # not ask for memory.
-        self._end = min(entry.size, max(0, entry.archive.info.data_size - entry.offset) + 1)
+        self._data_end = entry._data_end()
         self.name = entry.path
 
     def _open_stream(self) -> _native.Stream:
@@ -163,7 +161,7 @@ class _EntryFile(io.RawIOBase):
         return count
 
     def readall(self) -> bytes:
-        data = self._open_stream().read(max(0, self._end - self._position))
+        data = self._open_stream().read(_count_to_read(self._position, self._size, self._data_end))
         self._position += len(data)
         return data
 
@@ -215,11 +213,7 @@ class Entry:
 
     def read(self) -> bytes:
         """Return the file's bytes."""
-        self._require_file()
-        if self.size > _ONE_READ:
-            with self.open() as file:
-                return file.read()
-        return self.archive._native.read(self.index, 0, self.size)
+        return self._read_range(0, self.size)
 
     def open(self) -> io.BufferedReader:
         """Open the file for reading: a binary file object that can seek.
@@ -232,7 +226,15 @@ class Entry:
     def _read_range(self, start: int, end: int) -> bytes:
         """Bytes [start, end) of the file; both lie in it."""
         self._require_file()
-        return self.archive._native.read(self.index, start, end - start)
+        if end - start <= _ONE_READ:
+            return self.archive._native.read(self.index, start, end - start)
+        stream = self.archive._native.open_stream(self.index)
+        stream.seek(start)
+        return stream.read(_count_to_read(start, end, self._data_end()))
+
+    def _data_end(self) -> int:
+        """Where the archive's data ends, from the file's start on; negative if that is past it."""
+        return self.archive.info.data_size - self.offset
 
     def _require_file(self) -> None:
         if self.kind != "file":
@@ -249,6 +251,14 @@ class Entry:
 
     def __reduce__(self) -> tuple[Any, ...]:
         return (_get_entry, (self.archive, self.index))
+
+
+def _count_to_read(start: int, end: int, data_end: int) -> int:
+    """How many bytes to ask for, of [start, end) of a file.
+
+    A damaged size must not ask for memory: of what lies past the end of the data, one byte tells that.
+    """
+    return max(0, min(end, max(start, data_end) + 1) - start)
 
 
 def _get_entry(archive: Archive, index: int) -> Entry:

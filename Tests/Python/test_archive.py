@@ -167,7 +167,9 @@ class Files(ArchiveTest):
             entry = zarvo.open(io.BytesIO(data))["one"]
             self.assertEqual(size, entry.size)
             self.assertEqual(b"123", entry.open().read(3))
-            for read in (entry.read, entry.open().read):
+            at_end = entry.open().detach()
+            at_end.seek(-5, os.SEEK_END)
+            for read in (entry.read, entry.open().read, at_end.readall):
                 with self.assertRaises(zarvo.DamagedData):
                     read()
 

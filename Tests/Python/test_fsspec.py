@@ -5,6 +5,7 @@ import io
 import os
 import pathlib
 import pickle
+import struct
 import tempfile
 import unittest
 import zipfile
@@ -102,6 +103,15 @@ class FileSystem(unittest.TestCase):
                 ["tables/one.csv"] * len(ranges), [start for start, _ in ranges], [end for _, end in ranges]
             ),
         )
+
+    def test_ranges_of_impossible_sizes_are_damaged(self):
+        for size in (1 << 40, (1 << 64) - 1):
+            data = build([("one", b"123")]).replace(struct.pack(">QQ", 0, 3), struct.pack(">QQ", 0, size))
+            fs = fsspec.filesystem("zarvo", fo=io.BytesIO(data))
+            self.assertEqual(b"12", fs.cat_file("one", end=2))
+            for start in (0, 1 << 30, -2):
+                with self.assertRaises(zarvo.DamagedData, msg=f"{size}, {start}"):
+                    fs.cat_file("one", start=start)
 
     def test_raises_as_others_do(self):
         for use, error in (
