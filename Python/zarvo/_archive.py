@@ -289,6 +289,7 @@ class Archive(Mapping[str, Entry]):
         self._file = file
         self.name = str(getattr(file, "name", file))
         if _is_plain_file(file):
+            file.flush()  # what was written and is not in the file yet
             self._handle = _native.open_descriptor(file.fileno(), self.name, offset)
         else:
             source = _FileSource(file)

@@ -48,8 +48,10 @@ class ZarvoFileSystem(fsspec.AbstractFileSystem):  # type: ignore[misc]
         there = fsspec.open(fo, "rb", protocol=target_protocol, **(target_options or {}))
         if isinstance(there.fs, LocalFileSystem):
             self.archive = Archive(there.path)
-        else:
-            self.archive = Archive(there.fs.open(there.path, "rb", block_size=_READ_AHEAD, cache_type="readahead"))
+            return
+        file = there.fs.open(there.path, "rb", block_size=_READ_AHEAD, cache_type="readahead")
+        # The file system "memory" gives the same object, with one position, to everybody who opens the file.
+        self.archive = Archive(io.BytesIO(file.getvalue()) if isinstance(file, io.BytesIO) else file)
 
     @classmethod
     def _strip_protocol(cls, path: Any) -> Any:

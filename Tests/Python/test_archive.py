@@ -251,6 +251,11 @@ class FileObjects(ArchiveTest):
                     self.assertEqual([], archive.test().damaged, file)
                 self.assertFalse(file.closed)
 
+    def test_deliver_what_is_not_in_the_file_yet(self):
+        with tempfile.TemporaryFile() as file:
+            file.write(build([("one", b"1")]))
+            self.assertEqual(b"1", zarvo.open(file)["one"].read())
+
     def test_raise_their_exceptions_from_the_call(self):
         file = FlakyFile(build([("one", TEXT), ("two", b"2")]))
         archive = zarvo.open(file)

@@ -113,6 +113,16 @@ class FileSystem(unittest.TestCase):
                 with self.assertRaises(zarvo.DamagedData, msg=f"{size}, {start}"):
                     fs.cat_file("one", start=start)
 
+    def test_does_not_move_others_in_a_file_in_memory(self):
+        memory = fsspec.filesystem("memory")
+        memory.pipe("/a.zarvo", self.path.read_bytes())
+        self.addCleanup(memory.rm, "/a.zarvo")
+        fs = fsspec.filesystem("zarvo", fo="memory://a.zarvo")
+        other = memory.open("/a.zarvo")
+        other.seek(7)
+        self.assertEqual(TEXT, fs.cat("tables/one.csv"))
+        self.assertEqual(7, other.tell())
+
     def test_raises_as_others_do(self):
         for use, error in (
             (lambda: self.fs.info("none"), FileNotFoundError),
