@@ -42,7 +42,11 @@ bool HasTree(ArchiveObject* self, LibraryCall* call) {
 // Finds the item with a path. False when there is none, or with an exception set.
 bool FindPath(ArchiveObject* self, PyObject* path, uint64_t* item) {
     const Reference bytes = EncodePath(path);
-    if (bytes == nullptr) return false;
+    if (bytes == nullptr) {
+        // A text that stands for no bytes is the path of nothing.
+        if (PyErr_ExceptionMatches(PyExc_UnicodeEncodeError) != 0) PyErr_Clear();
+        return false;
+    }
     LibraryCall call(self);
     if (!HasTree(self, &call)) return false;
     const std::string_view text = GetBytes(bytes);

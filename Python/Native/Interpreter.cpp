@@ -4,7 +4,11 @@ PyObject* DecodePath(std::string_view path) {
     return PyUnicode_DecodeUTF8(path.data(), static_cast<Py_ssize_t>(path.size()), "surrogateescape");
 }
 
-Reference EncodePath(PyObject* text) { return Reference(PyUnicode_AsEncodedString(text, "utf-8", "surrogateescape")); }
+Reference EncodePath(PyObject* text) {
+    if (PyUnicode_Check(text) != 0) return Reference(PyUnicode_AsEncodedString(text, "utf-8", "surrogateescape"));
+    PyErr_Format(PyExc_TypeError, "expected a str, not %R", text);
+    return nullptr;
+}
 
 std::string_view GetBytes(const Reference& bytes) {
     return {PyBytes_AsString(bytes.get()), static_cast<size_t>(PyBytes_Size(bytes.get()))};

@@ -450,6 +450,14 @@ def _choose(name: str, word: str, words: tuple[str, ...]) -> int:
     return words.index(word)
 
 
+def _to_level(level: int | None) -> int:
+    if level is None:
+        return -1
+    if level < 0:
+        raise ValueError(f"level is {level}, and not a number from 0 on")
+    return level
+
+
 def _to_list(name: str, patterns: Iterable[str] | None) -> list[str] | None:
     if isinstance(patterns, str):
         raise TypeError(f"{name} is a list of patterns, and not one str")
@@ -504,7 +512,8 @@ def create(
     threads, progress: as for Archive.extract().
 
     Raises CreationFailed if a file can't be read or the layout can't hold it, FileExistsError for an archive that is
-    there, and ValueError for options that the layout does not allow. Then there is no new archive.
+    there, and ValueError for options that the layout does not allow. Then, and after an exception of progress, there is
+    no new archive.
     """
     files, folders, size, archive_size, left_out, failures = _native.create(
         file,
@@ -513,7 +522,7 @@ def create(
         threads,
         _choose("layout", layout, _LAYOUTS),
         -1 if compression is None else _choose("compression", compression, _COMPRESSIONS),
-        -1 if level is None else level,
+        _to_level(level),
         streamed,
         block_size,
         engine_version,

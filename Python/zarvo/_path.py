@@ -3,6 +3,7 @@
 from __future__ import annotations
 
 import io
+import os
 import pathlib
 from collections.abc import Iterator
 from typing import IO, Any, BinaryIO
@@ -78,11 +79,11 @@ class Path:
         """The folder that it is in; of the root, the root."""
         return Path(self.root, self.at.rpartition("/")[0])
 
-    def joinpath(self, *others: str) -> Path:
+    def joinpath(self, *others: StrPath) -> Path:
         """Return the place that others lead to from here."""
-        return Path(self.root, "/".join((self.at, *others)))
+        return Path(self.root, "/".join((self.at, *(os.fspath(other) for other in others))))
 
-    def __truediv__(self, other: str) -> Path:
+    def __truediv__(self, other: StrPath) -> Path:
         return self.joinpath(other)
 
     def exists(self) -> bool:

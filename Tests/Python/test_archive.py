@@ -74,10 +74,12 @@ class Mapping(ArchiveTest):
         for path in ("road/of/one.txt", "/road//of/./one.txt", "road\\of\\one.txt"):
             self.assertIn(path, archive)
             self.assertEqual("road/of/one.txt", archive[path].path)
-        for path in ("road", "", "road/of/one.tx", "a\0b", 7):
+        for path in ("road", "", "road/of/one.tx", "a\0b", "\ud800", 7):
             self.assertNotIn(path, archive)
         with self.assertRaisesRegex(KeyError, "there is no entry 'road' in .*a.zarvo"):
             archive["road"]
+        with self.assertRaisesRegex(TypeError, "expected a str, not 7"):
+            archive[7]
 
     def test_keeps_bytes_that_are_not_text(self):
         data = bytearray(build([("aXb", b"1")]))
@@ -439,6 +441,7 @@ class Creation(ArchiveTest):
             ({"layout": "ZIP"}, ValueError),
             ({"compression": "lz4", "streamed": True}, ValueError),
             ({"level": 99}, ValueError),
+            ({"level": -1}, ValueError),
             ({"exclude": "a"}, TypeError),
         ):
             with self.assertRaises(error, msg=options):
@@ -449,6 +452,17 @@ class Creation(ArchiveTest):
         self.new.write_bytes(b"old")
         with self.assertRaises(FileExistsError):
             zarvo.create(self.new, self.made_of)
+        self.assertEqual(b"old", self.new.read_bytes())
+
+    def test_can_be_stopped_until_all_is_read(self):
+        self.new.write_bytes(b"old")
+
+        def stop(progress):
+            if progress.bytes == progress.bytes_total:
+                raise LookupError("enough")
+
+        with self.assertRaisesRegex(LookupError, "enough"):
+            zarvo.create(self.new, self.made_of, force=True, progress=stop)
         self.assertEqual(b"old", self.new.read_bytes())
 
 
@@ -474,7 +488,11 @@ class Paths(ArchiveTest):
         theirs = zipfile.Path(twin)
         for part in ("tables", "road"):
             self.assertEqual(self.walk(theirs / part), self.walk(ours / part))
-        for path in (ours / "road/of" / "one.txt", ours.joinpath("road", "of", "one.txt")):
+        for path in (
+            ours / "road/of" / "one.txt",
+            ours.joinpath("road", "of", "one.txt"),
+            ours / pathlib.PurePosixPath("road/of/one.txt"),
+        ):
             self.assertEqual("on the way\n", path.read_text("utf-8-sig"))
         self.assertEqual(theirs.joinpath("a", "b.tar.gz").suffixes, ours.joinpath("a", "b.tar.gz").suffixes)
 
