@@ -18,15 +18,22 @@ bool WatchForks() {
     return Reference(PyObject_Call(watch.get(), none.get(), names.get())) != nullptr;
 }
 
+int Fill(PyObject* module) {
+    // Callbacks of the library take the main interpreter's lock, and there is one set of types.
+    if (PyInterpreterState_GetID(PyInterpreterState_Get()) != 0) {
+        PyErr_SetString(PyExc_ImportError, "zarvo can only be used in the main interpreter");
+        return -1;
+    }
+    const bool isFilled = LoadErrors() && AddArchiveType(module) && AddStreamType(module) &&
+                          PyModule_AddStringConstant(module, "version", zarvo_version()) == 0 && WatchForks();
+    return isFilled ? 0 : -1;
+}
+
+PyModuleDef_Slot s_Slots[] = {{Py_mod_exec, reinterpret_cast<void*>(Fill)}, {0, nullptr}};
+
 PyModuleDef s_Module = {
-    PyModuleDef_HEAD_INIT, "zarvo._native", nullptr, -1, nullptr, nullptr, nullptr, nullptr, nullptr};
+    PyModuleDef_HEAD_INIT, "zarvo._native", nullptr, 0, nullptr, s_Slots, nullptr, nullptr, nullptr};
 
 } // namespace
 
-PyMODINIT_FUNC PyInit__native() {
-    Reference module(PyModule_Create(&s_Module));
-    if (module == nullptr || !LoadErrors() || !AddArchiveType(module.get()) || !AddStreamType(module.get()) ||
-        PyModule_AddStringConstant(module.get(), "version", zarvo_version()) != 0 || !WatchForks())
-        return nullptr;
-    return module.release();
-}
+PyMODINIT_FUNC PyInit__native() { return PyModuleDef_Init(&s_Module); }

@@ -1,6 +1,7 @@
 """Threads, forks, and objects that live longer than others."""
 
 import gc
+import importlib.util
 import io
 import os
 import pathlib
@@ -106,6 +107,21 @@ class Objects(LifeTest):
         del file
         gc.collect()
         self.assertTrue(gone.is_set())
+
+
+class Imports(unittest.TestCase):
+    @unittest.skipUnless(importlib.util.find_spec("_xxsubinterpreters"), "Python 3.13 calls them something else")
+    def test_are_refused_outside_the_main_interpreter(self):
+        script = """if True:
+            import sys, _xxsubinterpreters, zarvo
+            other = _xxsubinterpreters.create()
+            front = f"import sys; sys.path[:] = {sys.path!r}\\n"
+            try:
+                _xxsubinterpreters.run_string(other, front + "import zarvo")
+            except _xxsubinterpreters.RunFailedError as error:
+                print(error)
+            """
+        self.assertRegex(run_python(script).stdout, "ImportError.*zarvo can only be used in the main interpreter")
 
 
 class Threads(LifeTest):
