@@ -14,19 +14,7 @@ read.
 Any number of threads may use one archive. All calls let other threads run while the library works.
 """
 
-from ._archive import (
-    Archive,
-    Blocks,
-    Created,
-    Damage,
-    Entry,
-    Extracted,
-    Info,
-    Progress,
-    TestResult,
-    create,
-    open,
-)
+from ._archive import Archive, Entry, create, open
 from ._errors import (
     ArchiveChanged,
     BadArchive,
@@ -39,7 +27,11 @@ from ._errors import (
     UnsupportedData,
 )
 from ._native import version as __version__
-from ._path import Path
+
+TYPE_CHECKING = False  # that of typing, which takes long to import
+if TYPE_CHECKING:
+    from ._path import Path
+    from ._records import Blocks, Created, Damage, Extracted, Info, Progress, TestResult
 
 __all__ = [
     "Archive",
@@ -65,6 +57,25 @@ __all__ = [
     "open",
 ]
 
+
+if not TYPE_CHECKING:
+
+    def __getattr__(name: str) -> object:
+        """Import what many scripts don't use when it is first asked for."""
+        if name not in __all__:
+            raise AttributeError(f"module {__name__!r} has no attribute {name!r}")
+        from . import _path, _records
+
+        found = _path.Path if name == "Path" else getattr(_records, name)
+        found.__module__ = __name__
+        globals()[name] = found
+        return found
+
+    def __dir__() -> list[str]:
+        return sorted({*globals(), *__all__})
+
+
 # In messages and in help(), they are called what users call them.
 for _name in __all__:
-    globals()[_name].__module__ = __name__
+    if _name in globals():
+        globals()[_name].__module__ = __name__

@@ -2,17 +2,21 @@
 
 from __future__ import annotations
 
-import functools
 import io
 import os
-import threading
-from collections.abc import Callable, Iterable, Iterator, Mapping
-from typing import Any, BinaryIO, NamedTuple, Union
+from collections.abc import Mapping
 
 from . import _native
 from ._errors import CreationFailed, ExtractionFailed
 
-StrPath = Union[str, "os.PathLike[str]"]
+TYPE_CHECKING = False  # that of typing, which takes long to import
+if TYPE_CHECKING:
+    from collections.abc import Callable, Iterable, Iterator
+    from typing import Any, BinaryIO, Union
+
+    from ._records import Created, Extracted, Info, Progress, TestResult
+
+    StrPath = Union[str, os.PathLike[str]]
 
 # What zarvo.h calls them.
 _LAYOUTS = ("ZarvoFS", "ZarvoWeb", "ZarvoRaw", "ZarvoArchive")
@@ -23,90 +27,12 @@ _OVERWRITE = ("always", "never", "fail")
 _ONE_READ = 1 << 24
 
 
-class Blocks(NamedTuple):
-    """The blocks of an archive."""
-
-    total: int
-    #: Decoded bytes of the largest block.
-    largest: int
-    #: How many can only be decoded from their start on.
-    streamed: int
-    #: How many there are of each kind.
-    none: int
-    lzma: int
-    lz4: int
-    lz4hc: int
-    unknown: int
-
-
-class Info(NamedTuple):
-    """What an archive is. Sizes are in bytes."""
-
-    #: "ZarvoFS", "ZarvoWeb", "ZarvoRaw" or "ZarvoArchive".
-    layout: str
-    version: int
-    engine_version: str
-    engine_revision: str
-    #: Of the archive, as its writer recorded it; 0 where it did not.
-    recorded_size: int
-    file_size: int
-    #: Of the data, decoded.
-    data_size: int
-    #: Of the data, as the blocks are stored.
-    stored_size: int
-    blocks: Blocks
-    #: Of the directory: files and folders, also repeated ones.
-    entries: int
-    files: int
-    folders: int
-    #: Of all files, also repeated ones.
-    file_bytes: int
-
-
-class Progress(NamedTuple):
-    """How far an extraction or a test has come."""
-
-    bytes: int
-    bytes_total: int
-    files: int
-    files_total: int
-
-
-class Extracted(NamedTuple):
-    """What an extraction has put in place."""
-
-    files: int
-    folders: int
-    #: Files that were there and were left (overwrite="never").
-    kept: int
-    #: Of the files.
-    bytes: int
-
-
-class Damage(NamedTuple):
-    """An entry with bytes that can't be read."""
-
-    path: str
-    size: int
-    #: How many bytes from its start can be read.
-    readable: int
-
-
-class TestResult(NamedTuple):
-    """What a test has found."""
-
-    files: int
-    bytes: int
-    #: In the archive's order.
-    damaged: list[Damage]
-    #: Damaged blocks, also those that no file uses: number and reason.
-    blocks: dict[int, str]
-
-
 class _FileSource:
     """Reads a file object at any place. One thread at a time, because it has one position."""
 
     def __init__(self, file: BinaryIO) -> None:
+        import threading
+
         self._file = file
         self._lock = threading.Lock()
 
@@ -261,6 +187,10 @@ def _count_to_read(start: int, end: int, data_end: int) -> int:
     return max(0, min(end, max(start, data_end) + 1) - start)
 
 
+def _reopen(file: str | BinaryIO, offset: int) -> Archive:
+    return Archive(file, offset=offset)
+
+
 def _get_entry(archive: Archive, index: int) -> Entry:
     return Entry(archive, archive._native.entry(index))
 
@@ -279,6 +209,8 @@ class Archive(Mapping[str, Entry]):
     def __init__(self, file: StrPath | BinaryIO, *, offset: int = 0) -> None:
         self._handle: _native.Archive | None = None
         self._offset = offset
+        self._info: Info | None = None
+        self._length: int | None = None
         self._file: str | BinaryIO
         if isinstance(file, (str, os.PathLike)):
             self._file = os.path.abspath(file)  # where an unpickled copy finds it
@@ -317,11 +249,15 @@ class Archive(Mapping[str, Entry]):
     def __exit__(self, *exception: object) -> None:
         self.close()
 
-    @functools.cached_property
+    @property
     def info(self) -> Info:
         """What the archive is."""
-        info = self._native.info()
-        return Info(_LAYOUTS[info[0]], *info[1:8], Blocks(*info[8]), *info[9:])
+        if self._info is None:
+            from ._records import Blocks, Info
+
+            info = self._native.info()
+            self._info = Info(_LAYOUTS[info[0]], *info[1:8], Blocks(*info[8]), *info[9:])
+        return self._info
 
     def __getitem__(self, path: str) -> Entry:
         fields = self._native.find_entry(path)
@@ -332,12 +268,10 @@ class Archive(Mapping[str, Entry]):
     def __contains__(self, path: object) -> bool:
         return isinstance(path, str) and self._native.find_entry(path) is not None
 
-    @functools.cached_property
-    def _length(self) -> int:
-        return self._native.count_found()
-
     def __len__(self) -> int:
-        self._native
+        native = self._native  # a closed one has no length
+        if self._length is None:
+            self._length = native.count_found()
         return self._length
 
     def __iter__(self) -> Iterator[str]:
@@ -403,6 +337,8 @@ class Archive(Mapping[str, Entry]):
             keep_broken,
             _wrap_progress(progress),
         )
+        from ._records import Extracted
+
         extracted = Extracted(*summary)
         failures: list[tuple[str, Exception]] = [(_get_entry(self, index).path, error) for index, error in failed]
         failures += [(wanted[index], KeyError("the pattern matches nothing")) for index in unused if wanted]
@@ -417,6 +353,8 @@ class Archive(Mapping[str, Entry]):
 
         The formats hold no checksums, so damage that still decodes is not found.
         """
+        from ._records import Damage, TestResult
+
         summary, entries, blocks = self._native.test(threads, _wrap_progress(progress))
         damaged = []
         for index, readable in entries:
@@ -428,20 +366,7 @@ class Archive(Mapping[str, Entry]):
         return f"<zarvo.Archive {self.name!r}{' (closed)' if self.closed else ''}>"
 
     def __reduce__(self) -> tuple[Any, ...]:
-        return (functools.partial(Archive, offset=self._offset), (self._file,))
-
-
-class Created(NamedTuple):
-    """What an archive was made of."""
-
-    files: int
-    folders: int
-    #: Of the files.
-    bytes: int
-    #: Of the archive.
-    archive_bytes: int
-    #: Links, devices, and folders that the layout does not hold: path and reason.
-    left_out: list[tuple[str, str]]
+        return (_reopen, (self._file, self._offset))
 
 
 def _choose(name: str, word: str, words: tuple[str, ...]) -> int:
@@ -467,6 +392,8 @@ def _to_list(name: str, patterns: Iterable[str] | None) -> list[str] | None:
 def _wrap_progress(progress: Callable[[Progress], object] | None) -> Callable[..., object] | None:
     if progress is None:
         return None
+    from ._records import Progress
+
     told = progress
     return lambda *numbers: told(Progress(*numbers))
 
@@ -532,4 +459,6 @@ def create(
     )
     if failures:
         raise CreationFailed(failures)
+    from ._records import Created
+
     return Created(files, folders, size, archive_size, left_out)

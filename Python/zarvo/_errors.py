@@ -6,10 +6,9 @@ for an archive that was closed, MemoryError.
 
 from __future__ import annotations
 
-from typing import TYPE_CHECKING
-
+TYPE_CHECKING = False  # that of typing, which takes long to import
 if TYPE_CHECKING:
-    from ._archive import Extracted
+    from ._records import Extracted
 
 
 class Error(Exception):

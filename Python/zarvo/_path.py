@@ -5,10 +5,15 @@ from __future__ import annotations
 import io
 import os
 import pathlib
-from collections.abc import Iterator
-from typing import IO, Any, BinaryIO
 
-from ._archive import Archive, Entry, StrPath, _get_entry
+from ._archive import Archive, Entry, _get_entry
+
+TYPE_CHECKING = False  # that of typing, which takes long to import
+if TYPE_CHECKING:
+    from collections.abc import Iterator
+    from typing import IO, Any, BinaryIO
+
+    from ._archive import StrPath
 
 
 class Path:

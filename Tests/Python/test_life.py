@@ -110,6 +110,21 @@ class Objects(LifeTest):
 
 
 class Imports(unittest.TestCase):
+    def test_load_only_what_opens_archives(self):
+        script = """if True:
+            import sys, zarvo
+            print({"pathlib", "threading", "typing", "zarvo._path", "zarvo._records"} & set(sys.modules))
+            """
+        ended = subprocess.run([sys.executable, "-S", "-c", script], capture_output=True, text=True, timeout=300)
+        self.assertEqual(("set()\n", ""), (ended.stdout, ended.stderr))
+
+    def test_show_all_names_where_users_find_them(self):
+        shown = run_python("import zarvo; print(*dir(zarvo))").stdout.split()
+        self.assertEqual([], [name for name in zarvo.__all__ if name not in shown])
+        self.assertEqual({"zarvo"}, {getattr(zarvo, name).__module__ for name in zarvo.__all__})
+        with self.assertRaisesRegex(AttributeError, "module 'zarvo' has no attribute 'ZipFile'"):
+            zarvo.ZipFile
+
     @unittest.skipUnless(importlib.util.find_spec("_xxsubinterpreters"), "Python 3.13 calls them something else")
     def test_are_refused_outside_the_main_interpreter(self):
         script = """if True:
