@@ -27,6 +27,8 @@ def main():
     parser.add_argument("--extract", metavar="FOLDER", type=os.path.abspath)
     parser.add_argument("urls", metavar="URL", nargs="+")
     arguments = parser.parse_args()
+    if arguments.extract and len({os.path.basename(url) for url in arguments.urls}) < len(arguments.urls):
+        parser.error("archives of the same name would share a folder")
     local = {"n_workers": 2, "threads_per_worker": 1}
     with Client(arguments.scheduler) if arguments.scheduler else Client(**local) as client:
         runs = {client.submit(work, url, arguments.extract, retries=2): url for url in arguments.urls}

@@ -40,6 +40,13 @@ class Documents(unittest.TestCase):
         self.assertRegex(lines[1], "^broken.zarvo\tValueError\t1 damaged files, the first is tables/squares.csv$")
         self.assertRegex(lines[2], "^missing.zarvo\tFileNotFoundError\t")
 
+    @unittest.skipUnless(importlib.util.find_spec("distributed"), "distributed is not installed")
+    def test_example_for_many_archives_mixes_no_folders(self):
+        command = [sys.executable, str(ROOT / "Examples" / "TestManyArchives.py"), "--extract", "out"]
+        ended = subprocess.run([*command, "a/game.zarvo", "b/game.zarvo"], capture_output=True, text=True, timeout=300)
+        self.assertEqual(2, ended.returncode)
+        self.assertIn("archives of the same name would share a folder", ended.stderr)
+
 
 if __name__ == "__main__":
     unittest.main()
