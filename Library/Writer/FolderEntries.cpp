@@ -179,7 +179,10 @@ static zarvo_code ReadFully(int descriptor, UInt64 offset, UInt8* bytes, size_t 
         const ssize_t got =
             RepeatOnInterrupt([&] { return pread(descriptor, bytes, size, static_cast<off_t>(offset)); });
         if (got < 0) return failure->SetSystem(errno);
-        if (got == 0) return ZARVO_OK; // it has become shorter, which its size says
+        // It has become shorter meanwhile, or is one of those that have less than their size says.
+        if (got == 0)
+            return failure->Set(ZARVO_ERROR_CHANGED, "the file ends after %llu bytes",
+                                static_cast<unsigned long long>(offset));
         bytes += got;
         offset += static_cast<UInt64>(got);
         size -= static_cast<size_t>(got);

@@ -409,6 +409,17 @@ TEST_F(Creation, NamesAFileThatChangesMeanwhile) {
     }
 }
 
+// As files of /sys do. What is missing must not come from elsewhere in memory.
+TEST_F(Creation, NamesAFileThatEndsBeforeItsSize) {
+    Put("a", SampleText(200'000));
+    const SystemFault fault({.call = "end of a file", .number = 2});
+    EXPECT_EQ((Made{.reports = "a failed: the file ends after 131072 bytes\n",
+                    .code = ZARVO_ERROR_CHANGED,
+                    .text = "the file ends after 131072 bytes"}),
+              Create(Archive(), In(), {}, {.threads = 1}));
+    EXPECT_EQ(std::set<std::string>{}, Names());
+}
+
 TEST_F(Creation, RefusesWhatTheLayoutCannotHold) {
     Put("a", "x");
     const auto makeHole = [&](const std::string& path, uint64_t size) {

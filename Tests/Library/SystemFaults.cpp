@@ -81,6 +81,7 @@ ssize_t pwrite(int file, const void* bytes, size_t size, off_t offset) {
 }
 
 ssize_t pread(int file, void* bytes, size_t size, off_t offset) {
+    if (Fails("end of a file")) return 0;
     return Fails("pread") ? -1 : syscall(SYS_pread64, file, bytes, size, offset);
 }
 
