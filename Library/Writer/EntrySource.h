@@ -11,8 +11,8 @@ public:
     // Called once per archive, before it is read. False when memory is refused.
     [[nodiscard]] virtual bool PrepareToRead(UInt32 threads) = 0;
 
-    // Reads size bytes at offset of an entry's bytes, which has them. That the entry has changed its size meanwhile is
-    // a failure. Several threads call it at once, each with its own number.
+    // Reads size bytes at offset of an entry's bytes, which has them; size may be 0. That the entry has changed its
+    // size meanwhile is a failure. Several threads call it at once, each with its own number.
     virtual zarvo_code Read(UInt32 thread, const EntryList& list, const EntryList::Entry& entry, UInt64 offset,
                             UInt8* bytes, size_t size, Failure* failure) = 0;
 };

@@ -69,6 +69,7 @@ zarvo_code WriteRun::Write(NewArchive* file, Failure* failure) {
     m_End = m_DataPlace = HeadSize();
     m_IsStoppedByCaller = !TellProgress();
     if (m_Data.Size() != 0 && !m_IsStoppedByCaller) RunOnThreads(threads, this);
+    if (m_Fatal.code == ZARVO_OK) CheckEmptyFiles();
     if (!m_IsStoppedByCaller) m_IsStoppedByCaller = !TellProgress();
     if (m_Fatal.code == ZARVO_OK && m_IsStoppedByCaller) (void)m_Fatal.Set(ZARVO_ERROR_STOPPED, "stopped");
     if (m_Fatal.code == ZARVO_OK) return WriteFrame(failure);
@@ -93,8 +94,7 @@ void WriteRun::WorkAlone() {
     Work(0);
 }
 
-void WriteRun::LookIfAlone() {
-    if (!m_IsAlone) return;
+void WriteRun::LookIfDue() {
     const auto now = std::chrono::steady_clock::now();
     if (now - m_LastLook < kProgressInterval) return;
     m_LastLook = now;
@@ -140,7 +140,7 @@ void WriteRun::WorkOnBlocks(UInt32 thread) {
     }
     while (Slot* const slot = TakeSlot()) {
         if (!FillSlot(thread, &encoder, slot) || !Commit(slot)) return;
-        LookIfAlone();
+        if (m_IsAlone) LookIfDue();
     }
 }
 
@@ -234,7 +234,7 @@ public:
         if (m_Run->m_Data.Read(0, m_Position, buffer, *size, &m_FailedEntry, &m_Failure) != ZARVO_OK) return false;
         m_Position += *size;
         m_Run->m_BytesDone.store(m_Position, std::memory_order_relaxed);
-        m_Run->LookIfAlone();
+        if (m_Run->m_IsAlone) m_Run->LookIfDue();
         return true;
     }
 
@@ -273,6 +273,17 @@ void WriteRun::WorkOnStream() {
     Failure failure = writer.GetFailure();
     if (failure.code == ZARVO_OK) SetFailed(result, &failure);
     Fail(failure, result == EncodeResult::kInputFailed ? writer.FailedEntry() : PlannedData::kNoEntry);
+}
+
+// No block holds anything of them, so nothing has told yet whether they can be read and are still empty.
+void WriteRun::CheckEmptyFiles() {
+    for (size_t index = 0; index < m_List.size() && !m_IsStoppedByCaller; ++index) {
+        const EntryList::Entry& entry = m_List[index];
+        if (entry.size != 0 || EntryList::IsFolder(entry)) continue;
+        Failure failure;
+        if (m_Source->Read(0, m_List, entry, 0, nullptr, 0, &failure) != ZARVO_OK) return Fail(failure, index);
+        LookIfDue();
+    }
 }
 
 // What comes before the data always takes the same room.

@@ -49,7 +49,7 @@ private:
     void Work(UInt32 thread) override;
     void Watch(UInt32 count) override;
     void WorkAlone() override;
-    void LookIfAlone();
+    void LookIfDue();
     void Look();
     zarvo_code ChooseThreads(UInt32* threads, Failure* failure) const;
     [[nodiscard]] bool PrepareSlots(UInt32 threads);
@@ -60,6 +60,7 @@ private:
     bool Commit(Slot* slot);
     Slot* TakeNextFilled(Slot* written);
     void WorkOnStream();
+    void CheckEmptyFiles();
 
     UInt64 HeadSize() const;
     zarvo_code WriteFrame(Failure* failure); // all but the data

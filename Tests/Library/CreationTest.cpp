@@ -305,6 +305,7 @@ TEST_F(Creation, IsWholeOrMissingWhateverFails) {
     Put("a/b", SampleText(150'000));
     Put("c", NoiseText(100'000));
     Put("d/e/f", "f");
+    Put("empty", "");
     for (const char* const call : {"openat", "pread", "pwrite", "fsync", "renameat2", "flock", "fstatat"})
         for (const int32_t layout : {ZARVO_LAYOUT_FS, ZARVO_LAYOUT_WEB}) {
             bool hasStruck = true;
@@ -407,6 +408,28 @@ TEST_F(Creation, NamesAFileThatChangesMeanwhile) {
         EXPECT_EQ(row.text, made.text);
         EXPECT_EQ(std::set<std::string>{}, Names());
     }
+}
+
+TEST_F(Creation, NamesAnEmptyFileThatChangesMeanwhile) {
+    const struct {
+        const char* name;
+        std::function<void(const std::string& path)> change;
+        const char* text;
+    } kCases[] = {
+        {"grows", [](const std::string& path) { WriteFile(path, "x"); }, "the file has changed: it had 0 bytes"},
+        {"vanishes", [](const std::string& path) { fs::remove(path); }, "No such file or directory"},
+    };
+    for (const auto& [name, change, text] : kCases)
+        for (const char* const other : {"", "bytes"}) {
+            SCOPED_TRACE(std::string(name) + " beside a file of " + std::to_string(strlen(other)) + " bytes");
+            Put("d/empty", "");
+            Put("other", other);
+            WriteFile(m_Folder / ".a.zarvo.zarvo-part", "");
+            const Made made = Create(Archive(), In(), {.log = [&](std::string_view) { change(In() + "/d/empty"); }});
+            EXPECT_EQ(std::string("d/empty failed: ") + text + "\n", made.reports);
+            EXPECT_EQ(text, made.text);
+            EXPECT_EQ(std::set<std::string>{}, Names());
+        }
 }
 
 // As files of /sys do. What is missing must not come from elsewhere in memory.
