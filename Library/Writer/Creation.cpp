@@ -15,8 +15,9 @@ zarvo_code Creation::AddFolder(FolderEntries* folder, const char* path, Failure*
         return failure->code;
     }
     FolderEntries::Findings findings = {.files = &m_Entries, .leftOut = &m_LeftOut};
-    const zarvo_code code = folder->List(m_Options.excluded, m_File, &findings, failure);
-    if (code != ZARVO_OK && code != ZARVO_ERROR_MEMORY) TellFailed(findings.failed, findings.isFailedFolder, *failure);
+    const zarvo_code code = folder->List(m_Options, m_File, &findings, failure);
+    const bool isOfRun = code == ZARVO_OK || code == ZARVO_ERROR_MEMORY || code == ZARVO_ERROR_STOPPED;
+    if (!isOfRun) TellFailed(findings.failed, findings.isFailedFolder, *failure);
     m_Entries.Sort();
     return code;
 }

@@ -1,9 +1,11 @@
 #include "Library/Writer/FolderEntries.h"
 
+#include "Library/Threads.h"
 #include "PlatformDependent/Linux/RepeatOnInterrupt.h"
 #include "Runtime/Allocator/Allocator.h"
 
 #include <cerrno>
+#include <chrono>
 #include <dirent.h>
 #include <fcntl.h>
 #include <sys/stat.h>
@@ -22,9 +24,9 @@ FolderEntries::Reason ReasonOf(mode_t mode) {
 // Lists the folders one after another: those that are found are listed later.
 class FolderEntries::Search {
 public:
-    Search(const OutputFolder* root, zarvo_patterns* excluded, const NewArchive& place, Findings* findings)
+    Search(const OutputFolder* root, const zarvo_run_options& options, const NewArchive& place, Findings* findings)
         : m_Folders(root, kFoldersOfSearch, FolderCache::kRefuse),
-          m_Excluded(excluded),
+          m_Options(options),
           m_Place(place),
           m_Findings(findings),
           m_Path(findings->failed) {}
@@ -71,6 +73,7 @@ private:
             return FailWith(true, failure);
         }
         while (true) {
+            if (!TellProgress()) return failure->Set(ZARVO_ERROR_STOPPED, "stopped");
             errno = 0;
             const dirent* const found = readdir(folder);
             if (found == nullptr && errno == 0) return ZARVO_OK;
@@ -88,8 +91,8 @@ private:
     }
 
     zarvo_code AddFound(int folder, const char* name, Failure* failure) {
-        if (m_Excluded != nullptr) {
-            const int isExcluded = m_Excluded->Match(m_Path);
+        if (m_Options.excluded != nullptr) {
+            const int isExcluded = m_Options.excluded->Match(m_Path);
             if (isExcluded < 0) return failure->SetMemory();
             if (isExcluded != 0) return ZARVO_OK;
         }
@@ -112,17 +115,29 @@ private:
         return isKept ? ZARVO_OK : failure->SetMemory();
     }
 
+    // False: to be stopped.
+    bool TellProgress() {
+        const auto now = std::chrono::steady_clock::now();
+        if (m_Options.progress == nullptr || now - m_LastTold < kProgressInterval) return true;
+        m_LastTold = now;
+        zarvo_progress progress = {};
+        progress.struct_size = sizeof(progress);
+        progress.files_total = m_Findings->files->size();
+        return m_Options.progress(m_Options.context, &progress) == 0;
+    }
+
     zarvo_code FailWith(bool isFolder, Failure* failure) {
         m_Findings->isFailedFolder = isFolder;
         return failure->code;
     }
 
     FolderCache m_Folders;
-    zarvo_patterns* m_Excluded;
+    const zarvo_run_options& m_Options;
     const NewArchive& m_Place;
     Findings* m_Findings;
-    core::string& m_Path;        // of what is at hand, and so of what fails
-    size_t m_FolderPathSize = 0; // of the folder that is listed, with "/"
+    core::string& m_Path;                             // of what is at hand, and so of what fails
+    size_t m_FolderPathSize = 0;                      // of the folder that is listed, with "/"
+    std::chrono::steady_clock::time_point m_LastTold; // in the distant past
 };
 
 FolderEntries::~FolderEntries() {
@@ -130,9 +145,9 @@ FolderEntries::~FolderEntries() {
         Delete(reader, kMemLabelFileSystem);
 }
 
-zarvo_code FolderEntries::List(zarvo_patterns* excluded, const NewArchive& place, Findings* findings,
+zarvo_code FolderEntries::List(const zarvo_run_options& options, const NewArchive& place, Findings* findings,
                                Failure* failure) {
-    Search search(&m_Root, excluded, place, findings);
+    Search search(&m_Root, options, place, findings);
     return search.ListAll(failure);
 }
 

@@ -2,7 +2,7 @@
 // folder that they are in.
 //
 //   FolderEntries found;
-//   found.Open("game", failure), found.List(excluded, place, &findings, failure);
+//   found.Open("game", failure), found.List(options, place, &findings, failure);
 //   found.PrepareToRead(threads), found.Read(thread, list, list[3], 0, bytes, size, failure);
 #pragma once
 
@@ -29,9 +29,9 @@ public:
         bool isFailedFolder = false;
     };
 
-    // Finds everything below the folder but what the patterns match (null: none), and place, which is the archive's
-    // own.
-    zarvo_code List(zarvo_patterns* excluded, const NewArchive& place, Findings* findings, Failure* failure);
+    // Finds everything below the folder but what the options exclude, and place, which is the archive's own. Tells
+    // progress meanwhile, and is stopped by it.
+    zarvo_code List(const zarvo_run_options& options, const NewArchive& place, Findings* findings, Failure* failure);
 
     [[nodiscard]] bool PrepareToRead(UInt32 threads) override;
     zarvo_code Read(UInt32 thread, const EntryList& list, const EntryList::Entry& entry, UInt64 offset, UInt8* bytes,

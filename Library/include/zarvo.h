@@ -364,7 +364,7 @@ typedef struct zarvo_progress {
     uint64_t bytes;       /* bytes of data that the run has finished with */
     uint64_t bytes_total; /* bytes of data when the run is complete */
     uint64_t files;       /* entries that have a result */
-    uint64_t files_total; /* entries that will have one */
+    uint64_t files_total; /* entries that will have one; while zarvo_create looks for them, those that it has found */
 } zarvo_progress;
 
 /* What all runs have in common: zarvo_extract, zarvo_test, zarvo_visit and those that make archives. A zero, or NULL,

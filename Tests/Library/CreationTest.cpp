@@ -513,13 +513,21 @@ TEST_F(Creation, IsStoppedByItsProgress) {
     Put("a", NoiseText(16'000'000));
     for (const Form& form :
          {Form{"blocks", {.level = 12, .block_size = 1 << 16}}, Form{"web", {.layout = ZARVO_LAYOUT_WEB}}})
-        for (const int callsBefore : {0, 1}) {
+        for (const int callsBefore : {0, 1, 2}) {
             int calls = 0;
             const Made made = Create(Archive(), In(), form.how,
                                      {.progress = [&](const zarvo_progress&) { return calls++ < callsBefore; }});
             EXPECT_EQ(ZARVO_ERROR_STOPPED, made.code) << form.name;
             EXPECT_EQ(std::set<std::string>{}, Names()) << form.name;
         }
+}
+
+// A large tree takes a while, and so may the only folder of a slow disk.
+TEST_F(Creation, IsStoppedWhileItListsFolders) {
+    Put("a", "x");
+    const Made made =
+        Create(Archive(), In(), {.dry_run = true}, {.progress = [](const zarvo_progress&) { return false; }});
+    EXPECT_EQ((Made{.code = ZARVO_ERROR_STOPPED, .text = "stopped"}), made);
 }
 
 TEST_F(Creation, TellsAllProgressInTheEnd) {
