@@ -153,6 +153,7 @@ void Deallocate(PyObject* object) {
 
 PyMethodDef s_Methods[] = {
     {"info", GetInfo, METH_NOARGS, nullptr},
+    {"data_size", GetDataSize, METH_NOARGS, nullptr},
     {"entry_count", GetEntryCount, METH_NOARGS, nullptr},
     {"entry", GetEntry, METH_O, nullptr},
     {"find", FindItem, METH_O, nullptr},

@@ -87,6 +87,12 @@ PyObject* GetInfo(PyObject* self, PyObject*) {
                          info.file_count, info.folder_count, info.file_bytes);
 }
 
+PyObject* GetDataSize(PyObject* self, PyObject*) {
+    zarvo_info info = ZARVO_INFO_INIT;
+    (void)zarvo_get_info(AsArchive(self)->archive, &info); // fails only for null pointers
+    return PyLong_FromUnsignedLongLong(info.data_size);
+}
+
 PyObject* GetEntryCount(PyObject* self, PyObject*) {
     return PyLong_FromUnsignedLongLong(zarvo_entry_count(AsArchive(self)->archive));
 }

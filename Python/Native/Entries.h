@@ -10,6 +10,9 @@ bool LoadKinds();
 // info(): what zarvo_info has, in its order, the blocks in a tuple of their own.
 PyObject* GetInfo(PyObject* self, PyObject* unused);
 
+// data_size(): that of info().
+PyObject* GetDataSize(PyObject* self, PyObject* unused);
+
 // entry_count() and entry(number), of the directory.
 PyObject* GetEntryCount(PyObject* self, PyObject* unused);
 PyObject* GetEntry(PyObject* self, PyObject* number);

@@ -160,7 +160,7 @@ class Entry:
 
     def _data_end(self) -> int:
         """Where the archive's data ends, from the file's start on; negative if that is past it."""
-        return self.archive.info.data_size - self.offset
+        return self.archive._native.data_size() - self.offset
 
     def _require_file(self) -> None:
         if self.kind != "file":
