@@ -1,5 +1,6 @@
 #include "Library/Writer/FolderEntries.h"
 
+#include "Library/Patterns.h"
 #include "Library/Threads.h"
 #include "PlatformDependent/Linux/RepeatOnInterrupt.h"
 #include "Runtime/Allocator/Allocator.h"

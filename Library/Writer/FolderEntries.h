@@ -7,7 +7,6 @@
 #pragma once
 
 #include "Library/OutputFolder.h"
-#include "Library/Patterns.h"
 #include "Library/Writer/EntryList.h"
 #include "Library/Writer/EntrySource.h"
 #include "Library/Writer/NewArchive.h"
