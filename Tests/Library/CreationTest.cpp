@@ -419,15 +419,16 @@ TEST_F(Creation, NamesAnEmptyFileThatChangesMeanwhile) {
         {"grows", [](const std::string& path) { WriteFile(path, "x"); }, "the file has changed: it had 0 bytes"},
         {"vanishes", [](const std::string& path) { fs::remove(path); }, "No such file or directory"},
     };
-    for (const auto& [name, change, text] : kCases)
+    for (const auto& row : kCases)
         for (const char* const other : {"", "bytes"}) {
-            SCOPED_TRACE(std::string(name) + " beside a file of " + std::to_string(strlen(other)) + " bytes");
+            SCOPED_TRACE(std::string(row.name) + " beside a file of " + std::to_string(strlen(other)) + " bytes");
             Put("d/empty", "");
             Put("other", other);
             WriteFile(m_Folder / ".a.zarvo.zarvo-part", "");
-            const Made made = Create(Archive(), In(), {.log = [&](std::string_view) { change(In() + "/d/empty"); }});
-            EXPECT_EQ(std::string("d/empty failed: ") + text + "\n", made.reports);
-            EXPECT_EQ(text, made.text);
+            const Made made =
+                Create(Archive(), In(), {.log = [&](std::string_view) { row.change(In() + "/d/empty"); }});
+            EXPECT_EQ(std::string("d/empty failed: ") + row.text + "\n", made.reports);
+            EXPECT_EQ(row.text, made.text);
             EXPECT_EQ(std::set<std::string>{}, Names());
         }
 }
