@@ -70,7 +70,7 @@ int Serve(const Run& run, MountSession& session, MountedArchive& archive, unsign
         return kNotMounted;
     }
     mounted();
-    const int ended = session.Run(threads);
+    const int ended = session.Run(threads, [&] { return run.output.HasSignal(); });
     if (ended < 0) archive.Say(folder, strerror(-ended));
     run.done = "unmounting " + folder;
     if (ended > 0) (void)raise(ended); // as if it had come now
@@ -121,6 +121,11 @@ int GoToBackground(const Run& run, MountSession& session, MountedArchive& archiv
         count = process > 0 ? read(ready[0], &byte, 1) : 0;
     while (count < 0 && errno == EINTR && !run.output.HasSignal());
     close(ready[0]);
+    if (process > 0 && run.output.HasSignal()) { // which has not come to the other process, or too early to end it
+        kill(process, SIGTERM);
+        waitpid(process, nullptr, 0);
+        run.done = "unmounting " + folder;
+    }
     return count == 1 ? kAllDone : kNotMounted;
 }
 
@@ -142,6 +147,10 @@ int RunMount(const Run& run) {
     if (const std::string obstacle = FindObstacle(folder); !obstacle.empty()) {
         run.console.Say(folder, obstacle);
         return kNotMounted;
+    }
+    if (run.output.HasSignal()) {
+        run.done = "opening " + run.GetOperands()[0];
+        return kSomethingWrong;
     }
     if (run.arguments.Has(kForeground)) return Serve(run, session, archive, threads, [] {});
     return GoToBackground(run, session, archive, threads);

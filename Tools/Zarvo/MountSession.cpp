@@ -131,17 +131,17 @@ void MountSession::Unmount() {
     m_IsMounted = false;
 }
 
-int MountSession::Run(unsigned threads) {
+int MountSession::Run(unsigned threads, const std::function<bool()>& hasSignal) {
     fuse_loop_config* const config = fuse_loop_cfg_create();
     if (config == nullptr) return -ENOMEM;
     fuse_loop_cfg_set_max_threads(config, threads);
     fuse_loop_cfg_set_idle_threads(config, threads);
     fuse_loop_cfg_set_clone_fd(config, 1);
     m_IsRunning = true;
-    int ended;
+    int ended = 0;
     {
         const SignalGuard guard(m_Session);
-        ended = fuse_session_loop_mt(m_Session, config);
+        if (!hasSignal()) ended = fuse_session_loop_mt(m_Session, config);
     }
     fuse_loop_cfg_destroy(config);
     m_IsRunning = false;

@@ -33,7 +33,8 @@ public:
 
     // Answers, in up to so many threads, until the mount ends, which it has then. Returns 0 when somebody has unmounted
     // it, the signal that has ended it (SIGHUP, SIGINT or SIGTERM), or a negative errno.
-    int Run(unsigned threads);
+    // hasSignal: whether one came before, which ends the mount at once with 0.
+    int Run(unsigned threads, const std::function<bool()>& hasSignal);
 
 private:
     void Unmount();

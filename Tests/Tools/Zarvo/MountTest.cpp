@@ -312,6 +312,21 @@ TEST_F(ZarvoMount, EndsByUnmountingOrBySignals) {
     }
 }
 
+TEST_F(ZarvoMount, DoesNotMountAfterASignal) {
+    MakeSmallArchive();
+    for (const char* const where : {"-f", "-q"}) {
+        // In another process, which would go on until it is unmounted if it mounted.
+        const Transcript transcript = RunForked([&] {
+            alarm(20);
+            printf("%s", Zarvo({"mount", where, "small.zarvo", "m"}, {.signal = SIGTERM}).error.c_str());
+            return 0;
+        });
+        EXPECT_EQ(Transcript(0, "zarvo: ended by SIGTERM after opening small.zarvo\n"), transcript) << where;
+        EXPECT_FALSE(Mount::IsMounted("m")) << where;
+        (void)Mount::Unmount("m", "-uz");
+    }
+}
+
 TEST_F(ZarvoMount, FailsToReadOnceTheArchiveHasChanged) {
     MakeArchive("a.zarvo", Archive("lz4 chunk=100000 a:c100000 b:c100000 c:c100000"));
     const Mount mount({"zarvo", "mount", "-f", "a.zarvo", "m"}, "m");
