@@ -164,6 +164,14 @@ void MountedArchive::ReadFolder(fuse_req_t request, uint64_t number, size_t size
         fuse_reply_err(request, ENOENT);
         return;
     }
+    // A program may seek to a position of another folder. The kernel would believe that what comes next is in this one.
+    if (position > 2) {
+        const std::optional<MountTree::Node> folder = m_Tree->GetParent(position - 2);
+        if (!folder || folder->number != number) {
+            fuse_reply_buf(request, nullptr, 0);
+            return;
+        }
+    }
     bool hasRoom = true;
     if (position < 1) hasRoom = add(".", *own, 1);
     if (position < 2 && hasRoom) hasRoom = add("..", *parent, 2);

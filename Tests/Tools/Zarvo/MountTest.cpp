@@ -2,6 +2,7 @@
 #include "Tests/Tools/Zarvo/ZarvoTest.h"
 #include <zarvo.hpp>
 
+#include <dirent.h>
 #include <fcntl.h>
 #include <sys/mman.h>
 #include <sys/stat.h>
@@ -325,6 +326,19 @@ TEST_F(ZarvoMount, DoesNotMountAfterASignal) {
         EXPECT_FALSE(Mount::IsMounted("m")) << where;
         (void)Mount::Unmount("m", "-uz");
     }
+}
+
+TEST_F(ZarvoMount, ListsNothingAtPositionsOfOtherFolders) {
+    MakeArchive("a.zarvo", Archive("a:1 b:2 d/x:3 c:4"));
+    const Mount mount({"zarvo", "mount", "-f", "a.zarvo", "m"}, "m");
+    DIR* const folder = opendir("m/d");
+    ASSERT_NE(nullptr, folder);
+    for (long position = 3; position < 10; ++position) {
+        seekdir(folder, position);
+        const dirent* const found = readdir(folder);
+        EXPECT_STREQ("none", found == nullptr ? "none" : found->d_name) << position;
+    }
+    closedir(folder);
 }
 
 TEST_F(ZarvoMount, FailsToReadOnceTheArchiveHasChanged) {
