@@ -121,7 +121,9 @@ void MountReader::Keep(uint64_t entry, uint64_t from, uint64_t offset, std::span
         piece = &m_Pieces.back();
     }
     piece->lastUse = m_Uses++;
-    if (offset - from != piece->bytes.size()) return;
+    const uint64_t end = from + piece->bytes.size();
+    if (offset > end || bytes.size() <= end - offset) return;
+    bytes = bytes.subspan(end - offset); // those before it are kept since an attempt that failed
     piece->bytes.insert(piece->bytes.end(), bytes.begin(), bytes.end());
     m_PieceBytes += bytes.size();
     while (m_PieceBytes > kMaxPieceBytes || m_Pieces.size() > kMaxPieces) {

@@ -1,5 +1,6 @@
 // Archives mounted for real, and read as any program would. Skipped where this process can't mount.
 #include "Tests/Tools/Zarvo/ZarvoTest.h"
+#include "Tools/Zarvo/MountReader.h"
 #include <zarvo.hpp>
 
 #include <dirent.h>
@@ -339,6 +340,45 @@ TEST_F(ZarvoMount, ListsNothingAtPositionsOfOtherFolders) {
         EXPECT_STREQ("none", found == nullptr ? "none" : found->d_name) << position;
     }
     closedir(folder);
+}
+
+// Bytes of which those from a limit on can't be read.
+class LimitedSource : public zarvo::source {
+public:
+    LimitedSource(std::string bytes, const size_t& limit) : m_Bytes(std::move(bytes)), m_Limit(limit) {}
+    int64_t read_at(std::span<std::byte> buffer, uint64_t offset) override {
+        const size_t count = std::min<size_t>(buffer.size(), m_Bytes.size() - offset);
+        if (offset + count > m_Limit) return -EIO;
+        memcpy(buffer.data(), m_Bytes.data() + offset, count);
+        return int64_t(count);
+    }
+    int64_t size() override { return int64_t(m_Bytes.size()); }
+
+private:
+    const std::string m_Bytes;
+    const size_t& m_Limit;
+};
+
+TEST_F(ZarvoMount, ReadsAStreamAgainThatFailedOnce) {
+    const BuiltArchive built = BuildArchive(Archive("lzma streamed chunk=2000000 f:r6000000"));
+    size_t limit = SIZE_MAX;
+    zarvo::result<zarvo::archive> archive = zarvo::archive::open(std::make_unique<LimitedSource>(built.bytes, limit));
+    MountReader reader(*archive, 2, 1 << 30);
+    const zarvo::entry entry = archive->entries()[0];
+    const auto read = [&](uint64_t offset) {
+        std::string bytes(50'000, '\0');
+        const zarvo::read_result result = reader.Read(entry, offset, std::as_writable_bytes(std::span(bytes)));
+        return result.error ? std::string(result.error.text()) : bytes;
+    };
+    limit = built.dataOffset + 450'000;
+    EXPECT_THAT(read(480'000), testing::HasSubstr("Input/output error"));
+    limit = SIZE_MAX;
+    // Both places from which decoding could go on are taken.
+    for (const size_t offset : {2'000'000, 4'000'000})
+        EXPECT_EQ(Brief(built.stream.substr(offset, 50'000)), Brief(read(offset)));
+    alarm(20); // for a reader that never ends
+    EXPECT_EQ(Brief(built.stream.substr(480'000, 50'000)), Brief(read(480'000)));
+    alarm(0);
 }
 
 TEST_F(ZarvoMount, FailsToReadOnceTheArchiveHasChanged) {
