@@ -42,11 +42,11 @@ std::vector<std::string> GetOptions(const Run& run) {
     for (const char letter : std::string(resolved != nullptr ? resolved : ""))
         source += letter == ',' || letter == '\\' ? std::string("\\") + letter : std::string(1, letter);
     free(resolved);
-    std::vector<std::string> options = {"ro,default_permissions,subtype=zarvo"};
+    std::vector<std::string> options = {"default_permissions,subtype=zarvo"};
     if (!source.empty()) options.push_back("fsname=" + source);
     for (std::string& given : run.arguments.FindAll(kMountOptions))
         options.push_back(std::move(given));
-    options.push_back("max_read=" + std::to_string(MountedArchive::kMaxRead));
+    options.push_back("ro,max_read=" + std::to_string(MountedArchive::kMaxRead));
     return options;
 }
 

@@ -175,7 +175,7 @@ TEST_F(ZarvoMount, DescribesFilesAndFolders) {
     std::map<std::string, ino_t> numbers;
     // In another order, in another process: the numbers are the same.
     for (const std::vector<const char*>& paths : {std::vector{"m/a", "m/d", "m/d/b", "m/e"}, {"m/e", "m/d/b", "m/a"}}) {
-        const Mount mount({"zarvo", "mount", "-f", "a.zarvo", "m"}, "m");
+        const Mount mount({"zarvo", "mount", "-f", "-o", "r\\w", "a.zarvo", "m"}, "m"); // "rw", as mount reads it
         for (const char* const path : paths) {
             struct stat found = {};
             ASSERT_EQ(0, stat(path, &found)) << path;
@@ -189,6 +189,7 @@ TEST_F(ZarvoMount, DescribesFilesAndFolders) {
         struct statvfs statistics = {};
         EXPECT_EQ(0, statvfs("m", &statistics));
         EXPECT_EQ(2u, statistics.f_blocks);
+        EXPECT_EQ(unsigned{ST_RDONLY}, statistics.f_flag & ST_RDONLY);
         EXPECT_EQ(0u, statistics.f_bavail);
         EXPECT_EQ(-1, open("m/a", O_RDWR));
         EXPECT_EQ(EROFS, errno);
