@@ -143,7 +143,7 @@ int RunMount(const Run& run) {
     if (AsksForWriting(run) || !session.Open(GetOptions(run), &complaint))
         return RefuseUsage(run.console, kMount,
                            MakeMessage("%: '%' is no option of a mount", {DescribeOption(kMountOptions), complaint}));
-    if (!archive.Open(threads)) return kNoArchive;
+    if (!archive.Open(&threads)) return kNoArchive;
     if (const std::string obstacle = FindObstacle(folder); !obstacle.empty()) {
         run.console.Say(folder, obstacle);
         return kNotMounted;

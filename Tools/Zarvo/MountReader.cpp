@@ -2,6 +2,16 @@
 
 #include <algorithm>
 
+size_t MountReader::FitThreads(const zarvo::archive& archive, size_t threads, uint64_t maxBlockBytes) {
+    uint64_t largest = 1;
+    for (uint64_t index = 0; index < archive.block_count(); ++index) {
+        const zarvo_block block = archive.block(index);
+        const bool isHeld = block.kind != ZARVO_KIND_NONE && !IsStreamed(block, maxBlockBytes);
+        if (isHeld && block.size <= maxBlockBytes) largest = std::max<uint64_t>(largest, block.size);
+    }
+    return std::clamp<uint64_t>(maxBlockBytes / largest, 1, threads);
+}
+
 MountReader::MountReader(zarvo::archive& archive, size_t threads, uint64_t maxBlockBytes)
     : m_Archive(archive),
       m_Threads(threads),
@@ -10,11 +20,11 @@ MountReader::MountReader(zarvo::archive& archive, size_t threads, uint64_t maxBl
       m_DataSize(archive.info().data_size),
       m_Places(std::max<size_t>(threads, 2)) {
     for (uint64_t index = 0; index < m_BlockCount && !m_HasStreams; ++index)
-        m_HasStreams = IsStreamed(archive.block(index));
+        m_HasStreams = IsStreamed(archive.block(index), maxBlockBytes);
 }
 
-bool MountReader::IsStreamed(const zarvo_block& block) const {
-    return block.kind == ZARVO_KIND_LZMA && (block.is_streamed == 1 || block.size > m_MaxBlockBytes);
+bool MountReader::IsStreamed(const zarvo_block& block, uint64_t maxBlockBytes) {
+    return block.kind == ZARVO_KIND_LZMA && (block.is_streamed == 1 || block.size > maxBlockBytes);
 }
 
 // Of a position below the data's size.
@@ -40,8 +50,8 @@ zarvo::read_result MountReader::Read(const zarvo::entry& entry, uint64_t offset,
         const zarvo_block block = m_Archive.block(FindBlock(entry.offset() + at));
         const uint64_t left = block.position + block.size - (entry.offset() + at);
         const std::span<std::byte> inBlock = rest.first(std::min<uint64_t>(rest.size(), left));
-        zarvo::read_result part =
-            IsStreamed(block) ? ReadStreamed(entry, at, inBlock) : m_Archive.read(entry.index(), at, inBlock);
+        zarvo::read_result part = IsStreamed(block, m_MaxBlockBytes) ? ReadStreamed(entry, at, inBlock)
+                                                                     : m_Archive.read(entry.index(), at, inBlock);
         read.count += part.count;
         read.error = std::move(part.error);
     }
@@ -56,7 +66,9 @@ void MountReader::DecodeAhead(const zarvo::entry& entry, uint64_t offset) {
     if (index >= m_BlockCount) return;
     const zarvo_block block = m_Archive.block(index);
     constexpr uint32_t kMaxBlock = 1 << 20; // larger ones might push each other out of the library's cache
-    if (block.kind == ZARVO_KIND_NONE || block.size > kMaxBlock || IsStreamed(block) || block.position >= end) return;
+    if (block.kind == ZARVO_KIND_NONE || block.size > kMaxBlock || IsStreamed(block, m_MaxBlockBytes) ||
+        block.position >= end)
+        return;
     // A byte of the block takes all of it into the library's cache. Whoever needs it gets the error, if there is one.
     std::byte first;
     (void)m_Archive.read(entry.index(), block.position - entry.offset(), {&first, 1});

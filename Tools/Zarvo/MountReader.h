@@ -16,6 +16,10 @@
 
 class MountReader {
 public:
+    // How many of so many threads may read so that the blocks that they hold, each as it is stored and as it is
+    // decoded, take no more than twice maxBlockBytes; at least one.
+    static size_t FitThreads(const zarvo::archive& archive, size_t threads, uint64_t maxBlockBytes);
+
     // archive outlives the reader. threads: how many will call it. maxBlockBytes: as the archive was opened with.
     MountReader(zarvo::archive& archive, size_t threads, uint64_t maxBlockBytes);
 
@@ -59,7 +63,7 @@ private:
     static constexpr size_t kMaxPieces = 128;
 
     uint64_t FindBlock(uint64_t position) const;
-    bool IsStreamed(const zarvo_block& block) const;
+    static bool IsStreamed(const zarvo_block& block, uint64_t maxBlockBytes);
     Range FindRange(const zarvo::entry& entry, uint64_t offset) const;
     zarvo::read_result ReadStreamed(const zarvo::entry& entry, uint64_t offset, std::span<std::byte> buffer);
     size_t CopyPiece(uint64_t entry, const Range& range, uint64_t offset, std::span<std::byte> buffer);

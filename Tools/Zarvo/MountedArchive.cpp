@@ -73,7 +73,7 @@ void MountedArchive::OpenFile(fuse_req_t request, fuse_file_info* file, unsigned
         fuse_reply_open(request, file);
 }
 
-bool MountedArchive::Open(unsigned threads) {
+bool MountedArchive::Open(unsigned* threads) {
     m_Archive = m_Run.OpenArchive(m_Path, [this](std::string_view text) { Say(m_Path, text); });
     if (!m_Archive) return false;
     if (stat(m_Path.c_str(), &m_File) != 0) {
@@ -87,7 +87,9 @@ bool MountedArchive::Open(unsigned threads) {
     }
     if (const uint64_t hidden = m_Tree->CountHidden(); hidden != 0)
         Say(m_Path, MakeMessage("% entries can't be shown", {std::to_string(hidden)}));
-    m_Reader.emplace(*m_Archive, threads, m_Run.GetMemory() / 2);
+    const uint64_t maxBlockBytes = m_Run.GetMemory() / 2;
+    *threads = static_cast<unsigned>(MountReader::FitThreads(*m_Archive, *threads, maxBlockBytes));
+    m_Reader.emplace(*m_Archive, *threads, maxBlockBytes);
     return true;
 }
 

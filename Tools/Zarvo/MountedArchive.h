@@ -20,8 +20,9 @@ public:
     // ahead: several threads then share a large read, and their buffers stay small.
     static constexpr unsigned kMaxRead = 131'072;
 
-    // False, and a message, when the archive can't be opened. threads: how many will ask.
-    [[nodiscard]] bool Open(unsigned threads);
+    // False, and a message, when the archive can't be opened. *threads: how many may ask; afterwards how
+    // many the budget of memory allows.
+    [[nodiscard]] bool Open(unsigned* threads);
 
     // Their context is this object.
     static const fuse_lowlevel_ops kOperations;

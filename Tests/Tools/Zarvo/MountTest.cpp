@@ -360,6 +360,13 @@ private:
     const size_t& m_Limit;
 };
 
+TEST_F(ZarvoMount, HasAsManyThreadsAsMemoryAllows) {
+    MakeArchive("a.zarvo", Archive("lz4 chunk=100000 f:c300000"));
+    const zarvo::result<zarvo::archive> archive = zarvo::archive::open("a.zarvo");
+    for (const auto& [maxBlockBytes, threads] : {std::pair(1'000'000, 8), {250'000, 2}, {150'000, 1}, {50'000, 8}})
+        EXPECT_EQ(size_t(threads), MountReader::FitThreads(*archive, 8, uint64_t(maxBlockBytes))) << maxBlockBytes;
+}
+
 TEST_F(ZarvoMount, ReadsAStreamAgainThatFailedOnce) {
     const BuiltArchive built = BuildArchive(Archive("lzma streamed chunk=2000000 f:r6000000"));
     size_t limit = SIZE_MAX;
