@@ -382,7 +382,7 @@ TEST_F(ZarvoMount, ReadsAStreamAgainThatFailedOnce) {
     EXPECT_THAT(read(480'000), testing::HasSubstr("Input/output error"));
     limit = SIZE_MAX;
     // Both places from which decoding could go on are taken.
-    for (const size_t offset : {2'000'000, 4'000'000})
+    for (const size_t offset : {size_t{2'000'000}, size_t{4'000'000}})
         EXPECT_EQ(Brief(built.stream.substr(offset, 50'000)), Brief(read(offset)));
     alarm(20); // for a reader that never ends
     EXPECT_EQ(Brief(built.stream.substr(480'000, 50'000)), Brief(read(480'000)));
