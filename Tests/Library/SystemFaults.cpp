@@ -1,3 +1,4 @@
+#undef _FORTIFY_SOURCE // with it, headers define pread themselves
 #include "Tests/Library/SystemFaults.h"
 
 #include <atomic>
