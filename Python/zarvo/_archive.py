@@ -204,6 +204,8 @@ class Archive(Mapping[str, Entry]):
 
     Use it in a with statement, or close it. Any number of threads may use it. It can be pickled, and is then opened
     again where it is unpickled.
+
+    name: the path that it was opened by, or the name of the file object.
     """
 
     def __init__(self, file: StrPath | BinaryIO, *, offset: int = 0) -> None:
@@ -214,10 +216,12 @@ class Archive(Mapping[str, Entry]):
         self._file: str | BinaryIO
         if isinstance(file, (str, os.PathLike)):
             self._file = os.path.abspath(file)  # where an unpickled copy finds it
-            #: The path that it was opened by, or the name of the file object.
             self.name: str = os.fspath(file)
             self._handle = _native.open_path(file, self.name, offset)
             return
+        if not hasattr(file, "seek"):
+            given = type(file).__name__
+            raise TypeError(f"an archive is a path or a binary file object that can seek, and not {given}")
         self._file = file
         self.name = str(getattr(file, "name", file))
         if _is_plain_file(file):

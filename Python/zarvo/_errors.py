@@ -42,7 +42,6 @@ class EntryRefused(Error):
 class _Failures(Error):
     """Several things failed."""
 
-    #: (path or pattern, exception) for each of them.
     failures: list[tuple[str, Exception]]
 
     def __str__(self) -> str:
@@ -52,7 +51,10 @@ class _Failures(Error):
 
 
 class CreationFailed(_Failures):
-    """Files could not be put into an archive, so none was made. failures says which, and why."""
+    """Files could not be put into an archive, so none was made.
+
+    failures: path and exception for each of them.
+    """
 
     def __init__(self, failures: list[tuple[str, Exception]]) -> None:
         super().__init__(failures)
@@ -60,10 +62,11 @@ class CreationFailed(_Failures):
 
 
 class ExtractionFailed(_Failures):
-    """Some entries were not extracted, all others were. failures says which, or which pattern matches nothing."""
+    """Some entries were not extracted, all others were.
 
-    #: What was extracted.
-    extracted: Extracted
+    extracted: what was extracted.
+    failures: path and exception for each entry that was not, pattern and exception for each that matches nothing.
+    """
 
     def __init__(self, extracted: Extracted, failures: list[tuple[str, Exception]]) -> None:
         super().__init__(extracted, failures)

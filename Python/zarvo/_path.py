@@ -2,6 +2,7 @@
 
 from __future__ import annotations
 
+import fnmatch
 import io
 import os
 import pathlib
@@ -17,7 +18,7 @@ if TYPE_CHECKING:
 
 
 class Path:
-    """A place in an archive, with the part of pathlib's interface that zipfile.Path has.
+    """A place in an archive, with the part of pathlib's interface that zipfile.Path has in Python 3.11, and glob().
 
     Folders that no entry names, but that the paths of entries imply, are there, too.
 
@@ -114,6 +115,35 @@ class Path:
             child = self.joinpath(name)
             child._item = item
             yield child
+
+    def glob(self, pattern: str) -> Iterator[Path]:
+        """Yield what a pattern matches below here, as pathlib does: what a folder holds only if it matches itself.
+
+        "*", "?" and "[...]" match within one component, and the component "**" stands for any number of folders.
+        """
+        parts = pathlib.PurePosixPath(pattern).parts
+        if not parts or pattern.startswith("/"):
+            raise ValueError(f"{pattern!r} is not a relative pattern")
+        return iter(dict.fromkeys(self._select(parts)))
+
+    def rglob(self, pattern: str) -> Iterator[Path]:
+        """Yield what glob() does with "**/" in front of the pattern."""
+        return self.glob("**/" + pattern)
+
+    def _select(self, parts: tuple[str, ...]) -> Iterator[Path]:
+        if not parts:
+            yield self
+            return
+        if parts[0] == "**":
+            yield from self._select(parts[1:])
+        if not self.is_dir():
+            return
+        for child in self.iterdir():
+            if parts[0] == "**":
+                if child.is_dir():
+                    yield from child._select(parts)
+            elif fnmatch.fnmatchcase(child.name, parts[0]):
+                yield from child._select(parts[1:])
 
     def open(self, mode: str = "r", *args: Any, **kwargs: Any) -> IO[Any]:
         """Open the file: mode "r" for text, with the arguments of io.TextIOWrapper, or "rb" for bytes."""

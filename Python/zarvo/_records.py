@@ -1,19 +1,20 @@
 """What archives tell about themselves, and what became of runs."""
 
-from __future__ import annotations
-
 from typing import NamedTuple
 
 
 class Blocks(NamedTuple):
-    """The blocks of an archive."""
+    """The blocks of an archive.
+
+    total: how many there are.
+    largest: decoded bytes of the largest one.
+    streamed: how many can only be decoded from their start on.
+    none, lzma, lz4, lz4hc, unknown: how many there are of each kind.
+    """
 
     total: int
-    #: Decoded bytes of the largest block.
     largest: int
-    #: How many can only be decoded from their start on.
     streamed: int
-    #: How many there are of each kind.
     none: int
     lzma: int
     lz4: int
@@ -22,31 +23,37 @@ class Blocks(NamedTuple):
 
 
 class Info(NamedTuple):
-    """What an archive is. Sizes are in bytes."""
+    """What an archive is. Sizes are in bytes.
 
-    #: "ZarvoFS", "ZarvoWeb", "ZarvoRaw" or "ZarvoArchive".
+    layout: "ZarvoFS", "ZarvoWeb", "ZarvoRaw" or "ZarvoArchive".
+    version: of the layout.
+    engine_version, engine_revision: of the engine that wrote the archive.
+    recorded_size: of the archive, as its writer recorded it; 0 where it did not.
+    file_size: of the archive, as it is.
+    data_size: of the data, decoded.
+    stored_size: of the data, as the blocks are stored.
+    entries: how many the directory lists, also repeated ones.
+    files, folders: how many of them are files, and folders.
+    file_bytes: of all files, also repeated ones.
+    """
+
     layout: str
     version: int
     engine_version: str
     engine_revision: str
-    #: Of the archive, as its writer recorded it; 0 where it did not.
     recorded_size: int
     file_size: int
-    #: Of the data, decoded.
     data_size: int
-    #: Of the data, as the blocks are stored.
     stored_size: int
     blocks: Blocks
-    #: Of the directory: files and folders, also repeated ones.
     entries: int
     files: int
     folders: int
-    #: Of all files, also repeated ones.
     file_bytes: int
 
 
 class Progress(NamedTuple):
-    """How far an extraction or a test has come."""
+    """How far an extraction, a test or a creation has come."""
 
     bytes: int
     bytes_total: int
@@ -55,44 +62,53 @@ class Progress(NamedTuple):
 
 
 class Extracted(NamedTuple):
-    """What an extraction has put in place."""
+    """What an extraction has put in place.
+
+    kept: files that were there and were left (overwrite="never").
+    bytes: of the files.
+    """
 
     files: int
     folders: int
-    #: Files that were there and were left (overwrite="never").
     kept: int
-    #: Of the files.
     bytes: int
 
 
 class Damage(NamedTuple):
-    """An entry with bytes that can't be read."""
+    """An entry with bytes that can't be read.
+
+    readable: how many bytes from its start can be read.
+    """
 
     path: str
     size: int
-    #: How many bytes from its start can be read.
     readable: int
 
 
 class TestResult(NamedTuple):
-    """What a test has found."""
+    """What a test has found.
+
+    files, bytes: how many were tested.
+    damaged: the entries with bytes that can't be read, in the archive's order.
+    blocks: number and reason of each damaged block, also of those that no file uses.
+    """
 
     files: int
     bytes: int
-    #: In the archive's order.
     damaged: list[Damage]
-    #: Damaged blocks, also those that no file uses: number and reason.
     blocks: dict[int, str]
 
 
 class Created(NamedTuple):
-    """What an archive was made of."""
+    """What an archive was made of.
+
+    bytes: of the files.
+    archive_bytes: of the archive.
+    left_out: path and reason of links, devices, and folders that the layout does not hold.
+    """
 
     files: int
     folders: int
-    #: Of the files.
     bytes: int
-    #: Of the archive.
     archive_bytes: int
-    #: Links, devices, and folders that the layout does not hold: path and reason.
     left_out: list[tuple[str, str]]

@@ -196,6 +196,11 @@ class Errors(ArchiveTest):
             self.open([("a", b"1")], kind=UNKNOWN)["a"].read()
         self.assertTrue(issubclass(zarvo.UnsupportedData, NotImplementedError))
 
+    def test_tell_what_can_be_an_archive(self):
+        for file, name in ((build(TREE), "bytes"), (7, "int"), (None, "NoneType")):
+            with self.assertRaisesRegex(TypeError, f"a path or a binary file object that can seek, and not {name}"):
+                zarvo.open(file)
+
     def test_after_close_are_value_errors(self):
         archive = self.open(TREE)
         entry = archive["readme.txt"]
@@ -495,6 +500,33 @@ class Paths(ArchiveTest):
         ):
             self.assertEqual("on the way\n", path.read_text("utf-8-sig"))
         self.assertEqual(theirs.joinpath("a", "b.tar.gz").suffixes, ours.joinpath("a", "b.tar.gz").suffixes)
+
+    def test_glob_as_pathlib_does(self):
+        archive = self.open([*TREE, ("road/road/one.txt", b"")])
+        archive.extract(self.folder / "out")
+        for pattern in (
+            "*",
+            "*.txt",
+            "**/*.txt",
+            "ROAD/*",
+            "road/*",
+            "road/**/one.txt",
+            "**/road/**/*.txt",
+            "**/[!o]*/*",
+            "r??d",
+            "tables/one.csv",
+            "empty/*",
+            "none/*",
+        ):
+            self.assertEqual(
+                sorted(str(path.relative_to(self.folder / "out")) for path in (self.folder / "out").glob(pattern)),
+                sorted(path.at for path in zarvo.Path(archive).glob(pattern)),
+                pattern,
+            )
+        self.assertEqual(["road/of/one.txt"], [path.at for path in zarvo.Path(archive, "road/of").rglob("*.txt")])
+        for pattern in ("", "/road"):
+            with self.assertRaises(ValueError):
+                zarvo.Path(archive).glob(pattern)
 
     def test_say_what_is_not_there(self):
         root = zarvo.Path(self.write(TREE))
