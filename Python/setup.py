@@ -8,7 +8,7 @@ from setuptools import Extension, setup
 
 
 def ask_pkg_config(option: str) -> list[str]:
-    return shlex.split(subprocess.run(["pkg-config", option, "zarvo"], check=True, capture_output=True, text=True).stdout)
+    return shlex.split(subprocess.check_output(["pkg-config", option, "zarvo"], text=True))
 
 
 setup(
