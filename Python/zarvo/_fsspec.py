@@ -31,7 +31,7 @@ class ZarvoFileSystem(fsspec.AbstractFileSystem):  # type: ignore[misc]
 
     def __init__(
         self,
-        fo: Any = "",
+        fo: Any,
         target_protocol: str | None = None,
         target_options: dict[str, Any] | None = None,
         **kwargs: Any,

@@ -131,6 +131,7 @@ class FileSystem(unittest.TestCase):
             (lambda: self.fs.cat_file("tables"), IsADirectoryError),
             (lambda: self.fs.open("empty", "wb"), ValueError),
             (lambda: fsspec.filesystem("zarvo", fo=__file__), zarvo.BadArchive),
+            (lambda: fsspec.filesystem("zarvo"), TypeError),
             (lambda: fsspec.filesystem("zarvo", fo=str(self.path) + "x"), FileNotFoundError),
         ):
             with self.assertRaises(error):
