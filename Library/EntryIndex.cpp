@@ -4,6 +4,30 @@
 
 using ArchiveStorageHeader::Node;
 
+// Hashes paths, and remembers the hash of the last folder: most paths lie in the folder of the path before them.
+class EntryIndex::PathHasher {
+public:
+    explicit PathHasher(UInt64 seed) : m_Seed(seed), m_FolderHash(seed) {}
+
+    UInt64 Hash(core::string_ref path) {
+        const core::string_ref folder = WithoutLastComponent(path);
+        if (!(folder == m_Folder)) {
+            m_Folder = folder;
+            m_FolderHash = HashPath(folder, m_Seed);
+        }
+        return HashComponent(m_FolderHash, LastComponent(path));
+    }
+
+    // The folder of the path that was hashed last.
+    core::string_ref Folder() const { return m_Folder; }
+    UInt64 FolderHash() const { return m_FolderHash; }
+
+private:
+    const UInt64 m_Seed;
+    core::string_ref m_Folder;
+    UInt64 m_FolderHash;
+};
+
 static bool IsFolder(const Node& node) { return (node.flags & ArchiveStorageHeader::kNodeDirectory) != 0; }
 
 EntryIndex::EntryIndex(const Nodes& nodes)
@@ -55,11 +79,12 @@ zarvo_code EntryIndex::Build(Failure* failure) {
     std::fill(m_NextSibling.begin(), m_NextSibling.end(), kNoItem);
     std::fill(m_FirstChild.begin(), m_FirstChild.end(), kNoItem);
 
+    PathHasher hasher(m_Seed);
     // From the last to the first: the first that is met of equal paths is the one that counts.
     for (UInt32 item = count; item-- > 0;) {
         const core::string_ref path = m_Nodes[item].path;
         if (GetPathProblem(path, !IsFolder(m_Nodes[item])) != ZARVO_PROBLEM_NONE) continue;
-        UInt32* const slot = FindSlot(HashPath(path, m_Seed), path);
+        UInt32* const slot = FindSlot(hasher.Hash(path), path);
         if (*slot == kNoItem) *slot = item;
     }
     // In the same order, so that putting each in front of its folder's list leaves the list in the archive's order.
@@ -67,17 +92,23 @@ zarvo_code EntryIndex::Build(Failure* failure) {
     for (UInt32 item = count; item-- > 0;) {
         const core::string_ref path = m_Nodes[item].path;
         if (GetPathProblem(path, !IsFolder(m_Nodes[item])) != ZARVO_PROBLEM_NONE) continue;
-        if (!LinkIntoFolders(item, &hashes)) return failure->SetMemory();
+        if (!LinkIntoFolders(item, &hasher, &hashes)) return failure->SetMemory();
     }
     return ZARVO_OK;
 }
 
 // Puts an entry into its folder, and implied folders that are met for the first time into theirs.
-bool EntryIndex::LinkIntoFolders(UInt32 entry, dynamic_array<UInt64>* hashes) {
+bool EntryIndex::LinkIntoFolders(UInt32 entry, PathHasher* hasher, dynamic_array<UInt64>* hashes) {
     const core::string_ref path = m_Nodes[entry].path;
-    if (!HashFolders(path, m_Seed, hashes)) return false;
-    if (*FindSlot((*hashes)[hashes->size() - 1], path) != entry) return true; // a later one counts
+    if (*FindSlot(hasher->Hash(path), path) != entry) return true; // a later one counts
+    const UInt32 above = *FindSlot(hasher->FolderHash(), hasher->Folder());
+    if (above != kNoItem) {
+        PutInFront(entry, &m_FirstChild[above]);
+        return true;
+    }
 
+    // In the root, or in a folder that is met for the first time.
+    if (!HashFolders(path, m_Seed, hashes)) return false;
     UInt32 item = entry;
     core::string_ref rest = path;
     size_t normalLength = MeasureNormalForm(path);

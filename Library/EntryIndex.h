@@ -51,8 +51,10 @@ private:
         UInt32 normalLength;
     };
 
+    class PathHasher;
+
     UInt32* FindSlot(UInt64 hash, core::string_ref path);
-    [[nodiscard]] bool LinkIntoFolders(UInt32 item, dynamic_array<UInt64>* hashes);
+    [[nodiscard]] bool LinkIntoFolders(UInt32 entry, PathHasher* hasher, dynamic_array<UInt64>* hashes);
     [[nodiscard]] bool AddImpliedFolder(UInt32 entry, size_t length, size_t normalLength, UInt32* slot);
     void PutInFront(UInt32 item, UInt32* first);
 
