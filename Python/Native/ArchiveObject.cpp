@@ -64,6 +64,8 @@ PyObject* OpenWith(PyObject* name, std::unique_ptr<PythonSource> source, Open op
     self->name = new std::string(GetBytes(nameBytes));
     self->calls = 0;
     self->hasTree = false;
+    self->foundPath = nullptr;
+    self->foundIndex = 0;
     self->isLost = false;
     s_Archives.insert(self);
     PyObject_GC_Track(self);
@@ -144,6 +146,7 @@ void Deallocate(PyObject* object) {
         zarvo_close(self->archive);
         PyEval_RestoreThread(state);
     }
+    Py_XDECREF(self->foundPath);
     delete self->source;
     delete self->name;
     PyTypeObject* const type = Py_TYPE(object);

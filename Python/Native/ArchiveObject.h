@@ -17,6 +17,8 @@ struct ArchiveObject {
     std::string* name;      // owned; for messages
     int calls;              // that go on
     bool hasTree;           // zarvo_find no longer takes long
+    PyObject* foundPath;    // owned; null or the path that iteration gave last: most are looked up right away
+    uint64_t foundIndex;    // of its entry
     bool isLost;            // in a child process: another thread was in a call when the process forked
 };
 

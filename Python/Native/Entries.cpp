@@ -4,6 +4,7 @@
 #include "Runs.h"
 
 #include <new>
+#include <utility>
 #include <vector>
 
 static PyObject* s_Kinds[2]; // their names, by ZARVO_FILE and ZARVO_FOLDER
@@ -16,15 +17,15 @@ bool LoadKinds() {
 
 namespace {
 
-// An entry: (number, path, kind, size, offset, flags).
-PyObject* MakeEntry(const ArchiveObject* self, uint64_t index) {
+// An entry: (number, path, kind, size, offset, flags). path: its own, or null to make it.
+PyObject* MakeEntry(const ArchiveObject* self, uint64_t index, PyObject* path = nullptr) {
     zarvo_entry entry = ZARVO_ENTRY_INIT;
     if (zarvo_get_entry(self->archive, index, &entry) != ZARVO_OK) {
         PyErr_SetString(PyExc_IndexError, "no entry has that number");
         return nullptr;
     }
-    return Py_BuildValue("KNOKKI", index, DecodePath({entry.path, entry.path_length}), s_Kinds[entry.kind], entry.size,
-                         entry.offset, entry.flags);
+    path = path != nullptr ? Py_NewRef(path) : DecodePath({entry.path, entry.path_length});
+    return Py_BuildValue("KNOKKI", index, path, s_Kinds[entry.kind], entry.size, entry.offset, entry.flags);
 }
 
 // Builds the tree of items at the first call. False with an exception set.
@@ -108,9 +109,10 @@ PyObject* FindItem(PyObject* self, PyObject* path) {
 }
 
 PyObject* FindEntry(PyObject* object, PyObject* path) {
-    const ArchiveObject* const self = AsArchive(object);
+    ArchiveObject* const self = AsArchive(object);
+    if (path == self->foundPath) return MakeEntry(self, self->foundIndex, path);
     uint64_t item = 0;
-    if (!FindPath(AsArchive(object), path, &item) || item >= zarvo_entry_count(self->archive)) return ReturnNone();
+    if (!FindPath(self, path, &item) || item >= zarvo_entry_count(self->archive)) return ReturnNone();
     return MakeEntry(self, item);
 }
 
@@ -135,8 +137,15 @@ PyObject* NextFound(PyObject* object, PyObject* number) {
     if (!HasTree(self, &call)) return nullptr;
     zarvo_entry entry = ZARVO_ENTRY_INIT;
     while (zarvo_get_entry(self->archive, index, &entry) == ZARVO_OK) {
-        if (IsFound(self, index)) return Py_BuildValue("KN", index, DecodePath({entry.path, entry.path_length}));
-        ++index;
+        if (!IsFound(self, index)) {
+            ++index;
+            continue;
+        }
+        PyObject* const path = DecodePath({entry.path, entry.path_length});
+        if (path == nullptr) return nullptr;
+        Py_XDECREF(std::exchange(self->foundPath, Py_NewRef(path)));
+        self->foundIndex = index;
+        return Py_BuildValue("KN", index, path);
     }
     return Py_NewRef(Py_None);
 }
