@@ -35,10 +35,10 @@ ArchiveRun::ArchiveRun(zarvo_archive* archive, const zarvo_run_options& options)
       m_Data(&archive->Blocks(), archive->Nodes(), m_MaxBlockBytes, m_ThreadCount, this) {}
 
 zarvo_code ArchiveRun::Plan(OutputPlan* plan, UInt64* bytes, Failure* failure) {
-    if (!m_States.resize_uninitialized(Nodes().size(), kResizeExact)) return failure->SetMemory();
-    if (!m_States.empty()) memset(m_States.data(), kNoResult, m_States.size());
     if (const zarvo_code code = plan->Build(m_Options.wanted, m_Options.excluded, failure); code != ZARVO_OK)
         return code;
+    if (!m_States.resize_uninitialized(Nodes().size(), kResizeExact)) return failure->SetMemory();
+    if (!m_States.empty()) memset(m_States.data(), kNoResult, m_States.size());
     *bytes = 0;
     for (UInt32 entry = 0; entry < Nodes().size(); ++entry) {
         const OutputPlan::Verdict verdict = plan->VerdictOf(entry);
@@ -50,11 +50,11 @@ zarvo_code ArchiveRun::Plan(OutputPlan* plan, UInt64* bytes, Failure* failure) {
 }
 
 zarvo_code ArchiveRun::AddPlanned(const OutputPlan& plan, Failure* failure) {
+    if (!m_Data.ReserveFiles(static_cast<size_t>(m_Expected))) return failure->SetMemory();
     for (UInt32 entry = 0; entry < Nodes().size(); ++entry) {
         if (GetState(entry) != kPending) continue;
         const OutputPlan::Verdict verdict = plan.VerdictOf(entry);
         const Node& node = Nodes()[entry];
-        bool isAdded = true;
         if (verdict == OutputPlan::kRefused || verdict == OutputPlan::kClash) {
             Failure refusal;
             plan.SetRefusal(entry, &refusal);
@@ -62,11 +62,10 @@ zarvo_code ArchiveRun::AddPlanned(const OutputPlan& plan, Failure* failure) {
         } else if (verdict == OutputPlan::kFile && IsSettledBefore(entry)) {
             continue;
         } else if (verdict == OutputPlan::kFolder || node.size == 0 || IsOutsideData(node)) {
-            isAdded = m_Data.AddOther(entry);
+            if (!m_Data.AddOther(entry)) return failure->SetMemory();
         } else {
-            isAdded = m_Data.AddFile(entry);
+            m_Data.AddFile(entry);
         }
-        if (!isAdded) return failure->SetMemory();
     }
     return ZARVO_OK;
 }

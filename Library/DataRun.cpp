@@ -36,18 +36,19 @@ static bool Append(dynamic_array<T>* array, const T& value) {
     return true;
 }
 
-bool DataRun::AddFile(UInt32 entry) {
-    const ArchiveStorageHeader::Node& node = m_Nodes[entry];
-    const UInt64 size = std::min(node.size, m_DataSize - node.offset);
-    m_BytesTotal += size;
-    return Append(&m_Files, {node.offset, node.offset + size, entry});
+void DataRun::AddFile(UInt32 entry) {
+    m_BytesTotal += EndOf(entry) - BeginOf(entry);
+    m_Files.push_back(entry); // never grows
 }
 
 bool DataRun::AddOther(UInt32 entry) { return Append(&m_Others, entry); }
 
 void DataRun::Prepare() {
-    std::sort(m_Files.begin(), m_Files.end(),
-              [](const File& a, const File& b) { return a.begin != b.begin ? a.begin < b.begin : a.entry < b.entry; });
+    const auto isBefore = [this](UInt32 a, UInt32 b) {
+        return BeginOf(a) != BeginOf(b) ? BeginOf(a) < BeginOf(b) : a < b;
+    };
+    // In most archives, the directory has that order.
+    if (!std::is_sorted(m_Files.begin(), m_Files.end(), isBefore)) std::sort(m_Files.begin(), m_Files.end(), isBefore);
     if (m_TakesAllBlocks) m_BytesTotal = m_DataSize;
 }
 
@@ -72,8 +73,8 @@ void DataRun::StopWithoutMemory() {
     StopFor(failure);
 }
 
-SharedFile* DataRun::Share(const File& file) {
-    SharedFile* shared = m_Sink->ShareFile(file.entry, file.end - file.begin);
+SharedFile* DataRun::Share(UInt32 entry) {
+    SharedFile* shared = m_Sink->ShareFile(entry, EndOf(entry) - BeginOf(entry));
     if (shared == nullptr) return nullptr;
     shared->liveIndex = m_Shared.size();
     if (Append(&m_Shared, shared)) return shared;
@@ -94,7 +95,7 @@ void DataRun::Unshare(SharedFile* shared) {
 UInt64 DataRun::FindUnitEnd(const Unit& unit, UInt64 begin) const {
     UInt64 reach = 0; // of the files that begin before the place looked at
     for (const PieceFile& active : m_Active)
-        reach = std::max(reach, active.file->end);
+        reach = std::max(reach, EndOf(active.entry));
     size_t file = m_NextFile;
     UInt64 end = begin;
     UInt32 count = 0; // of blocks with bytes
@@ -102,8 +103,8 @@ UInt64 DataRun::FindUnitEnd(const Unit& unit, UInt64 begin) const {
         const Block block = m_Decoder->GetBlock(index);
         const bool isFirst = index == unit.firstBlock;
         const UInt64 blockEnd = block.position + block.size;
-        for (; file < m_Files.size() && m_Files[file].begin < blockEnd; ++file)
-            reach = std::max(reach, m_Files[file].end);
+        for (; file < m_Files.size() && BeginOf(m_Files[file]) < blockEnd; ++file)
+            reach = std::max(reach, EndOf(m_Files[file]));
         if (!isFirst && BlockDecoder::IsReadInPieces(block, m_MaxBlockBytes)) break;
         if (!isFirst && reach <= block.position && !m_TakesAllBlocks) break;
         if (block.size != 0) ++count;
@@ -128,14 +129,14 @@ bool DataRun::ListFiles(Unit* unit) {
     size_t kept = 0;
     for (const PieceFile& active : m_Active) {
         if (!Append(&unit->carried, active)) return false;
-        if (active.file->end > unit->end) m_Active[kept++] = active;
+        if (EndOf(active.entry) > unit->end) m_Active[kept++] = active;
     }
     (void)m_Active.resize_uninitialized(kept); // never grows
     unit->firstFile = m_NextFile;
-    for (; m_NextFile < m_Files.size() && m_Files[m_NextFile].begin < unit->end; ++m_NextFile) {
-        const File& file = m_Files[m_NextFile];
-        if (file.end <= unit->end) continue;
-        const PieceFile leaving = {&file, Share(file)};
+    for (; m_NextFile < m_Files.size() && BeginOf(m_Files[m_NextFile]) < unit->end; ++m_NextFile) {
+        const UInt32 entry = m_Files[m_NextFile];
+        if (EndOf(entry) <= unit->end) continue;
+        const PieceFile leaving = {entry, Share(entry)};
         if (leaving.shared == nullptr || !Append(&unit->leaving, leaving) || !Append(&m_Active, leaving)) return false;
     }
     unit->endFile = m_NextFile;
@@ -146,7 +147,7 @@ DataRun::UnitAnswer DataRun::NextUnit(Unit* unit) {
     UInt64 begin = m_Position;
     if (m_Active.empty() && !m_TakesAllBlocks) {
         if (m_NextFile == m_Files.size()) return kNoUnit;
-        begin = std::max(begin, m_Files[m_NextFile].begin);
+        begin = std::max(begin, BeginOf(m_Files[m_NextFile]));
     }
     if (begin >= m_DataSize) return kNoUnit;
     unit->firstBlock = m_Decoder->FindBlock(begin);
@@ -218,8 +219,8 @@ void DataRun::WorkOnUnit(UInt32 worker, const Unit& unit, Piece* piece) {
         if (!Append(&piece->files, carried)) return StopWithoutMemory();
     size_t leaving = 0;
     for (size_t index = unit.firstFile; index < unit.endFile; ++index) {
-        const File& file = m_Files[index];
-        const PieceFile inPiece = file.end <= unit.end ? PieceFile{&file, nullptr} : unit.leaving[leaving++];
+        const UInt32 entry = m_Files[index];
+        const PieceFile inPiece = EndOf(entry) <= unit.end ? PieceFile{entry, nullptr} : unit.leaving[leaving++];
         if (!Append(&piece->files, inPiece)) return StopWithoutMemory();
     }
     Decode(unit, piece);
@@ -274,11 +275,11 @@ void DataRun::WorkOnStream(UInt32 worker, const Unit& unit, Piece** piece) {
     dynamic_array<PieceFile> active(kMemLabelFileSystem);
     UInt64 end = m_TakesAllBlocks ? unit.end : unit.begin;
     for (const PieceFile& carried : unit.carried) {
-        end = std::max(end, std::min(unit.end, carried.file->end));
+        end = std::max(end, std::min(unit.end, EndOf(carried.entry)));
         if (!Append(&active, carried)) return StopWithoutMemory();
     }
     for (size_t index = unit.firstFile; index < unit.endFile; ++index)
-        end = std::max(end, std::min(unit.end, m_Files[index].end));
+        end = std::max(end, std::min(unit.end, EndOf(m_Files[index])));
     size_t file = unit.firstFile;
     size_t leaving = 0;
     bool isBroken = false; // nothing from here on can be read
@@ -294,20 +295,21 @@ void DataRun::WorkOnStream(UInt32 worker, const Unit& unit, Piece** piece) {
         size_t kept = 0;
         for (const PieceFile& going : active) {
             isOk = isOk && Append(&(*piece)->files, going);
-            if (going.file->end > (*piece)->end) active[kept++] = going;
+            if (EndOf(going.entry) > (*piece)->end) active[kept++] = going;
         }
         (void)active.resize_uninitialized(kept); // never grows
-        for (; isOk && file < unit.endFile && m_Files[file].begin < (*piece)->end; ++file) {
-            PieceFile inPiece = {&m_Files[file], nullptr};
-            if (m_Files[file].end > unit.end) {
+        for (; isOk && file < unit.endFile && BeginOf(m_Files[file]) < (*piece)->end; ++file) {
+            const UInt32 entry = m_Files[file];
+            PieceFile inPiece = {entry, nullptr};
+            if (EndOf(entry) > unit.end) {
                 inPiece = unit.leaving[leaving++];
-            } else if (m_Files[file].end > (*piece)->end) {
+            } else if (EndOf(entry) > (*piece)->end) {
                 std::lock_guard lock(m_Lock);
-                inPiece.shared = Share(m_Files[file]);
+                inPiece.shared = Share(entry);
                 isOk = inPiece.shared != nullptr;
             }
             isOk = isOk && Append(&(*piece)->files, inPiece);
-            if (m_Files[file].end > (*piece)->end) isOk = isOk && Append(&active, inPiece);
+            if (EndOf(entry) > (*piece)->end) isOk = isOk && Append(&active, inPiece);
         }
         if (!isOk) return StopWithoutMemory();
 
@@ -345,15 +347,16 @@ bool DataRun::PassOn(Piece** piece) {
 void DataRun::Deliver(UInt32 worker, const Piece& piece) {
     for (const PieceFile& part : piece.files) {
         if (IsStopped()) return;
-        const UInt64 begin = std::max(part.file->begin, piece.begin);
-        const UInt64 end = std::min(part.file->end, piece.end);
+        const UInt64 fileBegin = BeginOf(part.entry);
+        const UInt64 begin = std::max(fileBegin, piece.begin);
+        const UInt64 end = std::min(EndOf(part.entry), piece.end);
         // Holes are in the order of their places.
         const Hole* hole = std::lower_bound(piece.holes.begin(), piece.holes.end(), begin,
                                             [](const Hole& at, UInt64 place) { return at.end <= place; });
         if (hole == piece.holes.end() || hole->begin >= end) hole = nullptr;
         // A piece that has no bytes is all hole.
         const UInt8* const bytes = piece.bytes.empty() ? nullptr : piece.bytes.data() + (begin - piece.begin);
-        DeliverPart(worker, part, begin - part.file->begin, bytes, end - begin, hole);
+        DeliverPart(worker, part, begin - fileBegin, bytes, end - begin, hole);
         if (!m_TakesAllBlocks) CountBytes(end - begin);
         m_Sink->BetweenFiles();
     }
@@ -366,16 +369,16 @@ void DataRun::Deliver(UInt32 worker, const Piece& piece) {
 // offset: of the part, in its file. hole: the first in the part, or null.
 void DataRun::DeliverPart(UInt32 worker, const PieceFile& part, UInt64 offset, const UInt8* bytes, UInt64 size,
                           const Hole* hole) {
-    const UInt64 partBegin = part.file->begin + offset;
+    const UInt64 partBegin = BeginOf(part.entry) + offset;
     const UInt64 readable = hole != nullptr ? std::max(hole->begin, partBegin) - partBegin : size;
     if (part.shared == nullptr) {
         Failure outside;
         const Failure* damage = hole != nullptr ? &hole->failure : nullptr;
-        if (damage == nullptr && size < m_Nodes[part.file->entry].size) {
+        if (damage == nullptr && size < m_Nodes[part.entry].size) {
             (void)SetOutsideData(&outside);
             damage = &outside;
         }
-        m_Sink->TakeFile(worker, part.file->entry, bytes, readable, damage);
+        m_Sink->TakeFile(worker, part.entry, bytes, readable, damage);
         return;
     }
 
@@ -393,9 +396,9 @@ void DataRun::DeliverPart(UInt32 worker, const PieceFile& part, UInt64 offset, c
             shared->readable = offset + readable;
             shared->damage.Set(hole->failure);
         }
-        const UInt64 wholeSize = m_Nodes[shared->entry].size;
-        if (part.file->end - part.file->begin < wholeSize && shared->damage.Get() == nullptr) {
-            shared->readable = part.file->end - part.file->begin;
+        const UInt64 sizeInData = EndOf(part.entry) - BeginOf(part.entry);
+        if (sizeInData < m_Nodes[part.entry].size && shared->damage.Get() == nullptr) {
+            shared->readable = sizeInData;
             Failure outside;
             (void)SetOutsideData(&outside);
             shared->damage.Set(outside);

@@ -9,6 +9,7 @@
 // pieces on to threads that have nothing to do.
 //
 //   DataRun run(decoder, nodes, maxBlockBytes, threads, &sink);
+//   run.ReserveFiles(count);
 //   run.AddFile(entry) ..., or run.AddAllBlocks(); run.AddOther(entry) ...
 //   run.Prepare();
 //   run.Work(worker);   // in each thread, each with a number of its own
@@ -19,6 +20,7 @@
 #include "Library/BlockDecoder.h"
 #include "Runtime/Threads/Mutex.h"
 
+#include <algorithm>
 #include <condition_variable>
 #include <mutex>
 
@@ -77,8 +79,9 @@ public:
     ~DataRun();
 
     // Call these before Prepare. False when memory is refused. AddFile is for files that have bytes and start in the
-    // data.
-    [[nodiscard]] bool AddFile(UInt32 entry);
+    // data; there may be no more of them than were reserved.
+    [[nodiscard]] bool ReserveFiles(size_t count) { return m_Files.reserve(count); }
+    void AddFile(UInt32 entry);
     [[nodiscard]] bool AddOther(UInt32 entry);
     void AddAllBlocks() { m_TakesAllBlocks = true; }
     void KeepOrder() { m_KeepsOrder = true; } // parts of a file come one after the other, from its start on
@@ -101,13 +104,8 @@ public:
     UInt64 BytesTaken() const { return m_BytesTaken.load(std::memory_order_relaxed); } // for progress
 
 private:
-    struct File {
-        UInt64 begin; // in the data
-        UInt64 end;   // not past the data's end
-        UInt32 entry;
-    };
     struct PieceFile {
-        const File* file;
+        UInt32 entry;
         SharedFile* shared; // null: the file lies in the piece whole
     };
     // A range that can't be read.
@@ -141,12 +139,18 @@ private:
     static constexpr UInt32 kMaxUnitBlocks = 1'024;       // each may have a failure of its own
     static constexpr size_t kOthersAtOnce = 64;
 
+    // Where a file lies in the data; its end is not past that of the data.
+    UInt64 BeginOf(UInt32 entry) const { return m_Nodes[entry].offset; }
+    UInt64 EndOf(UInt32 entry) const {
+        return BeginOf(entry) + std::min(m_Nodes[entry].size, m_DataSize - BeginOf(entry));
+    }
+
     // With m_Lock held.
     enum UnitAnswer { kUnit, kNoUnit, kNoMemoryForUnit };
     UnitAnswer NextUnit(Unit* unit);
     UInt64 FindUnitEnd(const Unit& unit, UInt64 begin) const;
     bool ListFiles(Unit* unit);
-    SharedFile* Share(const File& file);
+    SharedFile* Share(UInt32 entry);
 
     void WorkOnUnit(UInt32 worker, const Unit& unit, Piece* piece);
     void WorkOnStream(UInt32 worker, const Unit& unit, Piece** piece);
@@ -168,7 +172,7 @@ private:
     Sink* m_Sink;
     bool m_KeepsOrder = false;
     bool m_TakesAllBlocks = false;
-    dynamic_array<File> m_Files{kMemLabelFileSystem}; // by their beginnings, once prepared
+    dynamic_array<UInt32> m_Files{kMemLabelFileSystem}; // entries; by their beginnings, once prepared
     dynamic_array<UInt32> m_Others{kMemLabelFileSystem};
     UInt64 m_BytesTotal = 0;
 

@@ -5,7 +5,7 @@
 // Of several entries with the same normal form, the last is found; the others, and entries with a problem, are in no
 // folder.
 //
-// Takes 18 bytes per entry: a slot of 8 bytes in a hash table that is at most four fifths full, and two links of 4.
+// Takes 18 bytes per entry: a slot of 8 bytes in a hash table that is at most six sevenths full, and two links of 4.
 #pragma once
 
 #include "Library/Failure.h"

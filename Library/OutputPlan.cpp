@@ -29,7 +29,7 @@ UInt32* OutputPlan::Find(UInt64 hash, core::string_ref path) {
 zarvo_code OutputPlan::Build(zarvo_patterns* wanted, zarvo_patterns* excluded, Failure* failure) {
     const UInt32 count = static_cast<UInt32>(m_Nodes.size());
     if (m_Nodes.size() > PathTable::kNoItem / 2 || !m_Verdicts.resize_uninitialized(count, kResizeExact) ||
-        !m_Table.Reserve(count))
+        !m_Table.Reserve(size_t{count} + count / 64))
         return failure->SetMemory();
     m_Seed = RandomHashSeed();
     dynamic_array<UInt64> hashes(kMemLabelGeneral);
@@ -42,9 +42,11 @@ zarvo_code OutputPlan::Build(zarvo_patterns* wanted, zarvo_patterns* excluded, F
         if (isWanted == 0 || isExcluded == 1) continue;
         if (GetPathProblem(path, !IsFolderItem(entry)) != ZARVO_PROBLEM_NONE)
             m_Verdicts[entry] = kRefused;
-        else if (!LastComponent(PathOnDisk(entry)).empty() && !Settle(entry, &hashes))
+        else if (!Settle(entry, &hashes))
             return failure->SetMemory();
     }
+    m_Table.Clear();
+    m_Implied = dynamic_array<ImpliedFolder>(kMemLabelFileSystem);
     return ZARVO_OK;
 }
 
@@ -63,13 +65,14 @@ void OutputPlan::SetRefusal(size_t entry, Failure* failure) const {
     }
 }
 
-// Gives the entry its path, and those of the folders above it, unless they belong to somebody else.
+// Gives the entry its path, and those of the folders above it, unless they belong to somebody else, or no path is left.
 bool OutputPlan::Settle(UInt32 entry, dynamic_array<UInt64>* hashes) {
     const core::string_ref path = PathOnDisk(entry);
     const bool isFolder = IsFolderItem(entry);
     if (!HashFolders(path, m_Seed, hashes)) return false;
     const size_t depth = hashes->size();
-    if (!m_Table.Reserve(m_Nodes.size() + m_Implied.size() + depth)) return false;
+    if (depth == 0) return true;
+    if (!m_Table.Reserve(m_Settled + m_Implied.size() + depth)) return false;
 
     // The innermost folder that is there already decides: those around it are folders, as it would not be there else.
     size_t there = depth - 1;
@@ -87,11 +90,15 @@ bool OutputPlan::Settle(UInt32 entry, dynamic_array<UInt64>* hashes) {
         m_Verdicts[entry] = kClash;
         return true;
     }
-    if (*own != PathTable::kNoItem && *own < m_Nodes.size()) m_Verdicts[*own] = kReplaced;
+    if (*own == PathTable::kNoItem)
+        ++m_Settled;
+    else if (*own < m_Nodes.size())
+        m_Verdicts[*own] = kReplaced;
     *own = entry;
     m_Verdicts[entry] = isFolder ? kFolder : kFile;
 
     // The folders between are implied from now on.
+    if (there + 1 == depth) return true;
     PathComponents at(path);
     for (size_t level = 0; level + 1 < depth; ++level) {
         (void)at.Next();

@@ -1,6 +1,6 @@
 // A hash table that finds items by the normal form of their paths. It holds only the items' numbers; its owner passes a
-// callable pathOf, core::string_ref(UInt32 item), that knows their paths. A slot takes 8 bytes, and at most four fifths
-// of the slots are used.
+// callable pathOf, core::string_ref(UInt32 item), that knows their paths. A slot takes 8 bytes, and at most six
+// sevenths of the slots are used.
 //
 // One thread at a time; any number of threads may call Get at once.
 #pragma once
@@ -14,7 +14,7 @@ public:
 
     // Makes room for count items, and keeps those in the table. Pointers that Find returned are no longer valid.
     [[nodiscard]] bool Reserve(size_t count) {
-        const size_t wanted = count + count / 4 + 8;
+        const size_t wanted = count + count / 6 + 8;
         if (wanted <= m_Slots.size()) return true;
         dynamic_array<Slot> old = std::move(m_Slots);
         // A table that outgrows its size once leaves room for some more.

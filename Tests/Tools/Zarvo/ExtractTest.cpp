@@ -1,5 +1,8 @@
 #include "Tests/Tools/Zarvo/ZarvoTest.h"
 
+#include <sys/resource.h>
+#include <sys/wait.h>
+
 namespace {
 
 class ZarvoExtract : public ZarvoTest {
@@ -134,6 +137,37 @@ TEST_F(ZarvoExtract, SaysWhatWasDoneBeforeASignal) {
     MakeArchive("a.zarvo", Archive("a:1 b:22"));
     EXPECT_EQ((Heard{1, "", "zarvo: ended by SIGTERM after 2 files, 3 bytes, 0 failures\n"}),
               Zarvo({"extract", "a.zarvo"}, {.signal = SIGTERM}));
+}
+
+// The most memory that the program takes to try an extraction, in KiB; 0 when it fails.
+long PeakOfDryRun(const char* archive) {
+    const pid_t process = fork();
+    if (process == 0) {
+        if (freopen("/dev/null", "w", stdout) != nullptr)
+            execl(VARNEX_BINARY, "zarvo", "extract", "--dry-run", "-q", "-j1", archive, nullptr);
+        _exit(kStatusNotStarted);
+    }
+    int status = 0;
+    rusage usage = {};
+    EXPECT_EQ(process, wait4(process, &status, 0, &usage));
+    return status == 0 ? usage.ru_maxrss : 0;
+}
+
+TEST_F(ZarvoExtract, TakesLittleMemoryForEachEntry) {
+    if (VARNEX_SANITIZED) GTEST_SKIP() << "sanitizers take memory of their own";
+    constexpr long kEntries = 300'000, kBytesPerEntry = 64, kMebibyte = 1'024;
+    // Made in a process that ends: a program begins with the peak of the process that starts it.
+    const auto make = [] {
+        ArchiveDescription archive;
+        for (int number = 0; number < kEntries; ++number)
+            archive.entries.push_back({.path = std::to_string(number), .bytes = "0123456789"});
+        MakeArchive("a.zarvo", archive);
+        return 0;
+    };
+    ASSERT_EQ(0, RunForked(make).first);
+    const long peak = PeakOfDryRun("a.zarvo");
+    EXPECT_LT(kEntries * kBytesPerEntry / 1'024, peak);
+    EXPECT_GT(16 * kMebibyte + kEntries * kBytesPerEntry / 1'024, peak);
 }
 
 } // namespace
