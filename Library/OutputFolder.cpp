@@ -90,16 +90,24 @@ bool FolderCache::Close() {
     for (Folder& folder : m_Folders)
         close(folder.descriptor);
     m_Folders.clear();
+    m_LastDescriptor = -1;
     return hadAny;
 }
 
 // Opens a folder in another one.
 int FolderCache::Enter(int above, const char* name, Failure* failure) {
-    if (m_Missing == kMake && RepeatOnInterrupt([&] { return mkdirat(above, name, 0777); }) != 0 && errno != EEXIST) {
-        (void)failure->SetSystem(errno);
-        return -1;
+    const auto openFolder = [&] { return RepeatOnInterrupt([&] { return openat(above, name, kFolderFlags); }); };
+    // A folder is likely to be there if the last one was.
+    const bool opensFirst = m_Missing != kMake || m_WasThere;
+    int descriptor = opensFirst ? openFolder() : -1;
+    if (m_Missing == kMake && descriptor < 0 && (!opensFirst || errno == ENOENT)) {
+        m_WasThere = RepeatOnInterrupt([&] { return mkdirat(above, name, 0777); }) != 0;
+        if (m_WasThere && errno != EEXIST) {
+            (void)failure->SetSystem(errno);
+            return -1;
+        }
+        descriptor = openFolder();
     }
-    const int descriptor = RepeatOnInterrupt([&] { return openat(above, name, kFolderFlags); });
     if (descriptor >= 0) return descriptor;
     const int error = errno;
     if (m_Missing == kLook && error == ENOENT) {
@@ -145,10 +153,19 @@ bool FolderCache::Keep(core::string_ref path, int descriptor) {
 }
 
 int FolderCache::Get(core::string_ref path, Failure* failure) {
-    const int descriptor = Walk(path, m_MaxFolders, failure);
-    if (descriptor >= 0 || !IsOutOfDescriptors(*failure) || !Close()) return descriptor;
+    // Each file asks twice, and files of a folder mostly follow one another.
+    if (m_LastDescriptor >= 0 && path == m_LastPath) return m_LastDescriptor;
+    m_LastDescriptor = -1;
+    if (m_LastPath.grow(path.size()) == nullptr) {
+        (void)failure->SetMemory();
+        return -1;
+    }
+    m_LastPath = path;
+    m_LastDescriptor = Walk(path, m_MaxFolders, failure);
+    if (m_LastDescriptor >= 0 || !IsOutOfDescriptors(*failure) || !Close()) return m_LastDescriptor;
     *failure = {};
-    return Walk(path, 1, failure);
+    m_LastDescriptor = Walk(path, 1, failure);
+    return m_LastDescriptor;
 }
 
 int FolderCache::Walk(core::string_ref path, size_t maxKept, Failure* failure) {

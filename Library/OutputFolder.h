@@ -75,7 +75,7 @@ private:
         UInt64 lastUse = 0;
     };
 
-    // As Get, and keeps the last maxKept folders of the path open.
+    // As Get, for another path than that of the last call, and keeps the last maxKept folders of the path open.
     int Walk(core::string_ref path, size_t maxKept, Failure* failure);
     int Enter(int above, const char* name, Failure* failure);
     void CheckNames(int above, char* names, Failure* failure);
@@ -87,6 +87,11 @@ private:
     dynamic_array<Folder> m_Folders{kMemLabelFileSystem};
     core::string m_Normal{kMemLabelGeneral};
     UInt64 m_Uses = 0;
+    bool m_WasThere = false; // whether the last folder to be made was there already
+
+    // What the last Get was asked for and has found, or -1.
+    core::string m_LastPath{kMemLabelGeneral};
+    int m_LastDescriptor = -1;
 };
 
 // Whether the failure is that no descriptor is left.

@@ -35,10 +35,14 @@ core::string_ref LastComponent(core::string_ref path) {
 
 core::string_ref WithoutLastComponent(core::string_ref path) {
     const core::string_ref last = LastComponent(path);
-    return path.substr(0, static_cast<size_t>(last.data() - path.data()));
+    size_t end = static_cast<size_t>(last.data() - path.data());
+    while (end != 0 && IsSeparator(path[end - 1]))
+        --end;
+    return path.substr(0, end);
 }
 
 bool IsSamePath(core::string_ref a, core::string_ref b) {
+    if (a == b) return true; // most stored paths are in normal form
     PathComponents atA(a);
     PathComponents atB(b);
     while (true) {

@@ -30,7 +30,7 @@ private:
 // The last component of the normal form; empty if the normal form is empty.
 core::string_ref LastComponent(core::string_ref path);
 
-// The path without its last component. Not in normal form.
+// The path without its last component and the separators before it. Not in normal form.
 core::string_ref WithoutLastComponent(core::string_ref path);
 
 // Whether two paths have the same normal form.
