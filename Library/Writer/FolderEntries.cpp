@@ -211,8 +211,10 @@ zarvo_code FolderEntries::Read(UInt32 thread, const EntryList& list, const Entry
     const int descriptor = OpenFile(m_Readers[thread], list.PathOf(entry), failure);
     if (descriptor < 0) return failure->code;
     zarvo_code code = CheckSize(descriptor, entry.size, failure);
-    if (code == ZARVO_OK) code = ReadFully(descriptor, offset, bytes, size, failure);
-    if (code == ZARVO_OK) code = CheckSize(descriptor, entry.size, failure);
+    if (code == ZARVO_OK && size != 0) {
+        code = ReadFully(descriptor, offset, bytes, size, failure);
+        if (code == ZARVO_OK) code = CheckSize(descriptor, entry.size, failure); // it may have changed meanwhile
+    }
     close(descriptor);
     return code;
 }

@@ -68,6 +68,8 @@ struct ArchiveForm {
 
 constexpr UInt64 kHeaderAlignment = 16; // block-based headers are padded to it from version 7 on
 
+constexpr UInt64 RoundUp(UInt64 value, UInt64 unit) { return (value + unit - 1) / unit * unit; }
+
 struct BlockBasedSizes {
     UInt64 archive;
     UInt64 compressedSection;

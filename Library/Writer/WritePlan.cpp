@@ -27,8 +27,6 @@ constexpr UInt64 kMaxDirectorySize = UInt64{1} << 30;
 // Varnex looks for the end of a ZarvoWeb directory in pieces of this size, and only in whole ones.
 constexpr UInt64 kWebPieceSize = 65'536;
 
-UInt64 RoundUp(UInt64 value, UInt64 unit) { return (value + unit - 1) / unit * unit; }
-
 } // namespace
 
 UInt64 LegacyHeaderSize(const ArchiveForm& form) {

@@ -10,8 +10,7 @@ namespace {
 
 constexpr UInt32 kMaxThreads = 1'024;
 constexpr UInt64 kSpareSlotBytes = 8'388'608; // of all threads together
-
-UInt64 RoundUp(UInt64 value, UInt64 unit) { return (value + unit - 1) / unit * unit; }
+constexpr size_t kEmptyFilesAtOnce = 256;     // that a thread takes, so that others check those of other folders
 
 // An encoder fails for want of memory, or because the run is stopped.
 void SetFailed(EncodeResult result, Failure* failure) {
@@ -39,10 +38,23 @@ zarvo_code WriteRun::ChooseThreads(UInt32* threads, Failure* failure) const {
         return failure->Set(ZARVO_ERROR_LIMIT, "to compress takes %llu bytes of memory, and the limit is %llu",
                             static_cast<unsigned long long>(needed), static_cast<unsigned long long>(memory));
     UInt64 count = m_Options.threads != 0 ? m_Options.threads : ProcessorCount();
-    count = std::min({count, memory / needed, m_Plan.BlockCount(),
-                      FreeDescriptors(kOtherDescriptors) / kDescriptorsOfThread, UInt64{kMaxThreads}});
+    const UInt64 pieces = std::max<UInt64>(m_Plan.BlockCount(), m_EmptyFiles.size() / kEmptyFilesAtOnce);
+    count = std::min({count, memory / needed, pieces, FreeDescriptors(kOtherDescriptors) / kDescriptorsOfThread,
+                      UInt64{kMaxThreads}});
     *threads = static_cast<UInt32>(std::max<UInt64>(count, 1));
     return ZARVO_OK;
+}
+
+// False when memory is refused.
+bool WriteRun::FindEmptyFiles() {
+    for (size_t index = 0; index < m_List.size(); ++index) {
+        const EntryList::Entry& entry = m_List[index];
+        if (entry.size != 0 || EntryList::IsFolder(entry)) continue;
+        const size_t count = m_EmptyFiles.size();
+        if (!m_EmptyFiles.resize_uninitialized(count + 1)) return false;
+        m_EmptyFiles[count] = static_cast<UInt32>(index);
+    }
+    return true;
 }
 
 bool WriteRun::PrepareSlots(UInt32 threads) {
@@ -61,6 +73,7 @@ bool WriteRun::PrepareSlots(UInt32 threads) {
 
 zarvo_code WriteRun::Write(NewArchive* file, Failure* failure) {
     m_File = file;
+    if (!FindEmptyFiles()) return failure->SetMemory();
     UInt32 threads = 0;
     if (const zarvo_code code = ChooseThreads(&threads, failure); code != ZARVO_OK) return code;
     if (!m_Data.IsReady() || !m_Source->PrepareToRead(threads)) return failure->SetMemory();
@@ -68,8 +81,7 @@ zarvo_code WriteRun::Write(NewArchive* file, Failure* failure) {
     if (!isStream && !PrepareSlots(threads)) return failure->SetMemory();
     m_End = m_DataPlace = HeadSize();
     m_IsStoppedByCaller = !TellProgress();
-    if (m_Data.Size() != 0 && !m_IsStoppedByCaller) RunOnThreads(threads, this);
-    if (m_Fatal.code == ZARVO_OK) CheckEmptyFiles();
+    if (!m_IsStoppedByCaller) RunOnThreads(threads, this);
     if (!m_IsStoppedByCaller) m_IsStoppedByCaller = !TellProgress();
     if (m_Fatal.code == ZARVO_OK && m_IsStoppedByCaller) (void)m_Fatal.Set(ZARVO_ERROR_STOPPED, "stopped");
     if (m_Fatal.code == ZARVO_OK) return WriteFrame(failure);
@@ -78,10 +90,11 @@ zarvo_code WriteRun::Write(NewArchive* file, Failure* failure) {
 }
 
 void WriteRun::Work(UInt32 thread) {
-    if (m_Plan.Layout() == ZARVO_LAYOUT_WEB)
-        WorkOnStream();
-    else
+    CheckEmptyFiles(thread);
+    if (m_Plan.Layout() != ZARVO_LAYOUT_WEB)
         WorkOnBlocks(thread);
+    else if (thread == 0)
+        WorkOnStream();
     m_Workers.AddEnded();
 }
 
@@ -109,13 +122,20 @@ void WriteRun::Look() {
     m_HasFreeSlot.notify_all();
 }
 
+// Of the entries before a position, and of the empty files wherever they are.
+UInt64 WriteRun::CountDone(UInt64 position) const {
+    const size_t passed = m_Data.CountUpTo(position);
+    const auto emptyPassed = std::lower_bound(m_EmptyFiles.begin(), m_EmptyFiles.end(), passed) - m_EmptyFiles.begin();
+    return passed - static_cast<UInt64>(emptyPassed) + m_EmptyFilesDone.load(std::memory_order_relaxed);
+}
+
 bool WriteRun::TellProgress() {
     if (m_Options.progress == nullptr) return true;
     zarvo_progress progress = {};
     progress.struct_size = sizeof(progress);
     progress.bytes = m_BytesDone.load(std::memory_order_relaxed); // nothing else goes by it
     progress.bytes_total = m_Data.Size();
-    progress.files = m_Data.CountUpTo(progress.bytes);
+    progress.files = CountDone(progress.bytes);
     progress.files_total = m_List.size();
     return m_Options.progress(m_Options.context, &progress) == 0;
 }
@@ -129,6 +149,23 @@ void WriteRun::Fail(const Failure& failure, size_t entry) {
     }
     m_IsStopped.store(true, std::memory_order_relaxed);
     m_HasFreeSlot.notify_all();
+}
+
+// Whether they can be read, and are still empty.
+void WriteRun::CheckEmptyFiles(UInt32 thread) {
+    while (!m_IsStopped.load(std::memory_order_relaxed)) {
+        const size_t begin = m_NextEmptyFile.fetch_add(kEmptyFilesAtOnce, std::memory_order_relaxed);
+        if (begin >= m_EmptyFiles.size()) return;
+        const size_t end = std::min(begin + kEmptyFilesAtOnce, m_EmptyFiles.size());
+        for (size_t at = begin; at < end; ++at) {
+            const UInt32 index = m_EmptyFiles[at];
+            Failure failure;
+            if (m_Source->Read(thread, m_List, m_List[index], 0, nullptr, 0, &failure) != ZARVO_OK)
+                return Fail(failure, index);
+        }
+        m_EmptyFilesDone.fetch_add(end - begin, std::memory_order_relaxed);
+        if (m_IsAlone) LookIfDue();
+    }
 }
 
 void WriteRun::WorkOnBlocks(UInt32 thread) {
@@ -273,17 +310,6 @@ void WriteRun::WorkOnStream() {
     Failure failure = writer.GetFailure();
     if (failure.code == ZARVO_OK) SetFailed(result, &failure);
     Fail(failure, result == EncodeResult::kInputFailed ? writer.FailedEntry() : PlannedData::kNoEntry);
-}
-
-// No block holds anything of them, so nothing has told yet whether they can be read and are still empty.
-void WriteRun::CheckEmptyFiles() {
-    for (size_t index = 0; index < m_List.size() && !m_IsStoppedByCaller; ++index) {
-        const EntryList::Entry& entry = m_List[index];
-        if (entry.size != 0 || EntryList::IsFolder(entry)) continue;
-        Failure failure;
-        if (m_Source->Read(0, m_List, entry, 0, nullptr, 0, &failure) != ZARVO_OK) return Fail(failure, index);
-        LookIfDue();
-    }
 }
 
 // What comes before the data always takes the same room.

@@ -9,6 +9,8 @@
 // numbers, and are written to them by whichever thread finds that it is their turn. There are more slots than threads,
 // so that one slow block does not keep the others waiting.
 //
+// Before that, the threads share the check of the empty files, of which no block holds anything.
+//
 // One thread makes and runs it.
 #pragma once
 
@@ -52,15 +54,16 @@ private:
     void LookIfDue();
     void Look();
     zarvo_code ChooseThreads(UInt32* threads, Failure* failure) const;
+    [[nodiscard]] bool FindEmptyFiles();
     [[nodiscard]] bool PrepareSlots(UInt32 threads);
 
+    void CheckEmptyFiles(UInt32 thread);
     void WorkOnBlocks(UInt32 thread);
     Slot* TakeSlot();
     bool FillSlot(UInt32 thread, BlockEncoder* encoder, Slot* slot);
     bool Commit(Slot* slot);
     Slot* TakeNextFilled(Slot* written);
     void WorkOnStream();
-    void CheckEmptyFiles();
 
     UInt64 HeadSize() const;
     zarvo_code WriteFrame(Failure* failure); // all but the data
@@ -71,6 +74,7 @@ private:
 
     void Fail(const Failure& failure, size_t entry = PlannedData::kNoEntry);
     bool TellProgress(); // false: to be stopped
+    UInt64 CountDone(UInt64 position) const;
 
     const WritePlan& m_Plan;
     const EntryList& m_List;
@@ -78,7 +82,8 @@ private:
     const PlannedData m_Data;
     const zarvo_run_options m_Options;
     NewArchive* m_File = nullptr;
-    UInt64 m_DataPlace = 0; // in the archive
+    UInt64 m_DataPlace = 0;                                  // in the archive
+    dynamic_array<UInt32> m_EmptyFiles{kMemLabelFileSystem}; // indices, in order
     BlockRecords m_Records{kMemLabelFileSystem};
     size_t m_FailedEntry = PlannedData::kNoEntry;
     WorkerCount m_Workers;
@@ -97,5 +102,7 @@ private:
     bool m_IsStoppedByCaller = false;
 
     std::atomic<bool> m_IsStopped{false};
-    std::atomic<UInt64> m_BytesDone{0}; // for progress
+    std::atomic<size_t> m_NextEmptyFile{0};  // to be checked, of m_EmptyFiles
+    std::atomic<UInt64> m_EmptyFilesDone{0}; // for progress, and so are the bytes
+    std::atomic<UInt64> m_BytesDone{0};
 };

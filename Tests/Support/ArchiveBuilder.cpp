@@ -131,8 +131,6 @@ public:
     }
 
 private:
-    static UInt64 RoundUp(UInt64 value) { return (value + kHeaderAlignment - 1) / kHeaderAlignment * kHeaderAlignment; }
-
     // Header and section, or header, data and section. The older signature is counted with one byte more, or where its
     // flag is missing with one less: what follows then overwrites the last byte of the flags.
     void BuildBlockBased(Frame& frame) {
@@ -142,13 +140,14 @@ private:
         PutSection(section, m_Records, m_Description.directoryInSection ? &m_List : nullptr);
         const std::string stored = Compress(m_Description.sectionType, section.Bytes());
         const bool isAtEnd = m_Description.sectionAtEnd;
-        const UInt64 room = m_Description.sectionPadded && !isAtEnd ? RoundUp(stored.size()) : stored.size();
+        const UInt64 room =
+            m_Description.sectionPadded && !isAtEnd ? RoundUp(stored.size(), kHeaderAlignment) : stored.size();
 
         PatchedFields measured(m_Given);
         PutBlockBasedHeader(measured, m_Form, {});
         UInt64 headerSize = measured.Size();
         if (isWeb) headerSize = hasWebFlag ? headerSize + 1 : headerSize - 1;
-        if (m_Form.version >= 7) headerSize = RoundUp(headerSize);
+        if (m_Form.version >= 7) headerSize = RoundUp(headerSize, kHeaderAlignment);
 
         UInt32 flags = m_Description.sectionType;
         if (m_Description.directoryInSection) flags |= kArchiveDirectoryInBlocksInfo;
