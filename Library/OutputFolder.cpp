@@ -223,6 +223,7 @@ Standing LookAt(int folder, const char* name) {
     if (fstatat(folder, name, &status, AT_SYMLINK_NOFOLLOW) != 0) return standing;
     standing.isThere = true;
     standing.isFolder = S_ISDIR(status.st_mode);
+    standing.isSpecial = !standing.isFolder && !S_ISREG(status.st_mode) && !S_ISLNK(status.st_mode);
     standing.device = status.st_dev;
     standing.inode = status.st_ino;
     return standing;

@@ -110,6 +110,7 @@ int RenameToNew(int folder, const char* from, const char* to);
 struct Standing {
     bool isThere = false;
     bool isFolder = false;
+    bool isSpecial = false; // a device, pipe or socket
     dev_t device = 0;
     ino_t inode = 0;
 };

@@ -5,7 +5,6 @@
 zarvo_code Creation::Begin(const char* path, Failure* failure) {
     if (const zarvo_code code = m_Plan.ReadOptions(m_How, failure); code != ZARVO_OK) return code;
     const zarvo_code code = m_File.FindPlace(path, failure);
-    if (m_How.dry_run != 0) return ZARVO_OK; // nothing is written there
     return code == ZARVO_OK ? m_File.CheckPlace(m_How.force != 0, failure) : code;
 }
 
@@ -33,9 +32,8 @@ zarvo_code Creation::AddEntries(const EntryList& entries, Failure* failure) {
 
 zarvo_code Creation::Write(EntrySource* source, Failure* failure) {
     if (const zarvo_code code = Settle(failure); code != ZARVO_OK) return code;
-    if (m_How.dry_run == 0) {
-        if (const zarvo_code code = WriteFile(source, failure); code != ZARVO_OK) return code;
-    }
+    const zarvo_code code = m_How.dry_run != 0 ? m_File.CheckCanOpen(failure) : WriteFile(source, failure);
+    if (code != ZARVO_OK) return code;
     TellDone();
     return ZARVO_OK;
 }

@@ -50,8 +50,11 @@ zarvo_code NewArchive::CheckPlace(bool isReplacing, Failure* failure) const {
     const Standing standing = LookAt(m_Folder, m_Name.c_str());
     if (!standing.isThere) return ZARVO_OK;
     if (standing.isFolder) return failure->SetSystem(EISDIR);
-    return isReplacing ? ZARVO_OK : failure->SetSystem(EEXIST);
+    if (!isReplacing) return failure->SetSystem(EEXIST);
+    return standing.isSpecial ? failure->SetSystem(EEXIST, "a device, pipe or socket is not replaced") : ZARVO_OK;
 }
+
+zarvo_code NewArchive::CheckCanOpen(Failure* failure) const { return CheckCanMakeIn(m_Folder, failure); }
 
 // Makes the file, or removes one that a killed run has left; *isDone says which. A lock is on the file that it opened,
 // which another run may have finished or removed meanwhile.

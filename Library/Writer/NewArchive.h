@@ -26,8 +26,12 @@ public:
     // Whether a name in a folder is the archive's, or that of its unfinished file.
     bool IsPlace(const struct stat& folder, core::string_ref name) const;
 
-    // Whether the archive may be put in its place: EEXIST if something is there that is not to be replaced.
+    // Whether the archive may be put in its place: EEXIST if something is there that is not to be replaced, which
+    // devices, pipes and sockets never are.
     zarvo_code CheckPlace(bool isReplacing, Failure* failure) const;
+
+    // For dry runs: whether Open can make the file, as far as can be known without making it.
+    zarvo_code CheckCanOpen(Failure* failure) const;
 
     // Makes the file. *hasLeftover: whether it replaces one that a killed run has left.
     zarvo_code Open(bool isReplacing, bool* hasLeftover, Failure* failure);

@@ -524,8 +524,10 @@ typedef struct zarvo_create_options {
                             ZARVO_LAYOUT_RAW */
     const char* engine_version;  /* that the archive says it is for. Default: "5.x.x" */
     const char* engine_revision; /* Default: "7041.3.0b12" */
-    int32_t force;               /* 1: replace a file, or a link, that has the archive's name */
-    int32_t dry_run;             /* 1: nothing is written, and only folders are read */
+    int32_t force;   /* 1: replace a file, or a link, that has the archive's name. Devices, pipes and sockets
+                        are never replaced */
+    int32_t dry_run; /* 1: nothing is written, and only folders are read; what fails without it fails, too,
+                        as far as can be known without writing and without reading files */
 
     /* Called for each file or folder that is left out or fails, and if the run succeeds, at its end for each that was
      * put into the archive, in the archive's order. May be NULL. */

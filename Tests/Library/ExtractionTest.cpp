@@ -40,20 +40,6 @@ size_t CountThings(const std::string& folder) {
     return static_cast<size_t>(std::distance(begin(things), end(things)));
 }
 
-// While it is there, the superuser, who may do everything, is somebody else.
-class OrdinaryUser : private NonCopyable {
-public:
-    OrdinaryUser() : m_User(geteuid()) {
-        if (m_User == 0) {
-            EXPECT_EQ(0, seteuid(65'534));
-        }
-    }
-    ~OrdinaryUser() { EXPECT_EQ(0, seteuid(m_User)); }
-
-private:
-    const uid_t m_User;
-};
-
 // While it is there, the process may have so many descriptors open.
 class FewDescriptors : private NonCopyable {
 public:

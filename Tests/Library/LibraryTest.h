@@ -1,7 +1,8 @@
-// What the tests of the library share: archives in memory, and sources that count and fail.
+// What the tests of the library share: archives in memory, sources that count and fail, and a user without rights.
 #pragma once
 
 #include "Library/include/zarvo.hpp"
+#include "Runtime/Core/NonCopyable.h"
 
 #include <algorithm>
 #include <atomic>
@@ -9,7 +10,22 @@
 #include <gtest/gtest.h>
 #include <stdexcept>
 #include <string>
+#include <unistd.h>
 #include <vector>
+
+// While it is there, the superuser, who may do everything, is somebody else.
+class OrdinaryUser : private NonCopyable {
+public:
+    OrdinaryUser() : m_User(geteuid()) {
+        if (m_User == 0) {
+            EXPECT_EQ(0, seteuid(65'534));
+        }
+    }
+    ~OrdinaryUser() { EXPECT_EQ(0, seteuid(m_User)); }
+
+private:
+    const uid_t m_User;
+};
 
 inline std::span<const std::byte> BytesOf(const std::string& text) { return std::as_bytes(std::span(text)); }
 

@@ -95,6 +95,8 @@ TEST_F(ZarvoCreate, ListsWhatItWouldPack) {
     EXPECT_EQ((Heard{1, "a\nd/\nd/b\n", "zarvo: in/l: left out: a link\n"}),
               Create({"--dry-run", "-x", "d/empty", "a.zarvo", "in/"}));
     EXPECT_FALSE(fs::exists("a.zarvo"));
+    WriteFile("there", "old");
+    EXPECT_EQ((Heard{1, "", "zarvo: there: File exists\n"}), Create({"--dry-run", "there", "in"}));
 }
 
 TEST_F(ZarvoCreate, NamesWhatGoesWrong) {

@@ -1,0 +1,93 @@
+// Archives of entries from memory and callbacks.
+#include "Tests/Library/CreationTest.h"
+
+namespace {
+
+class Writer : public Creation {
+protected:
+    Made WriteAll(zarvo::writer& writer, zarvo::create_options how = {}) {
+        how.force = true;
+        return Report([&](const zarvo::run_options& run,
+                          const zarvo::create_options& form) { return writer.write(Archive(), run, form); },
+                      how, {.threads = 3});
+    }
+};
+
+TEST_F(Writer, MakesWhatAFolderOfTheSameFilesMakes) {
+    const std::string text = SampleText(150'000), noise = NoiseText(60'000);
+    Put("b/text", text);
+    Put("b-", noise);
+    fs::create_directory(In() + "/empty");
+    for (const Form& form : AllForms()) {
+        SCOPED_TRACE(form.name);
+        ASSERT_EQ(form.hasFolders ? 0 : 1, Create(m_Folder / "folder", In(), form.how).reports.size() != 0);
+        zarvo::writer writer;
+        EXPECT_FALSE(writer.add_folder("empty"));
+        EXPECT_FALSE(writer.add("b/text", std::make_unique<CountingSource>(text)));
+        EXPECT_FALSE(writer.add_folder("b"));
+        EXPECT_FALSE(writer.add("b-", BytesOf(noise)));
+        EXPECT_EQ(2u, WriteAll(writer, form.how).files);
+        EXPECT_EQ(true, ReadFile(m_Folder / "folder") == ReadFile(Archive()));
+        EXPECT_EQ(2u, WriteAll(writer, form.how).files); // once more
+        EXPECT_EQ(true, ReadFile(m_Folder / "folder") == ReadFile(Archive()));
+        fs::remove(m_Folder / "folder");
+    }
+}
+
+TEST_F(Writer, RefusesPathsThatWouldNotComeBack) {
+    zarvo::writer writer;
+    using namespace std::string_view_literals;
+    for (const std::string_view path :
+         {""sv, "/"sv, "/a"sv, "a/"sv, "a//b"sv, "./a"sv, "a/."sv, ".."sv, "a/../b"sv, "a\\b"sv, "a\0b"sv}) {
+        EXPECT_EQ(ZARVO_ERROR_REFUSED, writer.add(path, BytesOf("")).code()) << path;
+        EXPECT_EQ(ZARVO_ERROR_REFUSED, writer.add_folder(path).code()) << path;
+    }
+    EXPECT_EQ(Made{}, WriteAll(writer));
+}
+
+TEST_F(Writer, RefusesEntriesThatCannotBeTogether) {
+    const std::vector<const char*> kCases[] = {{"a", "b", "a"}, {"a", "a-", "a/b"}, {"x", "a/b/c/d", "a/b"}};
+    for (const std::vector<const char*>& paths : kCases) {
+        zarvo::writer writer;
+        for (const char* const path : paths)
+            EXPECT_FALSE(writer.add(path, BytesOf("")));
+        EXPECT_EQ(ZARVO_ERROR_REFUSED, WriteAll(writer).code) << paths[2];
+    }
+}
+
+TEST_F(Writer, NamesTheSourceThatFails) {
+    for (const bool isShort : {false, true}) {
+        zarvo::writer writer;
+        auto source = std::make_unique<CountingSource>(SampleText(300'000));
+        if (isShort)
+            source->claimedSize = 300'001;
+        else
+            source->failingRead = 2;
+        EXPECT_FALSE(writer.add("d/bad", std::move(source)));
+        EXPECT_FALSE(writer.add("good", BytesOf("x")));
+        EXPECT_EQ(isShort ? "d/bad failed: the source ends too early\n" : "d/bad failed: Connection timed out\n",
+                  WriteAll(writer).reports);
+        EXPECT_EQ(std::set<std::string>{}, Names());
+    }
+}
+
+TEST_F(Writer, ClosesItsSources) {
+    struct Closing final : zarvo::source {
+        explicit Closing(int* count) : closed(count) {}
+        ~Closing() override { ++*closed; }
+        int64_t read_at(std::span<std::byte>, uint64_t) override { return 0; }
+        int64_t size() override { return 0; }
+        int* closed;
+    };
+    int closed = 0;
+    {
+        zarvo::writer writer;
+        EXPECT_FALSE(writer.add("a", std::make_unique<Closing>(&closed)));
+        EXPECT_EQ(0, closed);
+        EXPECT_TRUE(writer.add("..", std::make_unique<Closing>(&closed)));
+        EXPECT_EQ(1, closed);
+    }
+    EXPECT_EQ(2, closed);
+}
+
+} // namespace
