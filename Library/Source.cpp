@@ -91,8 +91,12 @@ struct Stamp {
           modified(status.st_mtim),
           changed(status.st_ctim) {}
 
-    bool operator==(const Stamp& other) const {
-        return size == other.size && IsSame(modified, other.modified) && IsSame(changed, other.changed);
+    // Whether the file has kept its contents. The time of change tells also of writers that set the other one back. Of
+    // a file that was deleted or replaced it is the time of that, and nobody can open the file any more.
+    bool IsKept(const struct stat& status) const {
+        const Stamp now(status);
+        return size == now.size && IsSame(modified, now.modified) &&
+               (status.st_nlink == 0 || IsSame(changed, now.changed));
     }
     static bool IsSame(const timespec& a, const timespec& b) { return a.tv_sec == b.tv_sec && a.tv_nsec == b.tv_nsec; }
 
@@ -125,7 +129,7 @@ private:
     zarvo_code CheckUnchanged(Failure* failure) const override {
         struct stat status;
         if (fstat(m_Descriptor, &status) != 0) return failure->SetSystem(errno);
-        if (Stamp(status) == m_Stamp) return ZARVO_OK;
+        if (m_Stamp.IsKept(status)) return ZARVO_OK;
         return failure->Set(ZARVO_ERROR_CHANGED, "the archive's file has changed since it was opened");
     }
 

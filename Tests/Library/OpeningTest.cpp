@@ -130,6 +130,15 @@ TEST(Opening, ChangedFileIsAnErrorFromThenOn) {
     EXPECT_EQ((Delivered{"", ZARVO_ERROR_CHANGED}), Read(archive, 0, 0, 100));
 }
 
+TEST(Opening, ReplacedFileIsReadOn) {
+    const TemporaryFolder folder;
+    WriteFile(folder / "archive", SmallArchive());
+    zarvo::archive archive = *zarvo::archive::open(folder / "archive");
+    WriteFile(folder / "new", "another one");
+    ASSERT_EQ(0, rename((folder / "new").c_str(), (folder / "archive").c_str()));
+    EXPECT_EQ(Delivered{kText}, Read(archive, 0, 0, 100));
+}
+
 // Each read of the source fails once: opening or reading says so, and what is read afterwards is right.
 TEST(Opening, EachFailingReadIsAnError) {
     const std::string text = SampleText(50'000);
