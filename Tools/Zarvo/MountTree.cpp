@@ -1,46 +1,63 @@
 #include "Tools/Zarvo/MountTree.h"
 
 #include <algorithm>
+#include <vector>
+
+static bool HasLongName(const zarvo::entry& entry) {
+    if (entry.path().size() <= MountTree::kMaxName) return false;
+    const std::string path = zarvo::normalize_path(entry.path());
+    for (size_t from = 0; from < path.size();) {
+        const size_t end = std::min(path.find('/', from), path.size());
+        if (end - from > MountTree::kMaxName) return true;
+        from = end + 1;
+    }
+    return false;
+}
 
 zarvo::error MountTree::Build() {
     if (zarvo::result<uint64_t> root = m_Archive.find(""); !root) return std::move(root).error();
-    zarvo::run_options options;
-    options.threads = 1;
-    zarvo::extract_options how;
-    how.dry_run = true;
-    how.report = [&](const zarvo_report& report) {
-        if (report.code != ZARVO_ERROR_REFUSED) return;
-        ++m_Hidden;
-        if (m_Archive.entries()[report.index].problem() == ZARVO_PROBLEM_NONE) m_Replaced[report.index] = ZARVO_NO_ITEM;
-    };
-    zarvo::run_result result = m_Archive.extract("/", options, how);
-    if (result.error) return std::move(result.error);
+    const uint64_t count = zarvo_item_count(m_Archive.get());
+    std::vector<uint64_t> parents(count, ZARVO_ROOT);
+    for (uint64_t item = 0; item < count; ++item)
+        for (uint64_t child = m_Archive.item(item)->first_child; child != ZARVO_NO_ITEM;
+             child = m_Archive.item(child)->next_sibling)
+            parents[child] = item;
 
-    // An item is the last entry of its path. The one that is shown may come before it.
-    if (!m_Replaced.empty())
-        for (const zarvo::entry entry : m_Archive.entries()) {
-            if (entry.problem() != ZARVO_PROBLEM_NONE || m_Replaced.contains(entry.index())) continue;
-            zarvo::result<uint64_t> item = m_Archive.find(entry.path());
-            if (!item) return std::move(item).error();
-            if (const auto replaced = m_Replaced.find(*item); replaced != m_Replaced.end())
-                replaced->second = entry.index();
-        }
-    CountLongNames();
-    return {};
-}
-
-void MountTree::CountLongNames() {
+    // A path belongs to the entry that comes first: what it is, file or folder, it stays.
+    enum Kind : uint8_t { kNothing, kFile, kFolder };
+    std::vector<Kind> kinds(count, kNothing); // by item, from the entries so far
     for (const zarvo::entry entry : m_Archive.entries()) {
-        if (entry.path().size() <= kMaxName || entry.problem() != ZARVO_PROBLEM_NONE) continue;
-        const std::string path = zarvo::normalize_path(entry.path());
-        size_t longest = 0;
-        for (size_t from = 0; from < path.size();) {
-            const size_t end = std::min(path.find('/', from), path.size());
-            longest = std::max(longest, end - from);
-            from = end + 1;
+        if (entry.problem() != ZARVO_PROBLEM_NONE) {
+            ++m_Hidden;
+            continue;
         }
-        if (longest > kMaxName) ++m_Hidden;
+        zarvo::result<uint64_t> found = m_Archive.find(entry.path());
+        if (!found) return std::move(found).error();
+        const uint64_t item = *found;
+        // Of what is above it, only the innermost that is there already can be a file.
+        uint64_t folder = parents[item];
+        while (folder != ZARVO_ROOT && kinds[folder] == kNothing)
+            folder = parents[folder];
+        const Kind kind = entry.is_folder() ? kFolder : kFile;
+        const bool isClash =
+            (folder != ZARVO_ROOT && kinds[folder] == kFile) || (kinds[item] != kNothing && kinds[item] != kind);
+        if (isClash || HasLongName(entry)) ++m_Hidden;
+
+        // The item is the last entry of its path.
+        const bool isLast = item == entry.index();
+        if (isClash) {
+            if (isLast) m_Replaced.try_emplace(item, ZARVO_NO_ITEM);
+            continue;
+        }
+        if (isLast)
+            m_Replaced.erase(item);
+        else
+            m_Replaced[item] = entry.index();
+        kinds[item] = kind;
+        for (uint64_t above = parents[item]; above != folder; above = parents[above])
+            kinds[above] = kFolder;
     }
+    return {};
 }
 
 std::optional<MountTree::Node> MountTree::Get(uint64_t number) const {

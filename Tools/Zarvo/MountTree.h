@@ -55,7 +55,6 @@ private:
     std::string GetPath(uint64_t number) const;
     std::optional<Node> FindPath(std::string_view path) const;
     std::optional<Node> SkipHidden(uint64_t item) const;
-    void CountLongNames();
 
     zarvo::archive& m_Archive;
     uint64_t m_Hidden = 0;

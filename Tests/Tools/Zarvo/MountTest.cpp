@@ -143,6 +143,7 @@ TEST_F(ZarvoMount, ShowsWhatExtractionWrites) {
         "old lz4 a:c70000 d/b:c5000",
         // A file where a folder has to be, and the reverse: the first stays.
         "x:1 x/y:2 p/q:3 p:4 p/r:5 z:6 z| z:7 w| w:8 w/v:9 u:10 u|",
+        "a:1 a/b/c:2 a/b:3 h/i/j:4 h/i:5 h:6 h/i/k:7 a:8 h/i/j/l:9 m/n:10 m/n/o:11 m/n|",
     };
     for (const char* const words : kArchives) {
         MakeArchive("a.zarvo", Archive(words));
@@ -157,6 +158,12 @@ TEST_F(ZarvoMount, ShowsWhatExtractionWrites) {
         }
         fs::remove_all("out");
     }
+}
+
+TEST_F(ZarvoMount, ReadsNoFileBeforeSomebodyDoes) {
+    MakeArchive("a.zarvo", Archive("f:r4000000"));
+    const Mount mount({"zarvo", "mount", "-f", "a.zarvo", "m"}, "m");
+    EXPECT_LT(CountBytesRead(mount.Process()), 2'000'000u);
 }
 
 TEST_F(ZarvoMount, ShowsNamesThatTheKernelTakes) {
