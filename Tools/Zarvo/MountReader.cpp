@@ -14,7 +14,6 @@ size_t MountReader::FitThreads(const zarvo::archive& archive, size_t threads, ui
 
 MountReader::MountReader(zarvo::archive& archive, size_t threads, uint64_t maxBlockBytes)
     : m_Archive(archive),
-      m_Threads(threads),
       m_MaxBlockBytes(maxBlockBytes),
       m_BlockCount(archive.block_count()),
       m_DataSize(archive.info().data_size),
@@ -56,22 +55,6 @@ zarvo::read_result MountReader::Read(const zarvo::entry& entry, uint64_t offset,
         read.error = std::move(part.error);
     }
     return read;
-}
-
-void MountReader::DecodeAhead(const zarvo::entry& entry, uint64_t offset) {
-    // The block that comes next is what another thread will be asked for by now.
-    const uint64_t end = entry.offset() + entry.size();
-    if (m_Threads < 2 || end < entry.offset() || end > m_DataSize || offset >= entry.size()) return;
-    const uint64_t index = FindBlock(entry.offset() + offset) + m_Threads - 1;
-    if (index >= m_BlockCount) return;
-    const zarvo_block block = m_Archive.block(index);
-    constexpr uint32_t kMaxBlock = 1 << 20; // larger ones might push each other out of the library's cache
-    if (block.kind == ZARVO_KIND_NONE || block.size > kMaxBlock || IsStreamed(block, m_MaxBlockBytes) ||
-        block.position >= end)
-        return;
-    // A byte of the block takes all of it into the library's cache. Whoever needs it gets the error, if there is one.
-    std::byte first;
-    (void)m_Archive.read(entry.index(), block.position - entry.offset(), {&first, 1});
 }
 
 MountReader::Range MountReader::FindRange(const zarvo::entry& entry, uint64_t offset) const {

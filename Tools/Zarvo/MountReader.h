@@ -1,11 +1,11 @@
 // Reads files as a kernel asks for them: in requests of readahead's size or of a page, from several threads, and a bit
 // out of order.
 //
-// Blocks that are decoded whole are the library's business, which caches them; of a file that is read on and on, the
-// blocks ahead are decoded by threads that have nothing else to do. A large streamed block can only be decoded from
-// its start on, so it takes more: one thread decodes in a block at a time, from the nearest place where an earlier
-// request has ended, and what it decodes is kept for a while in pieces that are larger than the kernel's requests. Any
-// thread.
+// Blocks that are decoded whole are the library's business, which caches them. None is decoded before it is asked for:
+// of a file that is read on and on, the kernel asks for two at a time, and to decode a third made reading slower. A
+// large streamed block can only be decoded from its start on, so it takes more: one thread decodes in a block at a
+// time, from the nearest place where an earlier request has ended, and what it decodes is kept for a while in pieces
+// that are larger than the kernel's requests. Any thread.
 #pragma once
 
 #include <zarvo.hpp>
@@ -25,9 +25,6 @@ public:
 
     // Reads a range that lies inside a file into buffer. Fewer bytes only with an error.
     zarvo::read_result Read(const zarvo::entry& entry, uint64_t offset, std::span<std::byte> buffer);
-
-    // Decodes what a file that has been read up to offset will soon be asked for. Worth calling after a large read.
-    void DecodeAhead(const zarvo::entry& entry, uint64_t offset);
 
 private:
     // What is decoded of a file in a streamed block at a time: of every kPieceSize bytes of the block what is the
@@ -73,7 +70,6 @@ private:
     zarvo::error Decode(Lock& lock, Place& place, const zarvo::entry& entry, const Range& range);
 
     zarvo::archive& m_Archive;
-    const size_t m_Threads;
     const uint64_t m_MaxBlockBytes;
     const uint64_t m_BlockCount;
     const uint64_t m_DataSize;

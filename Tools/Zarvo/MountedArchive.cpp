@@ -203,8 +203,6 @@ void MountedArchive::Read(fuse_req_t request, uint64_t number, size_t size, uint
         return;
     }
     fuse_reply_buf(request, reinterpret_cast<const char*>(buffer.data()), size);
-    constexpr size_t kLarge = 65'536; // as readahead does where a file is read on and on
-    if (size >= kLarge) m_Reader->DecodeAhead(entry, offset + size);
 }
 
 void MountedArchive::SayOfRead(uint64_t entry, const zarvo::error& error) {
