@@ -74,7 +74,8 @@ void MountedArchive::OpenFile(fuse_req_t request, fuse_file_info* file, unsigned
 }
 
 bool MountedArchive::Open(unsigned* threads) {
-    m_Archive = m_Run.OpenArchive(m_Path, [this](std::string_view text) { Say(m_Path, text); });
+    const uint64_t maxBlockBytes = m_Run.GetMaxBlockBytes();
+    m_Archive = m_Run.OpenArchive(m_Path, maxBlockBytes, [this](std::string_view text) { Say(m_Path, text); });
     if (!m_Archive) return false;
     if (stat(m_Path.c_str(), &m_File) != 0) {
         Say(m_Path, strerror(errno));
@@ -87,7 +88,6 @@ bool MountedArchive::Open(unsigned* threads) {
     }
     if (const uint64_t hidden = m_Tree->CountHidden(); hidden != 0)
         Say(m_Path, MakeMessage("% entries can't be shown", {std::to_string(hidden)}));
-    const uint64_t maxBlockBytes = m_Run.GetMemory() / 2;
     *threads = static_cast<unsigned>(MountReader::FitThreads(*m_Archive, *threads, maxBlockBytes));
     m_Reader.emplace(*m_Archive, *threads, maxBlockBytes);
     return true;

@@ -9,22 +9,25 @@
 namespace {
 
 // What "--memory" is when it isn't given: half of the memory that programs may take without others being moved out.
-unsigned long long GetDefaultMemory() {
+uint64_t GetDefaultMemory() {
     std::ifstream file("/proc/meminfo");
     std::string name, unit;
-    for (unsigned long long kibibytes = 0; file >> name >> kibibytes;) {
+    for (uint64_t kibibytes = 0; file >> name >> kibibytes;) {
         if (name == "MemAvailable:") return kibibytes * 1'024 / 2;
         file.ignore(std::numeric_limits<std::streamsize>::max(), '\n');
     }
-    return 1ull << 30; // where there is no such file
+    return uint64_t{1} << 30; // where there is no such file
 }
 
 } // namespace
 
-unsigned long long Run::GetMemory() const {
+uint64_t Run::GetMemory() const {
     const std::string* const memory = arguments.Find(kMemory);
     return memory != nullptr ? *ParseSize(*memory) : GetDefaultMemory();
 }
+
+// A block in memory is held twice: as it is stored and as it is decoded.
+uint64_t Run::GetMaxBlockBytes() const { return std::max<uint64_t>(GetMemory() / 2, 1); }
 
 int RefuseUsage(Console& console, const Subcommand& subcommand, std::string_view complaint) {
     const std::string name(subcommand.name);
@@ -33,15 +36,14 @@ int RefuseUsage(Console& console, const Subcommand& subcommand, std::string_view
 }
 
 std::optional<zarvo::archive> Run::OpenArchive(const std::string& path) const {
-    return OpenArchive(path, [this, path](std::string_view text) { console.Say(path, text); });
+    return OpenArchive(path, GetMaxBlockBytes(), [this, path](std::string_view text) { console.Say(path, text); });
 }
 
-std::optional<zarvo::archive> Run::OpenArchive(const std::string& path,
+std::optional<zarvo::archive> Run::OpenArchive(const std::string& path, uint64_t maxBlockBytes,
                                                std::function<void(std::string_view text)> log) const {
     if (RefuseStream(path)) return std::nullopt;
     zarvo::open_options options;
-    // A block in memory is held twice: as it is stored and as it is decoded.
-    options.max_block_bytes = std::max(GetMemory() / 2, 1ull);
+    options.max_block_bytes = maxBlockBytes;
     options.log = std::move(log);
     zarvo::result<zarvo::archive> archive = zarvo::archive::open(path, std::move(options));
     if (!archive) {

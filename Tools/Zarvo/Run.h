@@ -26,8 +26,9 @@ struct Run {
     // reports meanwhile and later becomes messages.
     std::optional<zarvo::archive> OpenArchive(const std::string& path) const;
 
-    // The same, with a function that is called with what the library reports, on whatever thread it does.
-    std::optional<zarvo::archive> OpenArchive(const std::string& path,
+    // The same, with the size of the largest block that is decoded whole, and a function that is called with what the
+    // library reports, on whatever thread it does.
+    std::optional<zarvo::archive> OpenArchive(const std::string& path, uint64_t maxBlockBytes,
                                               std::function<void(std::string_view text)> log) const;
 
     // Whether an archive's path stands for a standard stream, which no archive can be; then there is a message.
@@ -46,8 +47,10 @@ struct Run {
     // A message on an entry of an archive, or on a pattern.
     void SayOfEntry(const std::string& archive, std::string_view entry, std::string_view text) const;
 
-    // How many bytes blocks may take.
-    unsigned long long GetMemory() const;
+    // How many bytes blocks may take, and how many the largest one may have. Where no option says so, it depends on
+    // what is free, and is another number each time.
+    uint64_t GetMemory() const;
+    uint64_t GetMaxBlockBytes() const;
 };
 
 constexpr int kAllDone = 0;
