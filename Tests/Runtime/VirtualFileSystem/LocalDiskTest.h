@@ -1,18 +1,29 @@
-// What tests of the local back ends share: a fresh folder, which is the file system's current directory, a POSIX back
-// end, records of results that print themselves, and a check that the test leaves no descriptor open.
+// What tests of the local back ends share: a fresh folder, which is the current directory of the process and of the
+// file system, the back end of this program, records of results that print themselves, and a check that the test leaves
+// no descriptor open.
 #pragma once
 
 #include "Runtime/VirtualFileSystem/LocalFileSystemPosix.h"
 #include "Runtime/VirtualFileSystem/VirtualFileSystem.h"
+#include "Tests/Support/ConsoleCapture.h"
 #include "Tests/Support/TemporaryFolder.h"
 
-#include <gtest/gtest.h>
-
+#include <algorithm>
 #include <cstdlib>
+#include <gtest/gtest.h>
 #include <sstream>
 #include <sys/stat.h>
-#include <sys/wait.h>
 #include <unistd.h>
+
+#ifdef VARNEX_WITH_OSX_BACK_END
+constexpr bool kIsMac = true;
+#else
+constexpr bool kIsMac = false;
+#endif
+
+constexpr int kFolder = kFileEntryIsDirectory;
+constexpr int kLink = kFileEntryIsSymLink;
+constexpr int kHidden = kFileEntryIsHidden;
 
 // The answer of an operation, and the error that it left in its entry.
 struct Outcome {
@@ -40,10 +51,22 @@ struct Listed {
 
 class LocalDiskTest : public testing::Test {
 protected:
-    LocalDiskTest() { GetFileSystem()->SetCurrentDirectory(folder.Path().c_str()); }
+    LocalDiskTest() { WorkIn(folder.Path(), folder.Path()); }
     ~LocalDiskTest() override {
-        GetFileSystem()->SetCurrentDirectory("");
+        EXPECT_EQ(0, seteuid(getuid()));
+        WorkIn("/", "");
         EXPECT_EQ(CountOpenDescriptors(), m_DescriptorsBefore);
+    }
+
+    static void WorkIn(const std::string& workingDirectory, const std::string& currentDirectory) {
+        ASSERT_EQ(0, chdir(workingDirectory.c_str()));
+        GetFileSystem()->SetCurrentDirectory(currentDirectory.c_str());
+    }
+
+    // Gives up root's rights, which ignore modes, until the test ends.
+    static void WorkAsAnyUser() {
+        ASSERT_EQ(0, chmod(".", 0777));
+        ASSERT_EQ(0, geteuid() == 0 ? seteuid(65534) : 0);
     }
 
     bool Open(FileEntryData& entry, FilePermission permission) {
@@ -51,6 +74,26 @@ protected:
     }
     FileSystemEntry Entry(const std::string& name) const {
         return FileSystemEntry((name[0] == '/' ? name : folder / name).c_str());
+    }
+
+    struct Listing {
+        bool answer;
+        std::vector<Listed> entries; // sorted by path
+        std::string printed;
+    };
+    Listing List(const std::string& path, UInt32 flags = kFileEnumerationAll) {
+        const ConsoleCapture console;
+        dynamic_block_array<FileEntryInfo, 32> out(kMemLabelFileList);
+        Listing listing;
+        listing.answer = local.Enumerate(path.c_str(), &out, true, &m_Counter, FileEnumerationFlag(flags));
+        for (size_t index = 0; index < out.size(); ++index) {
+            const bool isSizeTheDisks = !kIsMac && (out[index].flags & kFolder) != 0;
+            listing.entries.push_back({out[index].path, isSizeTheDisks ? 0 : out[index].size, out[index].flags});
+        }
+        std::sort(listing.entries.begin(), listing.entries.end(),
+                  [](const Listed& a, const Listed& b) { return a.path < b.path; });
+        listing.printed = console.Text();
+        return listing;
     }
 
     // Runs a shell script in the folder. Each of its commands must succeed.
@@ -68,20 +111,9 @@ protected:
     }
     bool IsThere(const std::string& name) const { return !Mode(name).empty(); }
 
-    // Whether function answers true in another process, which has no more rights than any user.
-    template <typename Function>
-    bool IsTrueForAnyUser(Function function) const {
-        Run("chmod 755 .");
-        const pid_t child = fork();
-        if (child == 0) {
-            if (geteuid() == 0 && (setgid(65534) != 0 || setuid(65534) != 0)) _exit(1);
-            _exit(function() ? 0 : 1);
-        }
-        int status = -1;
-        return waitpid(child, &status, 0) == child && status == 0;
-    }
-
     const size_t m_DescriptorsBefore = CountOpenDescriptors();
     const TemporaryFolder folder;
-    LocalFileSystemPosix local;
+    LocalFileSystemHandler& local = *static_cast<LocalFileSystemHandler*>(GetFileSystem()->GetHandlerForPath("/"));
+    UInt64 m_Sum = 0;
+    void* m_Counter = &m_Sum; // what a summing listing adds to
 };
