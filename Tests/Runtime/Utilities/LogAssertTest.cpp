@@ -200,23 +200,17 @@ TEST_F(LogHooks, TableAndModeChooseTheTraces) {
     }
 }
 
-TEST_F(LogHooks, NativeTraceDropsThePositionThatIsAskedFor) {
+TEST_F(LogHooks, NativeTraceIsATextInPlaceOfThePosition) {
     std::fill_n(gStackTraceLogType, kLogTypeCount, kStackTraceNative);
-    DebugStringToFile({.message = "text", .file = "file", .line = 12, .mode = kLogModeError});
-    EXPECT_EQ("file", s_Told.record.file);
-    EXPECT_EQ(12, s_Told.record.line);
-
-    DebugStringToFile(
-        {.message = "text", .file = "file", .line = 12, .mode = kLogModeError | kLogModeShowSourcePosition});
-    EXPECT_EQ("", s_Told.record.file);
-    EXPECT_EQ(0, s_Told.record.line);
-}
-
-TEST_F(LogHooks, NativeTraceIsATextThatSaysSo) {
-    std::fill_n(gStackTraceLogType, kLogTypeCount, kStackTraceNative);
-    DebugStringToFile({.message = "text", .mode = kLogModeAssert});
+    DebugStringToFileData data = {.message = "text", .file = "file", .line = 12, .mode = kLogModeAssert};
+    DebugStringToFile(data);
     EXPECT_EQ("Assertion failed: text\nStacktrace is not supported on this platform.\n\n", s_Told.clean);
     EXPECT_EQ("text\nStacktrace is not supported on this platform.\n\n", s_Told.printed);
+    EXPECT_EQ((Record{.message = "text", .file = "file", .line = 12, .mode = 2}), s_Told.record);
+
+    data.mode |= kLogModeShowSourcePosition;
+    DebugStringToFile(data);
+    EXPECT_EQ((Record{.message = "text", .file = "", .line = 0, .mode = data.mode}), s_Told.record);
 }
 
 TEST_F(LogHooks, TraceIsPrintedAsAParagraph) {
@@ -281,22 +275,24 @@ TEST_F(LogHooks, CleanHandlersAreCalledUnderTheLock) {
     EXPECT_FALSE(MutexInspector::IsLockedByCurrentThread(g_LogHandlerListMutex));
 }
 
-TEST_F(LogHooks, AssertionFillsTheRecord) {
-    EXPECT_EQ(1, AssertImplementation(7, "file", 12, 34, "text"));
-    EXPECT_EQ((Record{.message = "text", .file = "file", .line = 12, .column = 34, .mode = 2, .identifier = 7}),
-              s_Told.record);
-}
-
-TEST_F(LogHooks, ErrorFillsTheRecord) {
+TEST_F(LogHooks, EachReportFillsItsRecord) {
+    Record expected = {.message = "text", .file = "file", .line = 12, .mode = 1};
     ReportError("text", {"file", 12});
-    EXPECT_EQ((Record{.message = "text", .file = "file", .line = 12, .mode = 1}), s_Told.record);
+    EXPECT_EQ(expected, s_Told.record);
+
+    expected.mode = 2;
+    EXPECT_FALSE(Check(false, "text", {"file", 12}));
+    EXPECT_EQ(expected, s_Told.record);
+
+    expected.column = 34;
+    expected.identifier = 7;
+    EXPECT_EQ(1, AssertImplementation(7, "file", 12, 34, "text"));
+    EXPECT_EQ(expected, s_Told.record);
 }
 
-TEST_F(LogHooks, OnlyAFailedCheckIsReported) {
+TEST_F(LogHooks, ACheckThatHoldsIsNotReported) {
     EXPECT_TRUE(Check(true, "text"));
     EXPECT_EQ("", s_Told.order);
-    EXPECT_FALSE(Check(false, "text", {"file", 12}));
-    EXPECT_EQ((Record{.message = "text", .file = "file", .line = 12, .mode = 2}), s_Told.record);
 }
 
 TEST_F(LogHooks, FatalErrorEndsTheProcessAfterItsOutput) {
