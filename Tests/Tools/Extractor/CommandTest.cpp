@@ -88,23 +88,19 @@ TEST(Command, ExtractsWithDescriptorsClosed) {
     }
 }
 
-TEST(Command, ReportsAFileInTheOutputFoldersPlace) {
-    const TemporaryFolder folder;
-    WriteFile(folder / "a.zarvo_data", "file");
+TEST(Command, ReportsWhatStandsInTheirPlace) {
+    const TemporaryFolder whole, parts;
+    WriteFile(whole / "a.zarvo_data", "file");
     Expect({.archive = kThree,
             .messages = "folder: file:a folder:folder folder:b file:b/c",
             .output = ":file",
-            .folder = folder.Path()});
-}
-
-TEST(Command, ReportsFilesAndFoldersInEachOthersPlace) {
-    const TemporaryFolder folder;
-    fs::create_directories(folder / "a.zarvo_data/a");
-    WriteFile(folder / "a.zarvo_data/b", "file");
+            .folder = whole.Path()});
+    fs::create_directories(parts / "a.zarvo_data/a");
+    WriteFile(parts / "a.zarvo_data/b", "file");
     Expect({.archive = kThree,
             .messages = "file:a folder:b file:b/c",
             .output = "a| folder| b:file",
-            .folder = folder.Path()});
+            .folder = parts.Path()});
 }
 
 TEST(Command, ReportsAFullDisk) {
