@@ -113,18 +113,18 @@ TEST_F(LocalFileSystemPosixTest, PositionedTransfersMoveThePosition) {
 }
 
 TEST_F(LocalFileSystemPosixTest, AFailedTransferRecordsItsError) {
-    FileSystemEntry directory = Entry("."), full = Entry("/dev/full");
-    ASSERT_TRUE(Open(directory, kFilePermissionRead));
+    FileSystemEntry full = Entry("/dev/full"), directory = Entry(".");
     ASSERT_TRUE(Open(full, kFilePermissionWrite));
+    ASSERT_TRUE(Open(directory, kFilePermissionRead));
     const Outcome kFailed{false, kFileSystemErrorUnknown};
     char byte = 'X';
-    UInt64 readCount = 99, writtenCount = 99;
-    EXPECT_EQ(kFailed, (Outcome{local.Read(directory, 1, &byte, &readCount, kFileReadFlagsNone), directory.lastError}));
-    EXPECT_EQ(kFailed, (Outcome{local.Write(full, 1, &byte, &writtenCount), full.lastError}));
-    EXPECT_EQ(0u, readCount);
-    EXPECT_EQ(0u, writtenCount);
-    EXPECT_TRUE(local.Close(directory));
+    UInt64 written = 99, delivered = 99;
+    EXPECT_EQ(kFailed, (Outcome{local.Write(full, 1, &byte, &written), full.lastError}));
+    EXPECT_EQ(0u, written);
     EXPECT_EQ(kDone, (Outcome{local.Close(full), full.lastError})) << "forgets the error of before";
+    EXPECT_EQ(kFailed, (Outcome{local.Read(directory, 1, &byte, &delivered, kFileReadFlagsNone), directory.lastError}));
+    EXPECT_EQ(0u, delivered);
+    EXPECT_TRUE(local.Close(directory));
 }
 
 TEST_F(LocalFileSystemPosixTest, AFailedCloseRecordsItsError) {
