@@ -20,16 +20,26 @@ protected:
 };
 
 TEST_F(LocalFileSystemOSXTest, AQueryTellsTheFileFlag) {
+    constexpr UInt32 kStatus = kFileEntryQueryDirectory | kFileEntryQuerySize | kFileEntryQueryLastModified;
     Run("touch plain shy");
     EXPECT_EQ(0, chflags("shy", UF_HIDDEN));
-    for (const std::string name : {"plain", "shy", "none"}) {
+    struct {
+        const char* name;
+        UInt32 query, answer;
+        int flagsBefore, flags;
+    } const kCases[] = {
+        {"plain", kFileEntryQueryHidden, kFileEntryQueryHidden, kHidden, 0},
+        {"shy", kFileEntryQueryHidden, kFileEntryQueryHidden, 0, kHidden},
+        {"shy", kFileEntryQueryHidden | kFileEntryQuerySize, kFileEntryQueryHidden | kStatus, 0, kHidden},
+        {"none", kFileEntryQueryHidden, kFileEntryQueryNone, 0, 0},
+    };
+    for (const auto& c : kCases) {
+        SCOPED_TRACE(testing::Message() << c.name << ", query " << c.query);
         FileEntryInfo info;
-        info.flags = name == "plain" ? kHidden : 0;
-        EXPECT_EQ(name == "none" ? kFileEntryQueryNone : kFileEntryQueryHidden,
-                  mac.GetFileEntryInfo(Entry(name), info, kFileEntryQueryHidden))
-            << name;
-        EXPECT_EQ(name == "shy" ? kHidden : 0, info.flags) << name;
-        EXPECT_EQ(name == "shy", mac.IsHidden(Entry(name))) << name;
+        info.flags = static_cast<UInt8>(c.flagsBefore);
+        EXPECT_EQ(c.answer, mac.GetFileEntryInfo(Entry(c.name), info, FileEntryInfoQueryFlags(c.query)));
+        EXPECT_EQ(c.flags, info.flags);
+        EXPECT_EQ(c.flags != 0, mac.IsHidden(Entry(c.name)));
     }
 }
 
@@ -95,9 +105,21 @@ TEST_F(ListingFaultsTest, AnErrorIsPrintedAndEndsItsFolderAlone) {
         std::vector<Listed> entries;
         std::string printed;
     } kCases[] = {
-        {0, EIO, false, {}, "Error (Input/output error) occured whilst enumerating d\n"},
-        {0, EINTR, false, {}, "Error (Interrupted system call) occured whilst enumerating d\n"},
-        {4, EIO, true, OthersAnd(whole), "Error (Input/output error) occured whilst enumerating d/sub\n"},
+        {.recordsBefore = 0,
+         .error = EIO,
+         .answer = false,
+         .entries = {},
+         .printed = "Error (Input/output error) occured whilst enumerating d\n"},
+        {.recordsBefore = 0,
+         .error = EINTR,
+         .answer = false,
+         .entries = {},
+         .printed = "Error (Interrupted system call) occured whilst enumerating d\n"},
+        {.recordsBefore = 4,
+         .error = EIO,
+         .answer = true,
+         .entries = OthersAnd(whole),
+         .printed = "Error (Input/output error) occured whilst enumerating d/sub\n"},
     };
     for (const auto& c : kCases) {
         gStandinFaults = {.recordsBeforeListingError = c.recordsBefore, .listingError = c.error};
@@ -312,9 +334,8 @@ TEST_F(LocalFileSystemOSXTest, WhatTheTrashRefusesIsDeleted) {
 }
 
 TEST_F(LocalFileSystemOSXTest, ACopyTakesAFolderWhole) {
-    Run("mkdir -p from/sub/deeper from/$(printf '\\377\\376'); cd from; printf 12345 > file; touch sub/in $(printf "
-        "%0255d 0)");
-    Run("cd from; ln -s file link; ln -s none lost; ln -s . self; ln -s from ../way");
+    Run("mkdir -p from/sub/deeper from/$(printf '\\377\\376'); printf 12345 > from/file");
+    Run("cd from; touch sub/in $(printf %0255d 0); ln -s file link; ln -s none lost; ln -s . self; ln -s from ../way");
     const std::vector<Listed> entries = List("from").entries;
     EXPECT_EQ(9u, entries.size());
     FileSystemEntry way = Entry("way"), to = Entry("to");

@@ -54,18 +54,12 @@ TEST_F(LocalFileSystemPosixTest, OpenDoesWhatThePermissionSays) {
         EXPECT_EQ(c.use.canWrite, local.Write(entry, 1, "X", &count));
         EXPECT_EQ(c.use.canRead, ReadAt(entry, 0, 1) != "failed");
         EXPECT_TRUE(local.Close(entry));
+        EXPECT_EQ(nullptr, entry.handlerState);
+        EXPECT_EQ(c.use.error, entry.lastError); // a failed open's stays
         if (c.contents != nullptr) {
             EXPECT_EQ(c.contents, ReadFile(entry.path));
         }
     }
-}
-
-TEST_F(LocalFileSystemPosixTest, ClosingAFailedOpenKeepsItsError) {
-    FileSystemEntry entry = Entry("none");
-    EXPECT_FALSE(Open(entry, kFilePermissionRead));
-    EXPECT_TRUE(local.Close(entry));
-    EXPECT_EQ(nullptr, entry.handlerState);
-    EXPECT_EQ(kFileSystemErrorNotFound, entry.lastError);
 }
 
 TEST_F(LocalFileSystemPosixTest, SeeksFromEachOrigin) {
@@ -180,6 +174,16 @@ TEST_F(LocalFileSystemPosixTest, QuestionsFollowLinksOrNot) {
         EXPECT_EQ(c.isSymLink, local.IsSymLink(entry)) << c.name;
         EXPECT_EQ(c.isReadOnly, local.IsReadOnly(entry)) << c.name;
     }
+}
+
+TEST_F(LocalFileSystemPosixTest, SetLengthNeedsNoOpenFile) {
+    Run("printf data > file");
+    FileSystemEntry file = Entry("file"), none = Entry("none");
+    EXPECT_TRUE(local.SetLength(file, 3));
+    EXPECT_EQ("dat", ReadFile(file.path));
+    EXPECT_TRUE(local.SetLength(file, 4));
+    EXPECT_EQ(std::string("dat\0", 4), ReadFile(file.path));
+    EXPECT_FALSE(local.SetLength(none, 3));
 }
 
 TEST_F(LocalFileSystemPosixTest, CreateAsDirRecordsItsError) {

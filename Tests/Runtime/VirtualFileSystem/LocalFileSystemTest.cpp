@@ -67,7 +67,11 @@ TEST_F(LocalFileSystemTest, TargetResolvesEveryLink) {
     struct {
         const char *name, *target;
         bool isThere;
-    } const kCases[] = {{"first/./", "sub", true}, {"dangling", "nowhere", false}, {"none", "none", false}};
+    } const kCases[] = {
+        {.name = "first/./", .target = "sub", .isThere = true},
+        {.name = "dangling", .target = "nowhere", .isThere = false},
+        {.name = "none", .target = "none", .isThere = false},
+    };
     for (const auto& c : kCases) {
         FileSystemEntry target("/unchanged");
         const bool isResolved = c.isThere || kIsMac;
@@ -80,9 +84,8 @@ TEST_F(LocalFileSystemTest, AListingTellsKindsAndSizes) {
     // On a Mac, a link that leads to no folder has its own size, and nothing is marked as read-only.
     constexpr int kReadOnly = kIsMac ? 0 : kFileEntryIsReadOnly;
     const auto linkSize = [](size_t own, size_t targets) { return kIsMac ? own : targets; };
-    Run("mkdir -p d/sub; cd d; printf 12345 > sub/file; chmod 444 sub/file; printf 1 > $(printf '\\377x'); touch "
-        ".hidden");
-    Run("cd d; ln -s nowhere dangling; ln -s sub/file link; ln -s self self");
+    Run("mkdir -p d/sub; cd d; printf 12345 > sub/file; chmod 444 sub/file; printf 1 > $(printf '\\377x')");
+    Run("cd d; touch .hidden; ln -s nowhere dangling; ln -s sub/file link; ln -s self self");
     const std::vector<Listed> kExpected = {
         {.path = "d/.hidden", .flags = kHidden},
         {.path = "d/dangling", .size = linkSize(7, 0), .flags = kLink},
@@ -115,7 +118,7 @@ TEST_F(LocalFileSystemTest, AListingTellsTimes) {
 TEST_F(LocalFileSystemTest, AFolderIsListedBeforeItsContents) {
     Run("mkdir -p d/d/d");
     dynamic_block_array<FileEntryInfo, 32> list(kMemLabelFileList);
-    EXPECT_TRUE(local.Enumerate("d", &list, true, nullptr, kFileEnumerationAll));
+    EXPECT_TRUE(local.Enumerate("d/", &list, true, nullptr, kFileEnumerationAll));
     ASSERT_EQ(2u, list.size());
     EXPECT_STREQ("d/d", list[0].path);
     EXPECT_STREQ("d/d/d", list[1].path);
