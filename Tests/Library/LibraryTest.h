@@ -7,6 +7,7 @@
 #include <algorithm>
 #include <atomic>
 #include <cstring>
+#include <functional>
 #include <gtest/gtest.h>
 #include <stdexcept>
 #include <string>
@@ -99,11 +100,12 @@ struct DamagedMedium final : zarvo::source {
     const bool deliversBytesBefore;
 };
 
-// Bytes that are served by callbacks. The counts are the test's to read while no call is under way.
+// Bytes that are served by callbacks. The counts, and what the reads do, are the test's while no call is under way.
 struct CountingSource final : zarvo::source {
     explicit CountingSource(std::string served) : bytes(std::move(served)) {}
 
     int64_t read_at(std::span<std::byte> buffer, uint64_t offset) override {
+        if (beforeRead) beforeRead();
         if (++reads == failingRead) return -ETIMEDOUT;
         const size_t start = std::min<uint64_t>(offset, bytes.size());
         const size_t count = std::min({buffer.size(), bytes.size() - start, longestRead});
@@ -117,6 +119,7 @@ struct CountingSource final : zarvo::source {
     int64_t claimedSize = -1; // where not negative, instead of the true one
     int failingRead = 0;      // the read with this number, from 1 on, fails
     size_t longestRead = SIZE_MAX;
+    std::function<void()> beforeRead = {};
     std::atomic<int> reads = 0;
     std::atomic<uint64_t> bytesRead = 0;
 };

@@ -8,6 +8,7 @@
 #pragma once
 
 #include "Tests/Support/ArchiveBuilder.h"
+#include "Tests/Support/FolderTree.h"
 #include "Tests/Support/RunVarnex.h"
 #include "Tests/Support/TemporaryFolder.h"
 
@@ -111,29 +112,6 @@ inline ArchiveDescription Archive(const std::string& words, ArchiveDescription a
         if (name != word && name != "version" && name != "levels" && name != "chunk") archive.fields[name] = value;
     }
     return archive;
-}
-
-// Maps each path below a folder to what it is: a file's bytes (or Brief of them), a link's target, or kFolder for an
-// empty folder. Other folders are not listed.
-using FolderTree = std::map<std::string, std::string>;
-
-inline const std::string kFolder = "<folder>";
-
-// The bytes, or their number and a hash when there are many.
-inline std::string Brief(const std::string& bytes) {
-    if (bytes.size() < 100) return bytes;
-    return std::to_string(bytes.size()) + " bytes, " + std::to_string(std::hash<std::string>()(bytes));
-}
-
-inline FolderTree ReadFolderTree(const std::string& folder) {
-    FolderTree tree;
-    for (const auto& entry : fs::recursive_directory_iterator(folder)) {
-        const bool isLink = entry.is_symlink(), isFolder = entry.is_directory() && !isLink;
-        const std::string path = entry.path(), name = path.substr(folder.size() + 1);
-        if (!isFolder || fs::is_empty(path))
-            tree[name] = isLink ? fs::read_symlink(path).string() : isFolder ? kFolder : Brief(ReadFile(path));
-    }
-    return tree;
 }
 
 // The tree of an output folder that holds the entries. An empty path stands for the folder itself, which is listed too
