@@ -181,53 +181,46 @@ TEST(Opening, LyingSourcesAreAnswered) {
     oneByOne->longestRead = 1;
     zarvo::archive archive = *zarvo::archive::open(std::move(oneByOne));
     EXPECT_EQ(Delivered{kText}, Read(archive, 0, 0, 100));
-
-    zarvo_source liar = ZARVO_SOURCE_INIT;
-    liar.read_at = [](void*, void*, size_t size, uint64_t) { return static_cast<int64_t>(size) + 1; };
-    liar.get_size = [](void*, uint64_t* size) {
-        *size = 1'000;
-        return 0;
-    };
-    zarvo_archive* opened = nullptr;
-    EXPECT_EQ(ZARVO_ERROR_SYSTEM, zarvo_open_source(&liar, nullptr, &opened, nullptr));
 }
 
 TEST(Opening, WhateverACallbackAnswersIsAnError) {
-    static int s_Answer;
-    zarvo_source source = ZARVO_SOURCE_INIT;
-    source.read_at = [](void*, void*, size_t, uint64_t) { return int64_t{INT64_MIN}; };
-    source.get_size = [](void*, uint64_t* size) {
-        *size = UINT64_MAX;
-        return s_Answer;
+    struct Answers {
+        const char* what;
+        uint64_t size = 1'000;
+        int sizeAnswer = 0;
+        int64_t (*read)(size_t size) = [](size_t) { return INT64_MIN; };
+        int systemCode = EIO;
     };
-    const struct {
-        int answer;
-        int systemCode;
-    } cases[] = {{0, EIO}, {-ENOENT, ENOENT}, {1, EIO}, {INT32_MIN, EIO}};
-    for (const auto& row : cases) {
-        s_Answer = row.answer;
+    const Answers cases[] = {
+        {.what = "impossible size", .size = UINT64_MAX},
+        {.what = "an errno instead of the size", .sizeAnswer = -ENOENT, .systemCode = ENOENT},
+        {.what = "a positive number instead", .sizeAnswer = 1},
+        {.what = "a number that is no errno", .sizeAnswer = INT32_MIN},
+        {.what = "a number that is no errno, from a read"},
+        {.what = "a byte too many", .read = [](size_t size) { return static_cast<int64_t>(size) + 1; }},
+    };
+    for (Answers row : cases) {
+        zarvo_source source = ZARVO_SOURCE_INIT;
+        source.context = &row;
+        source.read_at = [](void* context, void*, size_t size, uint64_t) {
+            return static_cast<Answers*>(context)->read(size);
+        };
+        source.get_size = [](void* context, uint64_t* size) {
+            *size = static_cast<Answers*>(context)->size;
+            return static_cast<Answers*>(context)->sizeAnswer;
+        };
         zarvo_archive* opened = nullptr;
         zarvo_error* error = nullptr;
-        EXPECT_EQ(ZARVO_ERROR_SYSTEM, zarvo_open_source(&source, nullptr, &opened, &error)) << row.answer;
-        EXPECT_EQ(row.systemCode, zarvo_error_errno(error)) << row.answer;
+        EXPECT_EQ(ZARVO_ERROR_SYSTEM, zarvo_open_source(&source, nullptr, &opened, &error)) << row.what;
+        EXPECT_EQ(row.systemCode, zarvo_error_errno(error)) << row.what;
         zarvo_error_free(error);
     }
 }
 
 TEST(Opening, ExceptionOfACallbackComesOutOfTheCall) {
-    struct Throwing final : zarvo::source {
-        [[noreturn]] int64_t read_at(std::span<std::byte>, uint64_t) override {
-            throw std::runtime_error("from the source");
-        }
-        int64_t size() override { return 1'000; }
-    };
-    std::string caught;
-    try {
-        (void)zarvo::archive::open(std::make_unique<Throwing>());
-    } catch (const std::runtime_error& thrown) {
-        caught = thrown.what();
-    }
-    EXPECT_EQ("from the source", caught);
+    auto source = std::make_unique<CountingSource>(SmallArchive());
+    source->beforeRead = [] { throw std::runtime_error("from the source"); };
+    EXPECT_THROW((void)zarvo::archive::open(std::move(source)), std::runtime_error);
 }
 
 TEST(Opening, DescriptorsAreClosedOnEveryWayOut) {

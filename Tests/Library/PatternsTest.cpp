@@ -106,18 +106,6 @@ TEST(Patterns, GlobMatchesTheStoredTextToo) {
     });
 }
 
-TEST(Patterns, TellWhichOfThemWereUsed) {
-    zarvo::patterns patterns;
-    for (const char* pattern : {"a", "/a", "*.txt", "b", "?.txt", "**"})
-        EXPECT_EQ(std::string_view(""), patterns.add(pattern).text());
-    EXPECT_EQ(true, patterns.match("a"));
-    EXPECT_EQ(true, patterns.match("x.txt"));
-    std::vector<bool> used;
-    for (size_t index = 0; index < 7; ++index)
-        used.push_back(patterns.is_used(index));
-    EXPECT_EQ((std::vector<bool>{true, true, true, false, true, true, false}), used);
-}
-
 // Ten thousand patterns share one table, which grows as they are added.
 TEST(Patterns, FindEachOfManyLiterals) {
     zarvo::patterns patterns;

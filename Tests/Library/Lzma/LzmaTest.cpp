@@ -159,33 +159,6 @@ TEST(LzmaBlock, RefusedMemoryIsNotDamage) {
     EXPECT_EQ(enough.held, 0);
 }
 
-TEST(LzmaStream, PiecesOfAnySizeYieldTheWhole) {
-    const std::string plain = MakeLongText();
-    const std::string stored = CompressLzma(plain, {.endMark = true});
-    for (const History history : {kHistoryOwn, kHistoryInOutput}) {
-        for (const auto& [inputPiece, roomPiece] :
-             {std::pair<size_t, size_t>(1, 1), {1, 70'000}, {7, 300}, {4'096, 13}}) {
-            CountingMemory memory;
-            Stream stream(memory);
-            ASSERT_EQ(stream.Start(stored.data(), history), kRoomFilled);
-            std::string output(plain.size(), '\0');
-            size_t consumed = kPropertiesSize, produced = 0;
-            Answer answer = {};
-            for (size_t steps = 0; answer.result != kEnded && steps < 2 * stored.size() + plain.size(); ++steps) {
-                const size_t size = std::min(inputPiece, stored.size() - consumed);
-                const size_t room = std::min(roomPiece, plain.size() - produced);
-                answer = stream.Decode(stored.data() + consumed, size, output.data() + produced, room,
-                                       produced == plain.size() ? kFinishHere : kFinishAny);
-                consumed += answer.consumed;
-                produced += answer.produced;
-            }
-            EXPECT_EQ(answer.result, kEnded) << inputPiece << " into " << roomPiece;
-            EXPECT_EQ(consumed, stored.size());
-            EXPECT_TRUE(output == plain) << inputPiece << " into " << roomPiece; // too long to print
-        }
-    }
-}
-
 TEST(LzmaStream, KnownSizeIsHeldByFinish) {
     struct Row {
         const char* name;
