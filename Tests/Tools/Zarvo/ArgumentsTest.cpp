@@ -96,4 +96,18 @@ TEST_F(ZarvoArguments, HelpAndVersionArePrintedWithoutAnArchive) {
     EXPECT_EQ((Heard{0, "zarvo " VARNEX_VERSION "\n", ""}), Zarvo({"--version"}));
 }
 
+TEST_F(ZarvoArguments, MemoryLimitsTheBlocksOfEachSubcommand) {
+    MakeArchive("a.zarvo", Archive("lz4 chunk=4096 a:c4096 b:x"));
+    const std::string refusal = "zarvo: a.zarvo: a: block 0 of 4096 bytes is too large to be held in memory\n";
+    const struct {
+        std::vector<std::string> arguments;
+        std::string output;
+    } kCases[] = {
+        {.arguments = {"cat", "--memory=2K", "a.zarvo", "a", "b"}, .output = "x"},
+        {.arguments = {"extract", "-qv", "--memory=2K", "a.zarvo"}, .output = "b\n"},
+    };
+    for (const auto& [arguments, output] : kCases)
+        EXPECT_EQ((Heard{1, output, refusal}), Zarvo(arguments)) << arguments[0];
+}
+
 } // namespace

@@ -16,20 +16,15 @@ protected:
 };
 
 TEST_F(ZarvoTestCommand, IsSilentOfAWholeArchive) {
-    for (const char* const form : {"lz4 section chunk=1000", "lzma streamed", "web6", "web", "raw", "old"}) {
-        MakeArchive("a.zarvo", Archive(std::string(form) + " a:c70000 b: d|"));
-        EXPECT_EQ((Heard{0, "", ""}), Zarvo({"test", "a.zarvo"})) << form;
-    }
+    MakeArchive("a.zarvo", Archive("lz4 chunk=1000 a:c70000 b: d|"));
+    EXPECT_EQ((Heard{0, "", ""}), Zarvo({"test", "a.zarvo"}));
 }
 
 TEST_F(ZarvoTestCommand, PrintsDamagedFilesAndSaysDamagedBlocks) {
     MakeDamagedArchive("a.zarvo");
-    for (const char* const threads : {"1", "2", "8"})
-        EXPECT_EQ((Heard{1, "bad\nworse\xFF\n", "zarvo: a.zarvo: block 1 is damaged\n"}),
-                  Zarvo({"test", "-j", threads, "a.zarvo"}))
-            << threads;
-    EXPECT_EQ((Heard{1, std::string("bad\0worse\xFF\0", 11), "zarvo: a.zarvo: block 1 is damaged\n"}),
-              Zarvo({"test", "-0", "a.zarvo"}));
+    const std::string said = "zarvo: a.zarvo: block 1 is damaged\n";
+    EXPECT_EQ((Heard{1, "bad\nworse\xFF\n", said}), Zarvo({"test", "a.zarvo"}));
+    EXPECT_EQ((Heard{1, std::string("bad\0worse\xFF\0", 11), said}), Zarvo({"test", "-0", "a.zarvo"}));
 }
 
 TEST_F(ZarvoTestCommand, SaysDamagedBlocksThatNoFileUses) {

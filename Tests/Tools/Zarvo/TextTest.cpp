@@ -1,6 +1,7 @@
 #include "Tools/Zarvo/Text.h"
 
 #include "Tools/Zarvo/Arguments.h"
+#include "Tools/Zarvo/Progress.h"
 
 #include <gtest/gtest.h>
 #include <nlohmann/json.hpp>
@@ -64,6 +65,47 @@ TEST(ZarvoText, SizesHaveUnitsOf1024) {
     for (const char* const text :
          {"", "0", "K", "1KB", "1k", "-1", "+1", " 1", "1.5M", "17179869184G", "18446744073709551616"})
         EXPECT_EQ(std::nullopt, ParseSize(text)) << text;
+}
+
+TEST(ZarvoText, DescribesAnyProgress) {
+    const struct {
+        const char* what;
+        Amount done = {}, total = {};
+        double seconds;
+        const char* text;
+    } kCases[] = {
+        {.what = "in the middle",
+         .done = {.bytes = 512, .files = 1},
+         .total = {.bytes = 2'048, .files = 4},
+         .seconds = 2,
+         .text = " 25%  512 bytes of 2.0 KiB, 1 of 4 files, 256 bytes/s, 0:06 left"},
+        {.what = "at the start",
+         .total = {.files = 1},
+         .seconds = 0,
+         .text = "  0%  0 bytes of 0 bytes, 0 of 1 files, 0 bytes/s, ? left"},
+        {.what = "hardly begun",
+         .done = {.bytes = 1},
+         .total = {.bytes = UINT64_MAX, .files = 1},
+         .seconds = 10,
+         .text = "  0%  1 bytes of 16.0 EiB, 0 of 1 files, 0 bytes/s, ? left"},
+        {.what = "of a run that counts no files",
+         .done = {.bytes = 1 << 20},
+         .total = {.bytes = 2 << 20},
+         .seconds = 1,
+         .text = " 50%  1.0 MiB of 2.0 MiB, 1.0 MiB/s, 0:01 left"},
+        {.what = "of empty files",
+         .done = {.files = 1'000},
+         .total = {.files = 4'000},
+         .seconds = 10,
+         .text = " 25%  0 bytes of 0 bytes, 1000 of 4000 files, 0 bytes/s, 0:30 left"},
+        {.what = "of files that cost more than their bytes",
+         .done = {.bytes = 9, .files = 1},
+         .total = {.bytes = 9, .files = 11},
+         .seconds = 9,
+         .text = "100%  9 bytes of 9 bytes, 1 of 11 files, 1 bytes/s, 1:30 left"},
+    };
+    for (const auto& row : kCases)
+        EXPECT_EQ(row.text, DescribeProgress(row.done, row.total, row.seconds)) << row.what;
 }
 
 } // namespace
