@@ -1,8 +1,13 @@
-"""Makes block-based archives for the tests."""
+"""What the tests share: block-based archives, made here, in a folder for each test."""
 
 import lzma
+import pathlib
 import random
 import struct
+import tempfile
+import unittest
+
+import zarvo
 
 STORED, LZMA, UNKNOWN = 0, 1, 9
 
@@ -46,3 +51,33 @@ def make_text(size: int, seed: int = 1) -> bytes:
     while len(text) < size:
         text += " ".join(chosen.choices(words, k=9)).encode() + b"\n"
     return bytes(text[:size])
+
+
+TEXT = make_text(300_000)
+
+TREE = [
+    ("readme.txt", b"first\n"),
+    ("tables", FOLDER),
+    ("tables/one.csv", TEXT),
+    ("road/of/one.txt", b"\xef\xbb\xbfon the way\r\n"),
+    ("empty", b""),
+]
+
+
+class ArchiveTest(unittest.TestCase):
+    """Has a folder, and archives in it."""
+
+    def setUp(self):
+        folder = tempfile.TemporaryDirectory()
+        self.addCleanup(folder.cleanup)
+        self.folder = pathlib.Path(folder.name)
+
+    def write(self, entries, **form):
+        path = self.folder / "a.zarvo"
+        path.write_bytes(build(entries, **form))
+        return path
+
+    def open(self, entries, **form):
+        archive = zarvo.open(self.write(entries, **form))
+        self.addCleanup(archive.close)
+        return archive

@@ -7,20 +7,20 @@ import pathlib
 import shutil
 import subprocess
 import sys
-import tempfile
 import unittest
+
+from archives import ArchiveTest
 
 ROOT = pathlib.Path(__file__).parents[2]
 # What the packages that the example imports leave behind is not ours.
 ENVIRONMENT = {**os.environ, "ASAN_OPTIONS": os.environ.get("ASAN_OPTIONS", "") + ":detect_leaks=0"}
 
 
-class Documents(unittest.TestCase):
+class Documents(ArchiveTest):
     def setUp(self):
-        folder = tempfile.TemporaryDirectory()
-        self.addCleanup(folder.cleanup)
+        super().setUp()
         self.addCleanup(os.chdir, os.getcwd())
-        os.chdir(folder.name)
+        os.chdir(self.folder)
         shutil.copy(ROOT / "Samples" / "road.zarvo", "game.zarvo")
 
     def test_show_sessions_as_they_are(self):

@@ -3,10 +3,8 @@
 import importlib.metadata
 import io
 import os
-import pathlib
 import pickle
 import struct
-import tempfile
 import unittest
 import zipfile
 
@@ -14,9 +12,7 @@ import fsspec
 from fsspec.spec import AbstractBufferedFile
 
 import zarvo
-from archives import FOLDER, LZMA, build, make_text
-
-TEXT = make_text(300_000)
+from archives import FOLDER, LZMA, TEXT, ArchiveTest, build, make_text
 
 TREE = [
     ("readme.txt", b"first\n"),
@@ -52,12 +48,10 @@ class Elsewhere(fsspec.AbstractFileSystem):
 fsspec.register_implementation("elsewhere", Elsewhere, clobber=True)
 
 
-class FileSystem(unittest.TestCase):
+class FileSystem(ArchiveTest):
     def setUp(self):
-        folder = tempfile.TemporaryDirectory()
-        self.addCleanup(folder.cleanup)
-        self.path = pathlib.Path(folder.name) / "a.zarvo"
-        self.path.write_bytes(build(TREE, kind=LZMA))
+        super().setUp()
+        self.path = self.write(TREE, kind=LZMA)
         self.fs = fsspec.filesystem("zarvo", fo=str(self.path))
 
     def test_is_found_by_its_protocol(self):

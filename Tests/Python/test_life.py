@@ -8,14 +8,13 @@ import pathlib
 import signal
 import subprocess
 import sys
-import tempfile
 import threading
 import time
 import unittest
 from concurrent.futures import ThreadPoolExecutor
 
 import zarvo
-from archives import LZMA, build, make_text
+from archives import LZMA, ArchiveTest, build, make_text
 
 TEXTS = {f"{number}.txt": make_text(40_000, number) for number in range(20)}
 
@@ -44,13 +43,10 @@ class BlockingFile(io.BytesIO):
         return super().read(size)
 
 
-class LifeTest(unittest.TestCase):
+class LifeTest(ArchiveTest):
     def setUp(self):
-        folder = tempfile.TemporaryDirectory()
-        self.addCleanup(folder.cleanup)
-        self.folder = pathlib.Path(folder.name)
-        self.path = self.folder / "a.zarvo"
-        self.path.write_bytes(build(TEXTS.items(), kind=LZMA))
+        super().setUp()
+        self.path = self.write(TEXTS.items(), kind=LZMA)
 
 
 class Objects(LifeTest):
