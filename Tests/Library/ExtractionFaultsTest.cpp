@@ -2,7 +2,6 @@
 #include "Tests/Library/ExtractionTest.h"
 #include "Tests/Library/SystemFaults.h"
 
-#include <csignal>
 #include <deque>
 #include <sys/resource.h>
 #include <unistd.h>
@@ -27,15 +26,18 @@ private:
 
 } // namespace
 
-// Very many files that begin before a unit's end and end after it, with few descriptors: all are written, one decoding
-// is enough, and a run that fails leaves nothing behind.
+// Very many files, deep down, that begin before a unit's end and end after it, with few descriptors: all are written,
+// one decoding is enough, and a run that fails leaves nothing behind.
 TEST(ExtractionFaults, AnyNumberOfFilesMayShareTheirData) {
     constexpr uint64_t kFiles = 500, kFrom = 1'040'000, kSize = 30'000;
     const std::string text = SampleText(3'000'000);
     ArchiveDescription description{.entries = {{.path = "all", .bytes = text}}, .type = kCompressionLz4};
     FolderTree expected = {{"all", Brief(text)}};
     for (uint64_t file = 0; file < kFiles; ++file) {
-        const std::string path = "f" + std::to_string(file % 20) + "/" + std::to_string(file);
+        std::string path;
+        for (uint64_t level = 0; level < 12; ++level)
+            path += std::to_string(file % (level + 2)) + "/";
+        path += std::to_string(file);
         const std::string node = "node[" + std::to_string(description.entries.size()) + "].";
         description.entries.push_back({.path = path});
         description.fields[node + "offset"] = kFrom + file;
@@ -53,9 +55,9 @@ TEST(ExtractionFaults, AnyNumberOfFilesMayShareTheirData) {
         zarvo::run_result result, failed;
         {
             const FewDescriptors few(descriptors);
-            result = archive.extract(folder / "out", {.threads = 2});
+            result = archive.extract(folder / "out", {.threads = 8});
             const SystemFault fault({.call = "pwrite", .number = 400, .error = ENOSPC});
-            failed = archive.extract(folder / "failed", {.threads = 2});
+            failed = archive.extract(folder / "failed", {.threads = 8});
         }
         EXPECT_EQ(kFiles + 1, result.summary.files);
         EXPECT_LE(counts.bytesRead.load(), 2 * archive.info().stored_size);
@@ -107,22 +109,6 @@ TEST(ExtractionFaults, FullDiskFailsAllThatIsNotDone) {
                        .files = 1,
                        .failures = 3}),
               outcome);
-}
-
-// A file that is larger than it may be is an entry's failure, and leaves nothing behind.
-TEST(ExtractionFaults, FileTooLargeForTheLimitLeavesNothing) {
-    const TemporaryFolder folder;
-    const std::string text = SampleText(3'000'000);
-    const std::string bytes = Archive(
-        {{.path = "a", .bytes = text.substr(0, 1'000)}, {.path = "b", .bytes = text}, {.path = "c", .bytes = "1"}});
-    signal(SIGXFSZ, SIG_IGN);
-    const rlimit limited = {2'000'000, RLIM_INFINITY};
-    ASSERT_EQ(0, setrlimit(RLIMIT_FSIZE, &limited));
-    const Outcome outcome = Extract(bytes, folder / "out");
-    const rlimit unlimited = {RLIM_INFINITY, RLIM_INFINITY};
-    ASSERT_EQ(0, setrlimit(RLIMIT_FSIZE, &unlimited));
-    EXPECT_EQ((Outcome{.reports = "a\nb: File too large\nc\n", .files = 2, .failures = 1}), outcome);
-    EXPECT_EQ((FolderTree{{"a", Brief(text.substr(0, 1'000))}, {"c", "1"}}), ReadFolderTree(folder / "out"));
 }
 
 class FailingCalls : public testing::Test {
@@ -212,24 +198,4 @@ TEST(ExtractionFaults, TemporariesOfAKilledRunAreInNobodysWay) {
     WriteFile(folder / "a", "old");
     EXPECT_EQ((Outcome{.reports = "a\n", .files = 1}), Extract(Archive({{.path = "a", .bytes = "1"}}), folder.Path()));
     EXPECT_EQ("1", ReadFile(folder / "a"));
-}
-
-// Many threads, deep folders, and hardly a descriptor.
-TEST(ExtractionFaults, FewDescriptorsAreEnough) {
-    std::vector<ArchiveEntry> entries;
-    for (size_t number = 0; number < 60; ++number) {
-        std::string path;
-        for (size_t level = 0; level < 12; ++level)
-            path += std::to_string(number % (level + 2)) + "/";
-        entries.push_back({.path = path + std::to_string(number), .bytes = std::string(200'000 + number, 'x')});
-    }
-    const std::string bytes = Archive(entries, kCompressionNone);
-    const TemporaryFolder folder;
-    Outcome outcome;
-    {
-        const FewDescriptors few(16);
-        outcome = Extract(bytes, folder / "out", {}, {.threads = 8});
-    }
-    EXPECT_EQ(0u, outcome.failures) << outcome;
-    EXPECT_EQ(entries.size(), outcome.files);
 }

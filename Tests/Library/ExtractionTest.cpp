@@ -61,33 +61,38 @@ TEST(Extraction, PathsAreRefusedSettledAndStripped) {
                                        {.path = "d/e", .bytes = "6"},
                                        {.path = ".", .bytes = "7"},
                                        {.path = "f/", .bytes = "8"}});
-    {
+    const struct {
+        uint64_t strip;
+        Outcome outcome;
+        FolderTree tree;
+    } cases[] = {
+        {.strip = 0,
+         .outcome = {.reports = "../x: the path has a component \"..\"\n"
+                                "a\\b\n"
+                                "a/b/c: an entry before it in the archive has its place\n"
+                                "d\n"
+                                "d: an entry before it in the archive has its place\n"
+                                "d/e\n"
+                                ".: the path is empty\n"
+                                "f/: the path of a file ends with a separator\n",
+                     .files = 2,
+                     .failures = 5},
+         .tree = {{"a/b", "3"}, {"d/e", "6"}}},
+        {.strip = 1,
+         .outcome = {.reports = "../x: the path has a component \"..\"\n"
+                                "a\\b\n"
+                                "a/b/c: an entry before it in the archive has its place\n"
+                                "d/e\n"
+                                ".: the path is empty\n"
+                                "f/: the path of a file ends with a separator\n",
+                     .files = 2,
+                     .failures = 4},
+         .tree = {{"b", "3"}, {"e", "6"}}},
+    };
+    for (const auto& row : cases) {
         const TemporaryFolder folder;
-        EXPECT_EQ((Outcome{.reports = "../x: the path has a component \"..\"\n"
-                                      "a\\b\n"
-                                      "a/b/c: an entry before it in the archive has its place\n"
-                                      "d\n"
-                                      "d: an entry before it in the archive has its place\n"
-                                      "d/e\n"
-                                      ".: the path is empty\n"
-                                      "f/: the path of a file ends with a separator\n",
-                           .files = 2,
-                           .failures = 5}),
-                  Extract(bytes, folder / "out"));
-        EXPECT_EQ((FolderTree{{"a/b", "3"}, {"d/e", "6"}}), ReadFolderTree(folder / "out"));
-    }
-    {
-        const TemporaryFolder folder;
-        EXPECT_EQ((Outcome{.reports = "../x: the path has a component \"..\"\n"
-                                      "a\\b\n"
-                                      "a/b/c: an entry before it in the archive has its place\n"
-                                      "d/e\n"
-                                      ".: the path is empty\n"
-                                      "f/: the path of a file ends with a separator\n",
-                           .files = 2,
-                           .failures = 4}),
-                  Extract(bytes, folder / "out", {.strip = 1}));
-        EXPECT_EQ((FolderTree{{"b", "3"}, {"e", "6"}}), ReadFolderTree(folder / "out"));
+        EXPECT_EQ(row.outcome, Extract(bytes, folder / "out", {.strip = row.strip})) << "strip " << row.strip;
+        EXPECT_EQ(row.tree, ReadFolderTree(folder / "out")) << "strip " << row.strip;
     }
 }
 

@@ -1,6 +1,7 @@
 // What programs that are already compiled rely on: names, sizes and places.
 #include "Tests/Library/LibraryTest.h"
 #include "Tests/Support/ArchiveBuilder.h"
+#include "Tests/Support/RunVarnex.h"
 #include "Tests/Support/TemporaryFolder.h"
 
 #include <malloc.h>
@@ -24,15 +25,6 @@ std::set<std::string> NamesIn(const std::string& text, const char* pattern) {
     return found;
 }
 
-std::string OutputOf(const std::string& command) {
-    FILE* const pipe = popen(command.c_str(), "r");
-    std::string output;
-    for (int byte; pipe != nullptr && (byte = getc(pipe)) != EOF;)
-        output += static_cast<char>(byte);
-    EXPECT_EQ(0, pclose(pipe)) << command;
-    return output;
-}
-
 } // namespace
 
 extern "C" int posix_memalign(void** pointer, size_t align, size_t size) {
@@ -46,7 +38,8 @@ extern "C" int posix_memalign(void** pointer, size_t align, size_t size) {
 
 TEST(Interface, LibraryExportsWhatTheHeaderDeclares) {
     const std::string header = ReadFile(VARNEX_SOURCE_DIR "/Library/include/zarvo.h");
-    const std::string symbols = OutputOf("nm -D --defined-only --format=posix " ZARVO_LIBRARY);
+    const auto [status, symbols] = RunProgram("/usr/bin/nm", {"-D", "--defined-only", "--format=posix", ZARVO_LIBRARY});
+    EXPECT_EQ(0, status);
     EXPECT_EQ(NamesIn(header, "ZARVO_API[^;(]*[ *](zarvo_\\w+)\\("), NamesIn(symbols, "(zarvo_\\w+)@?\\S* T"));
     EXPECT_EQ(std::set<std::string>{"ZARVO_0"}, NamesIn(symbols, "(?:^|\n)((?!zarvo_)\\w+)"));
 }

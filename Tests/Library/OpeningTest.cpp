@@ -167,17 +167,20 @@ TEST(Opening, EachFailingReadIsAnError) {
     }
 }
 
-// A source that lies gives errors or wrong bytes, and nothing worse: the sanitizers look on.
-TEST(Opening, LyingSourcesAreAnswered) {
+// The sanitizers look on.
+TEST(Opening, SourceThatLiesAboutItsSizeDoesNoHarm) {
     const std::string bytes = SmallArchive();
     for (const int64_t claimed : {INT64_MAX, int64_t{0}, int64_t{61}, static_cast<int64_t>(bytes.size()) - 1}) {
         auto source = std::make_unique<CountingSource>(bytes);
         source->claimedSize = claimed;
         zarvo::result<zarvo::archive> opened = zarvo::archive::open(std::move(source));
-        const size_t got = opened ? Read(*opened, 0, 0, 100).bytes.size() : 0;
-        EXPECT_LE(got, strlen(kText));
+        const Delivered got = opened ? Read(*opened, 0, 0, 100) : Delivered();
+        EXPECT_EQ(std::string_view(kText).substr(0, got.bytes.size()), got.bytes) << "claimed " << claimed;
     }
-    auto oneByOne = std::make_unique<CountingSource>(bytes);
+}
+
+TEST(Opening, ShortReadsOfASourceAreContinued) {
+    auto oneByOne = std::make_unique<CountingSource>(SmallArchive());
     oneByOne->longestRead = 1;
     zarvo::archive archive = *zarvo::archive::open(std::move(oneByOne));
     EXPECT_EQ(Delivered{kText}, Read(archive, 0, 0, 100));
