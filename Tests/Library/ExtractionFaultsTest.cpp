@@ -1,6 +1,7 @@
 // Extraction where the system refuses what it asks for: descriptors, room on the disk, single calls.
 #include "Tests/Library/ExtractionTest.h"
 #include "Tests/Library/SystemFaults.h"
+#include "Tests/Support/FolderTree.h"
 
 #include <deque>
 #include <sys/resource.h>

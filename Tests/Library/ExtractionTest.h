@@ -6,7 +6,6 @@
 
 #include "Tests/Library/LibraryTest.h"
 #include "Tests/Support/ArchiveBuilder.h"
-#include "Tests/Support/FolderTree.h"
 
 #include <random>
 

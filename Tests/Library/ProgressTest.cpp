@@ -1,6 +1,7 @@
 // What callbacks of runs are told, and how they stop a run.
 #include "Tests/Library/ExtractionTest.h"
 #include "Tests/Library/SystemFaults.h"
+#include "Tests/Support/FolderTree.h"
 
 #include <thread>
 

@@ -1,5 +1,6 @@
 // Runs over damaged data and over blocks that the memory can't hold, and what visits hand over.
 #include "Tests/Library/ExtractionTest.h"
+#include "Tests/Support/FolderTree.h"
 
 #include <map>
 #include <mutex>
