@@ -1,6 +1,5 @@
 // Where extraction puts files, and what becomes of those that are there.
 #include "Tests/Library/ExtractionTest.h"
-#include "Runtime/Core/NonCopyable.h"
 #include "Tests/Support/FolderTree.h"
 
 #include <fcntl.h>
