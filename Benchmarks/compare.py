@@ -48,7 +48,7 @@ def make_rows(build, kinds, peers):
 
 
 def make_bound(archives, kind):
-    block, directory = sizes_from_plan(f"{archives}/{kind}.zarvo.plan")
+    block, directory = sizes_from_plan(archives, kind)
     return Bound(kind, "8 MiB + 2 blocks + directory", 8 * MIB + 2 * block + directory)
 
 

@@ -22,6 +22,7 @@ KINDS = {
     "web": "ZarvoWeb",
     "raw": "ZarvoRaw",
 }
+WITH_COMPRESSED_DIRECTORY = {"lz4hc", "lzma", "streamed"}
 
 # The settings of PackFolder's encoder for 7-Zip: level 4 is the fast mode with 32 fast bytes. There is no filter for
 # machine code. Blocks are as large as ours: solid blocks of LZMA, which 7-Zip extracts in one thread, or the blocks of
@@ -165,10 +166,13 @@ def pack_all(build, tree, kinds, peers):
     return archives
 
 
-def sizes_from_plan(plan):
-    """The largest block, and the directory: 64 bytes per node, and paths of more than 31 bytes."""
-    block = directory = 0
-    with open(plan, errors="surrogateescape") as file:
+def sizes_from_plan(archives, kind):
+    """The largest block, and the directory: 64 bytes per node, and paths of more than 31 bytes.
+
+    A directory that is compressed is also held as it is stored, decompressed, when it is read.
+    """
+    block = directory = stored = 0
+    with open(f"{archives}/{kind}.zarvo.plan", errors="surrogateescape") as file:
         for line in file:
             words = line.rstrip("\n").split(" ", 4)
             if words[0] == "block":
@@ -176,4 +180,5 @@ def sizes_from_plan(plan):
             elif words[0] == "node":
                 path = len(words[4].encode(errors="surrogateescape"))
                 directory += 64 + (path + 1 if path > 31 else 0)
-    return block, directory
+                stored += 21 + path
+    return block, directory + (stored if kind in WITH_COMPRESSED_DIRECTORY else 0)

@@ -57,7 +57,7 @@ def make_rows(build, kinds):
 
 
 def make_bound(archives, kind):
-    block, directory = sizes_from_plan(f"{archives}/{kind}.zarvo.plan")
+    block, directory = sizes_from_plan(archives, kind)
     if kind in DICTIONARIES:
         return Bound(kind, "16 MiB + dictionary + directory", 16 * MIB + DICTIONARIES[kind] + directory)
     return Bound(kind, f"16 MiB + {THREADS} x 2 blocks + directory", 16 * MIB + THREADS * 2 * block + directory)
