@@ -12,14 +12,6 @@ constexpr UInt32 kMaxThreads = 1'024;
 constexpr UInt64 kSpareSlotBytes = 8'388'608; // of all threads together
 constexpr size_t kEmptyFilesAtOnce = 256;     // that a thread takes, so that others check those of other folders
 
-// An encoder fails for want of memory, or because the run is stopped.
-void SetFailed(EncodeResult result, Failure* failure) {
-    if (result == EncodeResult::kStopped)
-        (void)failure->Set(ZARVO_ERROR_STOPPED, "stopped");
-    else
-        (void)failure->SetMemory();
-}
-
 // What a block takes while it is worked on.
 UInt64 SlotBytes(const WritePlan& plan) {
     return plan.BlockSize() * (plan.BlockEncoding().type == kCompressionNone ? 1 : 2);
@@ -140,11 +132,13 @@ bool WriteRun::TellProgress() {
     return m_Options.progress(m_Options.context, &progress) == 0;
 }
 
-// The first failure ends the run.
-void WriteRun::Fail(const Failure& failure, size_t entry) {
+// A failure ends the run. What was taken before is still read, so of several failures the one that counts is that which
+// a single thread would have met.
+void WriteRun::Fail(const Failure& failure, UInt64 order, size_t entry) {
     std::lock_guard lock(m_Lock);
-    if (m_Fatal.code == ZARVO_OK && !m_IsStoppedByCaller) {
+    if (!m_IsStoppedByCaller && (m_Fatal.code == ZARVO_OK || order < m_FatalOrder)) {
         m_Fatal = failure;
+        m_FatalOrder = order;
         m_FailedEntry = entry;
     }
     m_IsStopped.store(true, std::memory_order_relaxed);
@@ -161,7 +155,7 @@ void WriteRun::CheckEmptyFiles(UInt32 thread) {
             const UInt32 index = m_EmptyFiles[at];
             Failure failure;
             if (m_Source->Read(thread, m_List, m_List[index], 0, nullptr, 0, &failure) != ZARVO_OK)
-                return Fail(failure, index);
+                return Fail(failure, at, index);
         }
         m_EmptyFilesDone.fetch_add(end - begin, std::memory_order_relaxed);
         if (m_IsAlone) LookIfDue();
@@ -173,7 +167,7 @@ void WriteRun::WorkOnBlocks(UInt32 thread) {
     if (!encoder.Prepare(m_Plan.BlockEncoding())) {
         Failure failure;
         (void)failure.SetMemory();
-        return Fail(failure);
+        return Fail(failure, kNoOrder);
     }
     while (Slot* const slot = TakeSlot()) {
         if (!FillSlot(thread, &encoder, slot) || !Commit(slot)) return;
@@ -202,16 +196,17 @@ bool WriteRun::FillSlot(UInt32 thread, BlockEncoder* encoder, Slot* slot) {
     Failure failure;
     size_t failed = PlannedData::kNoEntry;
     if (m_Data.Read(thread, position, slot->plain.data(), size, &failed, &failure) != ZARVO_OK) {
-        Fail(failure, failed);
+        Fail(failure, OrderOf(slot->number), failed);
         return false;
     }
     // What does not become smaller is stored as it is.
     size_t coded = 0;
     const EncodeResult result =
         encoder->Encode(slot->plain.data(), size, slot->coded.data(), size - 1, &coded, &m_IsStopped);
+    if (result == EncodeResult::kStopped) return false; // whoever stopped the run has said why
     if (result != EncodeResult::kOk && result != EncodeResult::kNoRoom) {
-        SetFailed(result, &failure);
-        Fail(failure);
+        (void)failure.SetMemory();
+        Fail(failure, OrderOf(slot->number));
         return false;
     }
     const bool isCoded = result == EncodeResult::kOk;
@@ -232,7 +227,7 @@ bool WriteRun::Commit(Slot* slot) {
     for (Slot* next = nullptr; (next = TakeNextFilled(next)) != nullptr;) {
         Failure failure;
         if (m_File->Write(next->place, next->stored, next->record.storedSize, &failure) != ZARVO_OK) {
-            Fail(failure);
+            Fail(failure, OrderOf(next->number));
             return false;
         }
         m_BytesDone.fetch_add(next->record.size, std::memory_order_relaxed);
@@ -306,10 +301,10 @@ private:
 void WriteRun::WorkOnStream() {
     StreamWriter writer(this);
     const EncodeResult result = EncodeLzmaStream(m_Plan.BlockEncoding(), &writer, &m_IsStopped);
-    if (result == EncodeResult::kOk) return;
+    if (result == EncodeResult::kOk || result == EncodeResult::kStopped) return; // whoever stopped the run has said why
     Failure failure = writer.GetFailure();
-    if (failure.code == ZARVO_OK) SetFailed(result, &failure);
-    Fail(failure, result == EncodeResult::kInputFailed ? writer.FailedEntry() : PlannedData::kNoEntry);
+    if (failure.code == ZARVO_OK) (void)failure.SetMemory();
+    Fail(failure, OrderOf(0), result == EncodeResult::kInputFailed ? writer.FailedEntry() : PlannedData::kNoEntry);
 }
 
 // What comes before the data always takes the same room.

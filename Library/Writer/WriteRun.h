@@ -72,7 +72,11 @@ private:
     zarvo_code WriteArchiveFrame(Failure* failure);
     zarvo_code WritePart(const ByteSink& part, UInt64 place, Failure* failure);
 
-    void Fail(const Failure& failure, size_t entry = PlannedData::kNoEntry);
+    // The order in which a single thread does everything: first the empty files, then the blocks.
+    static constexpr UInt64 kNoOrder = ~UInt64{0};
+    UInt64 OrderOf(UInt64 block) const { return m_EmptyFiles.size() + block; }
+
+    void Fail(const Failure& failure, UInt64 order, size_t entry = PlannedData::kNoEntry);
     bool TellProgress(); // false: to be stopped
     UInt64 CountDone(UInt64 position) const;
 
@@ -99,6 +103,7 @@ private:
     UInt64 m_NextPlaced = 0; // to get a place
     UInt64 m_End = 0;        // of what has got a place
     Failure m_Fatal;
+    UInt64 m_FatalOrder = kNoOrder;
     bool m_IsStoppedByCaller = false;
 
     std::atomic<bool> m_IsStopped{false};

@@ -204,6 +204,35 @@ TEST_F(Creation, NamesAnEmptyFileThatChangesMeanwhile) {
         }
 }
 
+// That of a single thread, which looks at the empty files first. With several, the others fail before it does.
+TEST_F(Creation, NamesTheSameFailureForAnyThreads) {
+    for (int number = 100; number < 700; ++number)
+        Put("empty/" + std::to_string(number), "");
+    for (const char* const block : {"0", "1", "2"}) {
+        Put(std::string("full/") + block, NoiseText(4'000'000));
+        Put(std::string("full/") + block + "+", NoiseText(96'304));
+    }
+    const std::vector<std::string> kCases[] = {
+        {"empty/355", "empty/356", "empty/357"},
+        {"empty/699", "full/0", "full/1"},
+        {"full/0+", "full/1", "full/2"},
+    };
+    for (const std::vector<std::string>& vanishing : kCases)
+        for (const uint32_t threads : {1u, 2u, 3u}) {
+            WriteFile(m_Folder / ".a.zarvo.zarvo-part", "");
+            zarvo::create_options how = {.compression = ZARVO_KIND_NONE, .block_size = 4'096'304};
+            how.log = [&](std::string_view) {
+                for (const std::string& path : vanishing)
+                    fs::rename(In() + "/" + path, m_Folder / fs::path(path).filename());
+            };
+            EXPECT_EQ(vanishing[0] + " failed: No such file or directory\n",
+                      Create(Archive(), In(), how, {.threads = threads}).reports)
+                << threads;
+            for (const std::string& path : vanishing)
+                fs::rename(m_Folder / fs::path(path).filename(), In() + "/" + path);
+        }
+}
+
 // As files of /sys do. What is missing must not come from elsewhere in memory.
 TEST_F(Creation, NamesAFileThatEndsBeforeItsSize) {
     Put("a", SampleText(200'000));
