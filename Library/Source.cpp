@@ -89,14 +89,15 @@ struct Stamp {
           inode(status.st_ino),
           size(status.st_size),
           modified(status.st_mtim),
-          changed(status.st_ctim) {}
+          changed(status.st_ctim),
+          hasName(status.st_nlink != 0) {}
 
     // Whether the file has kept its contents. The time of change tells also of writers that set the other one back. Of
-    // a file that was deleted or replaced it is the time of that, and nobody can open the file any more.
+    // a file that has been deleted or replaced since, it is the time of that.
     bool IsKept(const struct stat& status) const {
         const Stamp now(status);
-        return size == now.size && IsSame(modified, now.modified) &&
-               (status.st_nlink == 0 || IsSame(changed, now.changed));
+        const bool hasLostName = hasName && !now.hasName;
+        return size == now.size && IsSame(modified, now.modified) && (hasLostName || IsSame(changed, now.changed));
     }
     static bool IsSame(const timespec& a, const timespec& b) { return a.tv_sec == b.tv_sec && a.tv_nsec == b.tv_nsec; }
 
@@ -105,6 +106,7 @@ struct Stamp {
     off_t size;
     timespec modified;
     timespec changed;
+    bool hasName;
 };
 
 class FileSource final : public Source {

@@ -1,3 +1,4 @@
+#include "PlatformDependent/Linux/FileDescriptor.h"
 #include "Tests/Library/LibraryTest.h"
 #include "Tests/Support/ArchiveBuilder.h"
 #include "Tests/Support/TemporaryFolder.h"
@@ -137,6 +138,37 @@ TEST(Opening, ReplacedFileIsReadOn) {
     WriteFile(folder / "new", "another one");
     ASSERT_EQ(0, rename((folder / "new").c_str(), (folder / "archive").c_str()));
     EXPECT_EQ(Delivered{kText}, Read(archive, 0, 0, 100));
+}
+
+TEST(Opening, DeletedFileThatIsWrittenToIsAnError) {
+    const TemporaryFolder folder;
+    const std::string path = folder / "archive";
+    WriteFile(path, SmallArchive());
+    const timespec longAgo[2] = {{.tv_sec = 1, .tv_nsec = 0}, {.tv_sec = 1, .tv_nsec = 0}};
+    ASSERT_EQ(0, utimensat(AT_FDCWD, path.c_str(), longAgo, 0));
+    zarvo::archive archive = *zarvo::archive::open(path);
+    const FileDescriptor writer(open(path.c_str(), O_WRONLY));
+    ASSERT_EQ(0, unlink(path.c_str()));
+    EXPECT_EQ(Delivered{kText}, Read(archive, 0, 0, 100));
+    ASSERT_EQ(1, pwrite(writer.Get(), "Z", 1, 0)); // the byte that is there
+    EXPECT_EQ((Delivered{"", ZARVO_ERROR_CHANGED}), Read(archive, 0, 0, 100));
+}
+
+// Only its time of change tells, which is not that of a deletion.
+TEST(Opening, UnnamedFileWithATimeSetBackIsAnError) {
+    const TemporaryFolder folder;
+    const std::string path = folder / "archive";
+    WriteFile(path, SmallArchive());
+    const FileDescriptor file(open(path.c_str(), O_RDONLY));
+    ASSERT_EQ(0, unlink(path.c_str()));
+    zarvo::archive archive = *zarvo::archive::open(file.Get());
+    EXPECT_EQ(Delivered{kText}, Read(archive, 0, 0, 100));
+    struct stat status;
+    ASSERT_EQ(0, fstat(file.Get(), &status));
+    usleep(20'000); // the system's times of files go in steps
+    const timespec times[2] = {status.st_atim, status.st_mtim};
+    ASSERT_EQ(0, futimens(file.Get(), times));
+    EXPECT_EQ((Delivered{"", ZARVO_ERROR_CHANGED}), Read(archive, 0, 0, 100));
 }
 
 // Each read of the source fails once: opening or reading says so, and what is read afterwards is right.
