@@ -119,12 +119,14 @@ class Path:
     def glob(self, pattern: str) -> Iterator[Path]:
         """Yield what a pattern matches below here, as pathlib does: what a folder holds only if it matches itself.
 
-        "*", "?" and "[...]" match within one component, and the component "**" stands for any number of folders.
+        "*", "?" and "[...]" match within one component, and the component "**" stands for any number of folders. A
+        pattern that ends with "/" matches only folders.
         """
         parts = pathlib.PurePosixPath(pattern).parts
         if not parts or pattern.startswith("/"):
             raise ValueError(f"{pattern!r} is not a relative pattern")
-        return iter(dict.fromkeys(self._select(parts)))
+        found = dict.fromkeys(self._select(parts))
+        return (path for path in found if not pattern.endswith("/") or path.is_dir())
 
     def rglob(self, pattern: str) -> Iterator[Path]:
         """Yield what glob() does with "**/" in front of the pattern."""
@@ -134,14 +136,13 @@ class Path:
         if not parts:
             yield self
             return
-        if parts[0] == "**":
-            yield from self._select(parts[1:])
         if not self.is_dir():
             return
+        if parts[0] == "**":
+            yield from self._select(parts[1:])
         for child in self.iterdir():
             if parts[0] == "**":
-                if child.is_dir():
-                    yield from child._select(parts)
+                yield from child._select(parts)
             elif fnmatch.fnmatchcase(child.name, parts[0]):
                 yield from child._select(parts[1:])
 

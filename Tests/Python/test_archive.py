@@ -318,6 +318,9 @@ class Paths(ArchiveTest):
             "tables/one.csv",
             "empty/*",
             "none/*",
+            "*/",
+            "*/**",
+            "tables/*/",
         ):
             self.assertEqual(
                 sorted(str(path.relative_to(self.folder / "out")) for path in (self.folder / "out").glob(pattern)),
