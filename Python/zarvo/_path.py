@@ -133,18 +133,19 @@ class Path:
         return self.glob("**/" + pattern)
 
     def _select(self, parts: tuple[str, ...]) -> Iterator[Path]:
-        if not parts:
-            yield self
-            return
-        if not self.is_dir():
-            return
-        if parts[0] == "**":
-            yield from self._select(parts[1:])
-        for child in self.iterdir():
-            if parts[0] == "**":
-                yield from child._select(parts)
-            elif fnmatch.fnmatchcase(child.name, parts[0]):
-                yield from child._select(parts[1:])
+        left = [(self, parts)]  # the next one last: archives hold folders deeper than calls may be
+        while left:
+            path, parts = left.pop()
+            if not parts:
+                yield path
+            elif path.is_dir():
+                children = list(path.iterdir())
+                if parts[0] == "**":
+                    left += [(child, parts) for child in reversed(children)]
+                    left.append((path, parts[1:]))
+                else:
+                    matches = [child for child in children if fnmatch.fnmatchcase(child.name, parts[0])]
+                    left += [(child, parts[1:]) for child in reversed(matches)]
 
     def open(self, mode: str = "r", *args: Any, **kwargs: Any) -> IO[Any]:
         """Open the file: mode "r" for text, with the arguments of io.TextIOWrapper, or "rb" for bytes."""

@@ -332,6 +332,11 @@ class Paths(ArchiveTest):
             with self.assertRaises(ValueError):
                 zarvo.Path(archive).glob(pattern)
 
+    def test_glob_goes_to_any_depth(self):
+        path = "/".join(["d"] * 1200) + "/x"
+        archive = self.open([(path, b"")])
+        self.assertEqual([path], [found.at for found in zarvo.Path(archive).glob("**/x")])
+
     def test_say_what_is_not_there(self):
         root = zarvo.Path(self.write(TREE))
         for use, error in (
