@@ -187,14 +187,14 @@ zarvo_code Extraction::CutShared(Worker* worker, OutputFile* file, Failure* fail
 
 // Removes the file unless it has its name.
 void Extraction::FreeShared(Worker* worker, OutputFile* file) {
-    Failure failure;
-    if (file->isOpen) {
-        m_OpenFiles.fetch_sub(1, std::memory_order_relaxed);
-    } else if (file->file.IsNamed()) {
+    const bool wasOpen = file->isOpen;
+    if (!wasOpen && file->file.IsNamed()) {
+        Failure failure;
         const int folder = FindFolder(worker, file->entry, &failure);
         if (folder >= 0) file->file.Remove(folder);
     }
     Delete(file, kMemLabelFileSystem);
+    if (wasOpen) m_OpenFiles.fetch_sub(1, std::memory_order_relaxed);
 }
 
 void Extraction::TakePart(UInt32 number, SharedFile* shared, UInt64 offset, const UInt8* bytes, UInt64 size) {
