@@ -97,7 +97,7 @@ void BlockCache::Unlist(Record* record) {
     for (Slot& slot : m_Slots) {
         if (slot.record != record) continue;
         slot = m_Slots[m_Slots.size() - 1];
-        (void)m_Slots.resize_uninitialized(m_Slots.size() - 1); // never grows
+        m_Slots.truncate(m_Slots.size() - 1);
         break;
     }
     record->isListed = false;
@@ -142,7 +142,7 @@ StreamCursor* BlockCache::RemoveCursor(IdleCursor* idle) {
     StreamCursor* const cursor = idle->cursor;
     m_Bytes -= idle->bytes;
     *idle = m_Cursors[m_Cursors.size() - 1];
-    (void)m_Cursors.resize_uninitialized(m_Cursors.size() - 1); // never grows
+    m_Cursors.truncate(m_Cursors.size() - 1);
     return cursor;
 }
 

@@ -122,7 +122,7 @@ zarvo_code BlockDecoder::DecodeWhole(UInt32 index, UInt8* out, size_t* count, Fa
     size_t loaded = 0;
     const zarvo_code code = ReadStored(index, 0, stored.data(), stored.size(), &loaded, failure);
     if (code != ZARVO_OK && code != ZARVO_ERROR_SYSTEM) return code;
-    (void)stored.resize_uninitialized(loaded); // never grows
+    stored.truncate(loaded);
     if (code == ZARVO_OK) return DecodeLoaded(index, block, stored, out, count, failure);
     // The bytes before those that can't be read give some of the block.
     Failure ofTheRest;
@@ -174,7 +174,7 @@ zarvo_code StreamCursor::LoadInput(Failure* failure) {
     if (!m_Input.resize_uninitialized(wanted, kResizeExact)) return failure->SetMemory();
     size_t got = 0;
     const zarvo_code code = m_Decoder->ReadStored(m_BlockIndex, m_Loaded, m_Input.data(), wanted, &got, failure);
-    (void)m_Input.resize_uninitialized(got); // never grows
+    m_Input.truncate(got);
     m_InputUsed = 0;
     m_Loaded += got;
     if (code != ZARVO_ERROR_SYSTEM || got == 0) return code;

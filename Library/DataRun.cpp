@@ -88,7 +88,7 @@ void DataRun::Unshare(SharedFile* shared) {
     SharedFile* const last = m_Shared[m_Shared.size() - 1];
     m_Shared[shared->liveIndex] = last;
     last->liveIndex = shared->liveIndex;
-    (void)m_Shared.resize_uninitialized(m_Shared.size() - 1); // never grows
+    m_Shared.truncate(m_Shared.size() - 1);
 }
 
 // Where the unit that begins at a place ends: after about m_UnitSize bytes, or before a block that no file needs.
@@ -131,7 +131,7 @@ bool DataRun::ListFiles(Unit* unit) {
         if (!Append(&unit->carried, active)) return false;
         if (EndOf(active.entry) > unit->end) m_Active[kept++] = active;
     }
-    (void)m_Active.resize_uninitialized(kept); // never grows
+    m_Active.truncate(kept);
     unit->firstFile = m_NextFile;
     for (; m_NextFile < m_Files.size() && BeginOf(m_Files[m_NextFile]) < unit->end; ++m_NextFile) {
         const UInt32 entry = m_Files[m_NextFile];
@@ -169,7 +169,7 @@ void DataRun::Work(UInt32 worker) {
         if (!m_Passed.empty()) {
             Piece* const passed = m_Passed[0];
             std::move(m_Passed.begin() + 1, m_Passed.end(), m_Passed.begin()); // the oldest first
-            (void)m_Passed.resize_uninitialized(m_Passed.size() - 1);          // never grows
+            m_Passed.truncate(m_Passed.size() - 1);
             lock.unlock();
             Deliver(worker, *passed);
             lock.lock();
@@ -297,7 +297,7 @@ void DataRun::WorkOnStream(UInt32 worker, const Unit& unit, Piece** piece) {
             isOk = isOk && Append(&(*piece)->files, going);
             if (EndOf(going.entry) > (*piece)->end) active[kept++] = going;
         }
-        (void)active.resize_uninitialized(kept); // never grows
+        active.truncate(kept);
         for (; isOk && file < unit.endFile && BeginOf(m_Files[file]) < (*piece)->end; ++file) {
             const UInt32 entry = m_Files[file];
             PieceFile inPiece = {entry, nullptr};
@@ -330,7 +330,7 @@ bool DataRun::PassOn(Piece** piece) {
     Piece* next = nullptr;
     if (!m_Spare.empty()) {
         next = m_Spare[m_Spare.size() - 1];
-        (void)m_Spare.resize_uninitialized(m_Spare.size() - 1); // never grows
+        m_Spare.truncate(m_Spare.size() - 1);
     } else {
         next = New<Piece>(kMemLabelFileSystem);
     }

@@ -31,7 +31,7 @@ void RemoveHandle(const void* handle) {
     for (const void*& live : s_Handles) {
         if (live != handle) continue;
         live = s_Handles[s_Handles.size() - 1];
-        (void)s_Handles.resize_uninitialized(s_Handles.size() - 1); // never grows
+        s_Handles.truncate(s_Handles.size() - 1);
         return;
     }
 }

@@ -39,7 +39,7 @@ bool TestRun::ListEnds() {
     for (const Node& node : Nodes())
         if (zarvo_archive::SizeOf(node) != 0 && !IsOutsideData(node))
             m_Ends[count++] = node.offset + std::min<UInt64>(node.size, Archive()->Info().data_size - node.offset);
-    (void)m_Ends.resize_uninitialized(count); // never grows
+    m_Ends.truncate(count);
     std::sort(m_Ends.begin(), m_Ends.end());
     Expect(Nodes().size());
     Count(Nodes().size() - count);

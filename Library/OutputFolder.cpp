@@ -49,9 +49,9 @@ zarvo_code OutputFolder::Open(const char* path, Failure* failure) {
     for (size_t end = 1; end <= whole.size(); ++end) {
         if (end != whole.size() && whole[end] != '/') continue;
         start = whole.substr(0, end);
-        error = mkdir(start.c_str(), 0777) == 0 ? 0 : errno;
+        error = RepeatOnInterrupt([&] { return mkdir(start.c_str(), 0777); }) == 0 ? 0 : errno;
     }
-    m_Descriptor = open(path, O_PATH | O_DIRECTORY | O_CLOEXEC);
+    m_Descriptor = RepeatOnInterrupt([&] { return open(path, O_PATH | O_DIRECTORY | O_CLOEXEC); });
     if (m_Descriptor >= 0) return ZARVO_OK;
     const int openError = errno;
     return failure->SetSystem(error != 0 && error != EEXIST && openError == ENOENT ? error : openError);
@@ -63,7 +63,7 @@ zarvo_code OutputFolder::OpenToLook(const char* path, Failure* failure) {
     if (start.grow(whole.size() + 1) == nullptr) return failure->SetMemory();
     start = whole;
     while (true) {
-        m_Descriptor = open(start.c_str(), O_PATH | O_DIRECTORY | O_CLOEXEC);
+        m_Descriptor = RepeatOnInterrupt([&] { return open(start.c_str(), O_PATH | O_DIRECTORY | O_CLOEXEC); });
         if (m_Descriptor >= 0) return m_IsMissing ? CheckCanMakeIn(m_Descriptor, failure) : ZARVO_OK;
         struct stat status;
         const int error = errno;
@@ -137,7 +137,7 @@ bool FolderCache::Keep(core::string_ref path, int descriptor) {
             if (folder.lastUse < oldest->lastUse) oldest = &folder;
         close(oldest->descriptor);
         *oldest = std::move(m_Folders[m_MaxFolders - 1]);
-        (void)m_Folders.resize_initialized(m_MaxFolders - 1); // never grows
+        m_Folders.truncate(m_MaxFolders - 1);
     }
     const size_t index = m_Folders.size();
     if (!m_Folders.resize_initialized(index + 1)) return false;
@@ -316,14 +316,15 @@ zarvo_code NewFile::CreateClosed(int folder, Failure* failure) {
     const int descriptor = OpenNamed(folder, m_Name);
     if (descriptor < 0) return failure->SetSystem(errno);
     struct stat status;
-    if (fstat(descriptor, &status) != 0) {
-        (void)failure->SetSystem(errno);
-        Remove(folder);
-    }
+    const int error = fstat(descriptor, &status) == 0 ? 0 : errno;
     close(descriptor); // nothing has been written
+    if (error != 0) {
+        Remove(folder);
+        return failure->SetSystem(error);
+    }
     m_Device = status.st_dev;
     m_Inode = status.st_ino;
-    return failure->code;
+    return ZARVO_OK;
 }
 
 // Opens the file, and nothing else that may have got its name meanwhile.

@@ -55,7 +55,7 @@ zarvo_code zarvo_patterns::Add(core::string_ref text, Failure* failure) {
         if (isOk && IsGlob(text)) isOk = m_Globs.resize_uninitialized(globCount + 1);
     }
     if (!isOk) {
-        (void)m_Patterns.resize_initialized(count); // never grows
+        m_Patterns.truncate(count);
         return failure->SetMemory();
     }
     const UInt32 index = static_cast<UInt32>(count);
