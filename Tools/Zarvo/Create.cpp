@@ -91,7 +91,8 @@ int RunCreate(const Run& run) {
     how.log = [&](std::string_view message) { run.console.Say(path, message); };
     const zarvo::run_result result = zarvo::create(path, folder, options, how);
 
-    run.done = std::to_string(packed) + (result.error ? " bytes; no archive is made" : " bytes; the archive is made");
+    const bool isMade = !result.error && !how.dry_run;
+    run.done = std::to_string(packed) + (isMade ? " bytes; the archive is made" : " bytes; no archive is made");
     if (run.output.IsAbandoned()) return kSomethingWrong;
     if (result.error) {
         if (!isTold) run.console.Say(path, result.error.text());

@@ -3,6 +3,7 @@
 #include "Tools/Zarvo/Text.h"
 
 #include <cerrno>
+#include <climits>
 #include <poll.h>
 #include <sys/ioctl.h>
 #include <unistd.h>
@@ -20,6 +21,12 @@ ssize_t WriteOrWait(int descriptor, std::string_view bytes) {
         count = poll(&ready, 1, -1) < 0 ? -1 : 0;
     }
     return count;
+}
+
+// Whether PIPE_BUF bytes can be written without waiting.
+bool TakesMore(int descriptor) {
+    pollfd ready = {.fd = descriptor, .events = POLLOUT, .revents = 0};
+    return poll(&ready, 1, 0) > 0;
 }
 
 } // namespace
@@ -45,8 +52,9 @@ void OutputBuffer::Flush() {
 }
 
 void OutputBuffer::WriteNow(std::string_view bytes) {
-    while (!bytes.empty() && !IsClosed()) {
-        const ssize_t count = WriteOrWait(m_Descriptor, bytes);
+    while (!bytes.empty() && m_Error == 0) {
+        if (HasSignal() && !TakesMore(m_Descriptor)) return;
+        const ssize_t count = WriteOrWait(m_Descriptor, HasSignal() ? bytes.substr(0, PIPE_BUF) : bytes);
         if (count < 0 && errno == EINTR) continue;
         if (count < 0) {
             m_Error = errno;

@@ -7,7 +7,8 @@
 #include <string>
 #include <string_view>
 
-// Results. After a failure, and once a signal asks the run to end, what is written is dropped.
+// Results. After a failure, what is written is dropped. Once a signal asks the run to end, so is what would have to
+// wait.
 class OutputBuffer {
 public:
     // signal: holds the number of a signal that has come, or 0. May be nullptr.
@@ -34,7 +35,7 @@ public:
 
     bool IsTerminal() const { return m_IsTerminal; }
 
-    // Nothing more will be written: a write has failed, or a signal has come.
+    // Nothing more need be written: a write has failed, or a signal has come.
     bool IsClosed() const { return m_Error != 0 || HasSignal(); }
 
     bool HasSignal() const { return m_Signal != nullptr && *m_Signal != 0; }

@@ -1,5 +1,11 @@
 // The command as a process: its standard descriptors, signals and terminals.
 #include "Tests/Tools/Zarvo/ZarvoTest.h"
+#include "Tools/Zarvo/Output.h"
+
+#include <atomic>
+#include <csignal>
+#include <fcntl.h>
+#include <unistd.h>
 
 namespace {
 
@@ -70,16 +76,42 @@ TEST_F(ZarvoProcess, EndsByTheSignalThatEndsIt) {
     // A shell's background processes ignore SIGINT. The signal comes when the pipe is full and the command waits.
     const std::string
         start = "mkfifo pipe; exec 9<>pipe; env --default-signal $Z ",
-        to = " long.zarvo >&9 9>&- & ",
+        to = " >&9 9>&- & ",
         wait = "until [[ $(</proc/$!/comm) == zarvo && $(cut -d' ' -f3 /proc/$!/stat) == S ]]; do sleep 0.01; "
                "done; ";
-    const std::pair<std::string, std::string> kRuns[] = {{"INT", "list"}, {"TERM", "list"}, {"INT", "sum"}};
-    for (const auto& [name, subcommand] : kRuns) {
-        const auto [status, text] = Shell(start + subcommand + to + wait + "sleep 0.1; kill -" + name +
+    const struct {
+        std::string signal, command;
+        const char* done;
+    } kRuns[] = {
+        {"INT", "list long.zarvo", "65536 bytes of results"},
+        {"TERM", "list long.zarvo", "65536 bytes of results"},
+        {"INT", "sum long.zarvo", "65536 bytes of results"},
+        {"INT", "create --dry-run new.zarvo folder", "0 bytes; no archive is made"},
+    };
+    fs::create_directory("folder");
+    for (int index = 0; index < 2'000; ++index)
+        WriteFile("folder/" + std::to_string(index) + std::string(200, 'n'), "");
+    for (const auto& [name, command, done] : kRuns) {
+        const auto [status, text] = Shell(start + command + to + wait + "sleep 0.1; kill -" + name +
                                           " $!; wait $!; status=$?; rm pipe; exit $status");
         EXPECT_EQ(128 + (name == "INT" ? SIGINT : SIGTERM), status) << text;
-        EXPECT_EQ("zarvo: ended by SIG" + name + " after 65536 bytes of results\n", text);
+        EXPECT_EQ("zarvo: ended by SIG" + name + " after " + done + "\n", text);
     }
+}
+
+TEST_F(ZarvoProcess, PutsOutAfterASignalWhatNeedNotWait) {
+    int pipe[2] = {};
+    ASSERT_EQ(0, pipe2(pipe, O_CLOEXEC));
+    std::atomic<int> signal{0};
+    OutputBuffer output(pipe[1], false, &signal);
+    const std::string lines(100'000, 'l');
+    output.Write(lines);
+    signal = SIGINT;
+    output.Flush(); // more than the pipe takes
+    EXPECT_EQ(65'536u, output.GetWritten());
+    EXPECT_EQ(0, output.GetError());
+    close(pipe[0]);
+    close(pipe[1]);
 }
 
 TEST_F(ZarvoProcess, EscapesWhatGoesToATerminal) {
