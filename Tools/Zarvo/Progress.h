@@ -16,6 +16,12 @@ struct Amount {
     uint64_t files = 0;
 };
 
+// What came before the first byte: empty files, which take so little time that they tell nothing of what is left.
+struct Prelude {
+    uint64_t files = 0;
+    double seconds = 0;
+};
+
 class Progress {
 public:
     // canShow: whether --progress=auto shows anything on a terminal.
@@ -34,7 +40,8 @@ private:
     const bool m_IsShown;
     const Clock::time_point m_Start = Clock::now();
     Clock::time_point m_Shown = m_Start; // when the last line was
+    Prelude m_Prelude;
 };
 
 // The line, after so many seconds.
-std::string DescribeProgress(Amount done, Amount total, double seconds);
+std::string DescribeProgress(Amount done, Amount total, double seconds, Prelude prelude = {});

@@ -72,6 +72,7 @@ TEST(ZarvoText, DescribesAnyProgress) {
         const char* what;
         Amount done = {}, total = {};
         double seconds;
+        Prelude prelude = {};
         const char* text;
     } kCases[] = {
         {.what = "in the middle",
@@ -103,9 +104,21 @@ TEST(ZarvoText, DescribesAnyProgress) {
          .total = {.bytes = 9, .files = 11},
          .seconds = 9,
          .text = "100%  9 bytes of 9 bytes, 1 of 11 files, 1 bytes/s, 1:30 left"},
+        {.what = "after many empty files",
+         .done = {.bytes = 1 << 20, .files = 50'000},
+         .total = {.bytes = 4 << 20, .files = 50'003},
+         .seconds = 12,
+         .prelude = {.files = 50'000, .seconds = 2},
+         .text = " 25%  1.0 MiB of 4.0 MiB, 50000 of 50003 files, 85.3 KiB/s, 0:30 left"},
+        {.what = "among empty files",
+         .done = {.files = 1'000},
+         .total = {.bytes = 1, .files = 1'001},
+         .seconds = 1,
+         .prelude = {.files = 1'000, .seconds = 1},
+         .text = "  0%  0 bytes of 1 bytes, 1000 of 1001 files, 0 bytes/s, ? left"},
     };
     for (const auto& row : kCases)
-        EXPECT_EQ(row.text, DescribeProgress(row.done, row.total, row.seconds)) << row.what;
+        EXPECT_EQ(row.text, DescribeProgress(row.done, row.total, row.seconds, row.prelude)) << row.what;
 }
 
 } // namespace
