@@ -380,7 +380,8 @@ typedef struct zarvo_run_options {
     zarvo_patterns* wanted;   /* which entries to take. Default: all. Must not be used elsewhere during the call */
     zarvo_patterns* excluded; /* which of them to leave out. Default: none. As above */
 
-    /* Called ten times a second, and at the end. A result other than 0 stops the run with ZARVO_ERROR_STOPPED. */
+    /* Called ten times a second, and at the end. A result other than 0 stops the run with ZARVO_ERROR_STOPPED. At the
+       end, when all else is done, that goes only for runs that make an archive. */
     int (*progress)(void* context, const zarvo_progress* progress);
     void* context; /* for all callbacks of the run */
 } zarvo_run_options;
