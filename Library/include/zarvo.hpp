@@ -8,7 +8,9 @@
 //
 // The wrapper throws nothing of its own, and can be used without exceptions. An exception that a callback throws (of a
 // source, a log or a run) is caught before it reaches the library, and thrown again when the call that ran the callback
-// returns. To the library, a source that throws has failed to read; a run whose callback throws is stopped.
+// returns; of several, the first. To the library, a source that throws has failed to read. A run whose callback throws
+// is stopped. When the source or the log of an archive throws in a run, all runs on that archive are stopped, because
+// nothing tells which of them has called it.
 //
 // Threads: as for the handles of zarvo.h. Views of texts are valid until their archive is destroyed.
 #pragma once
@@ -22,16 +24,18 @@
 #include <functional>
 #include <iterator>
 #include <memory>
+#include <mutex>
 #include <optional>
 #include <span>
 #include <string>
 #include <string_view>
 #include <utility>
+#include <vector>
 
 namespace zarvo {
 
 // Why an operation failed. As a bool: whether it failed.
-class error {
+class [[nodiscard]] error {
 public:
     error() = default;
     explicit error(zarvo_error* owned) : m_Error(owned) {}
@@ -77,17 +81,73 @@ namespace detail {
 // The exception of a callback, on its way past the library. Programs without exceptions never have one.
 inline thread_local std::exception_ptr pending;
 
-// Calls a caller's function, and returns its result, or failed when it throws.
-template <typename Call, typename Answer>
-Answer guard(Call&& call, Answer failed) noexcept {
+// Whether the innermost call of this thread into the library is a plain one, whose callbacks all run on this thread.
+// It is false in runs, and on threads of the library.
+inline thread_local bool is_in_plain_call = false;
+
+// The first exception that stops a run, from any thread.
+class run_exception {
+public:
+    void keep_current() noexcept {
 #if defined(__cpp_exceptions)
+        if (!m_IsThere.exchange(true)) m_Exception = std::current_exception();
+#endif
+    }
+    bool is_there() const { return m_IsThere; }
+
+    // After the run, when no thread can keep another.
+    void rethrow() {
+#if defined(__cpp_exceptions)
+        if (m_Exception) std::rethrow_exception(std::exchange(m_Exception, nullptr));
+#endif
+    }
+
+private:
+    std::atomic<bool> m_IsThere = false;
+    std::exception_ptr m_Exception;
+};
+
+// The runs under way on an archive or a writer. Any thread may use it.
+class active_runs {
+public:
+    void add(run_exception* run) {
+        const std::lock_guard lock(m_Mutex);
+        m_Runs.push_back(run);
+    }
+    void remove(run_exception* run) {
+        const std::lock_guard lock(m_Mutex);
+        std::erase(m_Runs, run);
+    }
+
+    // Stops all of them with the exception that is being handled.
+    void stop() noexcept {
+        const std::lock_guard lock(m_Mutex);
+        for (run_exception* const run : m_Runs)
+            run->keep_current();
+    }
+
+private:
+    std::mutex m_Mutex;
+    std::vector<run_exception*> m_Runs;
+};
+
+// Calls a source or a log, and returns its result, or failed when it throws. In a plain call nothing is called after
+// an exception.
+template <typename Call, typename Answer>
+Answer guard(active_runs& runs, Call&& call, Answer failed) noexcept {
+#if defined(__cpp_exceptions)
+    if (pending) return failed;
     try {
         return call();
     } catch (...) {
-        pending = std::current_exception();
+        if (is_in_plain_call)
+            pending = std::current_exception();
+        else
+            runs.stop();
         return failed;
     }
 #else
+    (void)runs;
     (void)failed;
     return call();
 #endif
@@ -99,13 +159,20 @@ inline void rethrow() {
 #endif
 }
 
-// Makes a call whose last parameter receives the error, and returns that error. Callers first give the results an
-// owner, then call rethrow.
+// Makes a call whose last parameter receives the error, and returns that error.
 template <typename Call>
-error check(Call&& call) {
+error call_library(bool is_plain, Call&& call) {
+    const bool was_in_plain_call = std::exchange(is_in_plain_call, is_plain);
     zarvo_error* failure = nullptr;
     (void)call(&failure); // the error says it all
+    is_in_plain_call = was_in_plain_call;
     return error(failure);
+}
+
+// Makes a plain call. Callers first give the results an owner, then call rethrow.
+template <typename Call>
+error check(Call&& call) {
+    return call_library(true, call);
 }
 
 } // namespace detail
@@ -126,22 +193,29 @@ public:
 
 namespace detail {
 
-inline zarvo_source callbacks_of(source* from) {
+// A source as the library knows it, which closes it.
+struct called_source {
+    std::unique_ptr<source> from;
+    std::shared_ptr<active_runs> runs; // that may use it
+};
+
+inline zarvo_source callbacks_of(std::unique_ptr<source> from, std::shared_ptr<active_runs> runs) {
     zarvo_source callbacks = ZARVO_SOURCE_INIT;
-    callbacks.context = from;
+    callbacks.context = new called_source{std::move(from), std::move(runs)};
     callbacks.read_at = [](void* context, void* buffer, size_t size, uint64_t offset) {
-        return guard(
-            [&] {
-                return static_cast<source*>(context)->read_at({static_cast<std::byte*>(buffer), size}, offset);
-            },
-            int64_t{-EIO});
+        auto* const called = static_cast<called_source*>(context);
+        const auto read = [&] { return called->from->read_at({static_cast<std::byte*>(buffer), size}, offset); };
+        return guard(*called->runs, read, int64_t{-EIO});
     };
     callbacks.get_size = [](void* context, uint64_t* size) {
-        const int64_t answer = guard([&] { return static_cast<source*>(context)->size(); }, int64_t{-EIO});
+        auto* const called = static_cast<called_source*>(context);
+        const int64_t answer = guard(
+            *called->runs, [&] { return called->from->size(); }, int64_t{-EIO});
         if (answer < 0) return static_cast<int>(answer);
         *size = static_cast<uint64_t>(answer);
         return 0;
     };
+    callbacks.close = [](void* context) { delete static_cast<called_source*>(context); };
     return callbacks;
 }
 
@@ -338,12 +412,13 @@ struct create_options {
 
 namespace detail {
 
-// The callbacks of a run. Once one of them has thrown, on any thread, none is called again, and the run stops when it
-// next reports progress.
+// The callbacks of a run. Once one of them, a source or a log has thrown, on any thread, none is called again, and the
+// run stops when it next reports progress.
 template <typename Options>
 class run_callbacks {
 public:
-    run_callbacks(const run_options& options, const Options& own) : m_Options(options), m_Own(own) {}
+    run_callbacks(active_runs* runs, const run_options& options, const Options& own)
+        : m_Runs(runs), m_Options(options), m_Own(own) {}
 
     // Makes the run; call: (run options, summary, error) -> code.
     template <typename Call>
@@ -360,11 +435,10 @@ public:
         };
         plain.context = this;
         run_result result;
-        result.error = check([&](zarvo_error** why) { return call(&plain, &result.summary, why); });
-#if defined(__cpp_exceptions)
-        if (m_Exception) pending = m_Exception;
-#endif
-        rethrow();
+        if (m_Runs != nullptr) m_Runs->add(&m_Exception);
+        result.error = call_library(false, [&](zarvo_error** why) { return call(&plain, &result.summary, why); });
+        if (m_Runs != nullptr) m_Runs->remove(&m_Exception);
+        m_Exception.rethrow();
         return result;
     }
 
@@ -382,11 +456,11 @@ private:
     template <typename Call>
     bool guard(Call&& call) noexcept {
 #if defined(__cpp_exceptions)
-        if (m_HasThrown) return false;
+        if (m_Exception.is_there()) return false;
         try {
             return call();
         } catch (...) {
-            if (!m_HasThrown.exchange(true)) m_Exception = std::current_exception();
+            m_Exception.keep_current();
             return false;
         }
 #else
@@ -394,10 +468,10 @@ private:
 #endif
     }
 
+    active_runs* const m_Runs; // on the same archive or writer; null without one
     const run_options& m_Options;
     const Options& m_Own;
-    std::atomic<bool> m_HasThrown = false;
-    std::exception_ptr m_Exception; // the first that was thrown; thrown again after the run
+    run_exception m_Exception;
 };
 
 } // namespace detail
@@ -406,24 +480,31 @@ private:
 class archive {
 public:
     static result<archive> open(const char* path, open_options options = {}) {
-        return open_with(std::move(options), nullptr, [&](auto... rest) { return zarvo_open_path(path, rest...); });
+        return open_with(std::move(options), [&](auto... rest) { return zarvo_open_path(path, rest...); });
     }
     static result<archive> open(const std::string& path, open_options options = {}) {
         return open(path.c_str(), std::move(options));
     }
     static result<archive> open(int descriptor, open_options options = {}) {
-        return open_with(std::move(options), nullptr,
-                         [&](auto... rest) { return zarvo_open_descriptor(descriptor, rest...); });
+        return open_with(std::move(options), [&](auto... rest) { return zarvo_open_descriptor(descriptor, rest...); });
     }
     // data must stay as it is until the archive is destroyed.
     static result<archive> open(std::span<const std::byte> data, open_options options = {}) {
-        return open_with(std::move(options), nullptr,
+        return open_with(std::move(options),
                          [&](auto... rest) { return zarvo_open_memory(data.data(), data.size(), rest...); });
     }
     static result<archive> open(std::unique_ptr<source> from, open_options options = {}) {
-        const zarvo_source callbacks = detail::callbacks_of(from.get());
-        return open_with(std::move(options), std::move(from),
-                         [&](auto... rest) { return zarvo_open_source(&callbacks, rest...); });
+        auto runs = std::make_shared<detail::active_runs>();
+        const zarvo_source callbacks = detail::callbacks_of(std::move(from), runs);
+        const auto open = [&](auto... rest) { return zarvo_open_source(&callbacks, rest...); };
+        return open_with(std::move(options), open, std::move(runs));
+    }
+
+    archive(archive&&) noexcept = default;
+    archive& operator=(archive&& other) noexcept {
+        m_Archive = std::move(other.m_Archive); // closes the old one, which needs its callbacks until then
+        m_Callbacks = std::move(other.m_Callbacks);
+        return *this;
     }
 
     // For the operations of zarvo.h. Stays this object's.
@@ -507,7 +588,7 @@ public:
             plain.report = [](void* context, const zarvo_report* report) {
                 calls::call(context, [&](const extract_options& own) { own.report(*report); });
             };
-        return calls(options, how).make([&](zarvo_run_options* run, zarvo_summary* summary, zarvo_error** why) {
+        return calls(runs(), options, how).make([&](zarvo_run_options* run, zarvo_summary* summary, zarvo_error** why) {
             return zarvo_extract(get(), folder, run, &plain, summary, why);
         });
     }
@@ -526,9 +607,10 @@ public:
             plain.entry = [](void* context, uint64_t index, uint64_t readable) {
                 calls::call(context, [&](const test_options& own) { own.entry(index, readable); });
             };
-        return calls(options, what).make([&](zarvo_run_options* run, zarvo_summary* summary, zarvo_error** why) {
-            return zarvo_test(get(), run, &plain, summary, why);
-        });
+        return calls(runs(), options, what)
+            .make([&](zarvo_run_options* run, zarvo_summary* summary, zarvo_error** why) {
+                return zarvo_test(get(), run, &plain, summary, why);
+            });
     }
     // Hands over the bytes of files: see zarvo_visit.
     run_result visit(const run_options& options = {}, const visit_options& what = {}) {
@@ -545,27 +627,33 @@ public:
             plain.report = [](void* context, const zarvo_report* report) {
                 calls::call(context, [&](const visit_options& own) { own.report(*report); });
             };
-        return calls(options, what).make([&](zarvo_run_options* run, zarvo_summary* summary, zarvo_error** why) {
-            return zarvo_visit(get(), run, &plain, summary, why);
-        });
+        return calls(runs(), options, what)
+            .make([&](zarvo_run_options* run, zarvo_summary* summary, zarvo_error** why) {
+                return zarvo_visit(get(), run, &plain, summary, why);
+            });
     }
 
 private:
-    // What the library calls back, at an address that stays.
+    // What the library's callbacks need, at an address that stays.
     struct callbacks {
         std::function<void(std::string_view message)> log;
-        std::unique_ptr<source> from;
+        std::shared_ptr<detail::active_runs> runs;
     };
     struct close_archive {
         void operator()(zarvo_archive* archive) const { zarvo_close(archive); }
     };
 
+    // Null for an archive that was moved away.
+    detail::active_runs* runs() const { return m_Callbacks ? m_Callbacks->runs.get() : nullptr; }
+
     archive(std::unique_ptr<callbacks> called, zarvo_archive* owned)
         : m_Callbacks(std::move(called)), m_Archive(owned) {}
 
     template <typename Open>
-    static result<archive> open_with(open_options options, std::unique_ptr<source> from, Open&& open) {
-        std::unique_ptr<callbacks> called(new callbacks{std::move(options.log), std::move(from)});
+    static result<archive>
+    open_with(open_options options, Open&& open,
+              std::shared_ptr<detail::active_runs> runs = std::make_shared<detail::active_runs>()) {
+        std::unique_ptr<callbacks> called(new callbacks{std::move(options.log), std::move(runs)});
         zarvo_open_options plain = ZARVO_OPEN_OPTIONS_INIT;
         plain.offset = options.offset;
         plain.max_entries = options.max_entries;
@@ -574,12 +662,12 @@ private:
         plain.cache_bytes = options.cache_bytes;
         if (called->log) {
             plain.log = [](void* context, const char* message) {
-                (void)detail::guard(
-                    [&] {
-                        static_cast<callbacks*>(context)->log(message);
-                        return true;
-                    },
-                    false);
+                auto* const self = static_cast<callbacks*>(context);
+                const auto log = [&] {
+                    self->log(message);
+                    return true;
+                };
+                (void)detail::guard(*self->runs, log, false);
             };
             plain.log_context = called.get();
         }
@@ -599,7 +687,7 @@ namespace detail {
 
 // Makes an archive; call: (run options, create options, summary, error) -> code.
 template <typename Call>
-run_result create_with(const run_options& options, const create_options& how, Call&& call) {
+run_result create_with(active_runs* runs, const run_options& options, const create_options& how, Call&& call) {
     using calls = run_callbacks<create_options>;
     zarvo_create_options plain = ZARVO_CREATE_OPTIONS_INIT;
     plain.layout = how.layout;
@@ -619,7 +707,7 @@ run_result create_with(const run_options& options, const create_options& how, Ca
         plain.log = [](void* context, const char* message) {
             calls::call(context, [&](const create_options& own) { own.log(message); });
         };
-    return calls(options, how).make([&](zarvo_run_options* run, zarvo_summary* summary, zarvo_error** why) {
+    return calls(runs, options, how).make([&](zarvo_run_options* run, zarvo_summary* summary, zarvo_error** why) {
         return call(run, &plain, summary, why);
     });
 }
@@ -629,7 +717,7 @@ run_result create_with(const run_options& options, const create_options& how, Ca
 // Makes an archive of what lies below a folder: see zarvo_create.
 inline run_result create(const std::string& path, const std::string& folder, const run_options& options = {},
                          const create_options& how = {}) {
-    return detail::create_with(options, how,
+    return detail::create_with(nullptr, options, how,
                                [&](auto... rest) { return zarvo_create(path.c_str(), folder.c_str(), rest...); });
 }
 
@@ -649,10 +737,9 @@ public:
             return zarvo_writer_add_memory(m_Writer.get(), path.data(), path.size(), data.data(), data.size(), why);
         });
     }
-    // An exception of the source's read_at is not passed on: the archive is not made.
+    // Calls the source's size at once, and its read_at in write.
     error add(std::string_view path, std::unique_ptr<source> from) {
-        zarvo_source callbacks = detail::callbacks_of(from.release());
-        callbacks.close = [](void* context) { delete static_cast<source*>(context); };
+        const zarvo_source callbacks = detail::callbacks_of(std::move(from), m_Runs);
         error failure = detail::check([&](zarvo_error** why) {
             return zarvo_writer_add_source(m_Writer.get(), path.data(), path.size(), &callbacks, why);
         });
@@ -665,14 +752,16 @@ public:
     }
 
     run_result write(const std::string& path, const run_options& options = {}, const create_options& how = {}) {
-        return detail::create_with(
-            options, how, [&](auto... rest) { return zarvo_writer_write(m_Writer.get(), path.c_str(), rest...); });
+        return detail::create_with(m_Runs.get(), options, how, [&](auto... rest) {
+            return zarvo_writer_write(m_Writer.get(), path.c_str(), rest...);
+        });
     }
 
 private:
     struct free_writer {
         void operator()(zarvo_writer* writer) const { zarvo_writer_free(writer); }
     };
+    std::shared_ptr<detail::active_runs> m_Runs = std::make_shared<detail::active_runs>();
     std::unique_ptr<zarvo_writer, free_writer> m_Writer;
 };
 

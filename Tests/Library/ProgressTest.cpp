@@ -126,6 +126,89 @@ TEST(Callbacks, NothingIsCalledAfterAnException) {
     EXPECT_EQ(0u, reports);
 }
 
+// The threads of a run call its archive's source, so their exceptions have to find the run.
+TEST(Callbacks, ExceptionsOfSourcesComeOutOfRuns) {
+    const std::string bytes = Archive(ManyFiles(11));
+    const TemporaryFolder folder;
+    const std::pair<const char*, std::function<zarvo::run_result(zarvo::archive&, const zarvo::run_options&)>> kRuns[] =
+        {
+            {"extract", [&](auto& archive, auto& run) { return archive.extract(folder / "out", run); }},
+            {"test", [](auto& archive, auto& run) { return archive.test(run); }},
+            {"visit", [](auto& archive, auto& run) { return archive.visit(run, {.bytes = [](auto&&...) {}}); }},
+        };
+    for (const auto& [name, run] : kRuns)
+        for (const uint32_t threads : {1u, 2u}) {
+            auto owned = std::make_unique<CountingSource>(bytes);
+            CountingSource* const source = owned.get();
+            zarvo::archive archive = *zarvo::archive::open(std::move(owned));
+            source->beforeRead = [] { throw std::runtime_error("from the source"); };
+            EXPECT_THROW((void)run(archive, {.threads = threads}), std::runtime_error) << name << ", " << threads;
+            source->beforeRead = nullptr;
+            EXPECT_EQ(ZARVO_OK, run(archive, {.threads = threads}).error.code()) << "after " << name << ", " << threads;
+        }
+}
+
+// Entries that failed because the source threw are not reported as failures of their own.
+TEST(Callbacks, NothingIsReportedAfterASourceThrows) {
+    auto owned = std::make_unique<CountingSource>(Archive({{.path = "a", .bytes = "1"}}));
+    CountingSource* const source = owned.get();
+    zarvo::archive archive = *zarvo::archive::open(std::move(owned));
+    source->beforeRead = [] { throw std::runtime_error("from the source"); };
+    size_t reports = 0;
+    zarvo::visit_options what;
+    what.bytes = [](auto&&...) {};
+    what.report = [&](const zarvo_report&) { ++reports; };
+    EXPECT_THROW((void)archive.visit({.threads = 1}, what), std::runtime_error);
+    EXPECT_EQ(0u, reports);
+}
+
+// A read in a callback of the run throws what its source threw, and the run goes on.
+TEST(Callbacks, ExceptionOfAReadLeavesTheRunAlone) {
+    auto owned = std::make_unique<CountingSource>(Archive({{.path = "a", .bytes = "1"}}));
+    CountingSource* const source = owned.get();
+    zarvo::archive archive = *zarvo::archive::open(std::move(owned), {.cache_bytes = 1});
+    source->beforeRead = [caller = std::this_thread::get_id()] {
+        if (std::this_thread::get_id() == caller) throw std::runtime_error("from the source");
+    };
+    size_t reports = 0;
+    zarvo::visit_options what;
+    what.bytes = [](auto&&...) {};
+    what.report = [&](const zarvo_report& report) {
+        EXPECT_THROW((void)Read(archive, report.index, 0, 1), std::runtime_error);
+        ++reports;
+    };
+    EXPECT_EQ(ZARVO_OK, archive.visit({.threads = 1}, what).error.code());
+    EXPECT_EQ(1u, reports);
+}
+
+TEST(Callbacks, ExceptionOfALogComesOutOfTheRun) {
+    const std::string bytes =
+        BuildArchive({.entries = {{.path = "a", .bytes = "1234"}},
+                      .blocks = {{.size = 4, .type = static_cast<CompressionType>(7), .stored = "????"}}})
+            .bytes;
+    zarvo::open_options options;
+    options.log = [](std::string_view) { throw std::runtime_error("from the log"); };
+    zarvo::archive archive = OpenBytes(bytes, std::move(options));
+    EXPECT_THROW((void)archive.test(), std::runtime_error);
+}
+
+// If it went on to the end, the run would read hundreds of times.
+TEST(Callbacks, ExceptionOfASourceStopsTheRun) {
+    const std::string text = SampleText(3'000'000);
+    auto owned = std::make_unique<CountingSource>(
+        BuildArchive({.entries = {{.path = "a", .bytes = text}}, .chunkSize = 30'000, .type = kCompressionLz4}).bytes);
+    CountingSource* const source = owned.get();
+    zarvo::archive archive = *zarvo::archive::open(std::move(owned));
+    int calls = 0;
+    source->beforeRead = [&] {
+        ++calls;
+        std::this_thread::sleep_for(std::chrono::milliseconds(50));
+        throw std::runtime_error("from the source");
+    };
+    EXPECT_THROW((void)archive.test({.threads = 1}), std::runtime_error);
+    EXPECT_GT(30, calls);
+}
+
 // An entry that is under way when the run is stopped is still told.
 TEST(Progress, OfAStoppedRunTellsWhatWasUnderWay) {
     const std::string text = SampleText(1'500'000);

@@ -71,6 +71,18 @@ TEST_F(Writer, NamesTheSourceThatFails) {
     }
 }
 
+TEST_F(Writer, ThrowsWhatASourceThrows) {
+    for (const uint32_t threads : {1u, 2u}) {
+        zarvo::writer writer;
+        auto source = std::make_unique<CountingSource>(SampleText(300'000));
+        source->beforeRead = [] { throw std::runtime_error("from the source"); };
+        EXPECT_FALSE(writer.add("bad", std::move(source)));
+        EXPECT_FALSE(writer.add("good", BytesOf("x")));
+        EXPECT_THROW((void)writer.write(Archive(), {.threads = threads}), std::runtime_error) << threads;
+        EXPECT_EQ(std::set<std::string>{}, Names());
+    }
+}
+
 TEST_F(Writer, ClosesItsSources) {
     struct Closing final : zarvo::source {
         explicit Closing(int* count) : closed(count) {}
