@@ -139,6 +139,8 @@ class Entry:
 
     def read(self) -> bytes:
         """Return the file's bytes."""
+        if self.kind == "file" and self.size <= _ONE_READ:  # most files; two calls less count where they are small
+            return self.archive._native.read(self.index, 0, self.size)
         return self._read_range(0, self.size)
 
     def open(self) -> io.BufferedReader:
