@@ -75,7 +75,7 @@ private:
         UInt64 lastUse = 0;
     };
 
-    // As Get, for another path than that of the last call, and keeps the last maxKept folders of the path open.
+    // As Get, without its short way for the path of the last call. Keeps the last maxKept folders of the path open.
     int Walk(core::string_ref path, size_t maxKept, Failure* failure);
     int Enter(int above, const char* name, Failure* failure);
     void CheckNames(int above, char* names, Failure* failure);
