@@ -1,5 +1,6 @@
 #include "Library/Writer/Encoders.h"
 
+#include "PlatformDependent/Linux/LargePages.h"
 #include "Runtime/Allocator/Allocator.h"
 
 #include <algorithm>
@@ -17,6 +18,13 @@ void Free(void* address) { free_alloc_internal(address, kMemLabelFileSystem, __F
 
 // The SDK's interfaces are structures of functions, which get a pointer to their structure.
 ISzAlloc s_Allocator = {[](void*, size_t size) { return Allocate(size); }, [](void*, void* address) { Free(address); }};
+// For what the match finder jumps about in.
+ISzAlloc s_TableAllocator = {[](void*, size_t size) {
+                                 void* const tables = Allocate(size);
+                                 PreferLargePages(tables, size);
+                                 return tables;
+                             },
+                             [](void*, void* address) { Free(address); }};
 
 struct StopCheck {
     explicit StopCheck(const std::atomic<bool>* flag) : isStopped(flag) {}
@@ -66,7 +74,7 @@ CLzmaEncHandle MakeLzmaEncoder(const EncoderSettings& settings) {
     return encoder;
 }
 
-void FreeLzmaEncoder(CLzmaEncHandle encoder) { LzmaEnc_Destroy(encoder, &s_Allocator, &s_Allocator); }
+void FreeLzmaEncoder(CLzmaEncHandle encoder) { LzmaEnc_Destroy(encoder, &s_Allocator, &s_TableAllocator); }
 
 void WriteLzmaProperties(CLzmaEncHandle encoder, UInt8 (&bytes)[kLzmaPropertiesSize]) {
     SizeT size = sizeof(bytes);
@@ -156,7 +164,7 @@ EncodeResult BlockEncoder::EncodeWithLzma(const UInt8* bytes, size_t size, UInt8
     SizeT coded = room - kLzmaPropertiesSize;
     StopCheck check(isStopped);
     const SRes result = LzmaEnc_MemEncode(m_State, out + kLzmaPropertiesSize, &coded, bytes, size,
-                                          m_Settings.endMark ? 1 : 0, check.Get(), &s_Allocator, &s_Allocator);
+                                          m_Settings.endMark ? 1 : 0, check.Get(), &s_Allocator, &s_TableAllocator);
     *outSize = kLzmaPropertiesSize + coded;
     return ResultOf(result);
 }
@@ -172,7 +180,7 @@ EncodeResult EncodeLzmaStream(const EncoderSettings& settings, StreamEnds* ends,
     output.hasFailed = !ends->Write(properties, sizeof(properties));
     SRes result = SZ_OK;
     if (!output.hasFailed)
-        result = LzmaEnc_Encode(encoder, &output.stream, &input.stream, check.Get(), &s_Allocator, &s_Allocator);
+        result = LzmaEnc_Encode(encoder, &output.stream, &input.stream, check.Get(), &s_Allocator, &s_TableAllocator);
     FreeLzmaEncoder(encoder);
     if (input.hasFailed) return EncodeResult::kInputFailed;
     if (output.hasFailed) return EncodeResult::kOutputFailed;

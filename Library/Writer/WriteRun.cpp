@@ -1,6 +1,7 @@
 #include "Library/Writer/WriteRun.h"
 
 #include "Library/Resources.h"
+#include "PlatformDependent/Linux/LargePages.h"
 #include "Runtime/VirtualFileSystem/ArchiveFileSystem/ArchiveStorageHeader.h"
 
 #include <algorithm>
@@ -57,6 +58,7 @@ bool WriteRun::PrepareSlots(UInt32 threads) {
     if (!m_Slots.resize_initialized(count, kResizeExact) || !m_Free.reserve(count)) return false;
     for (Slot& slot : m_Slots) {
         if (!slot.plain.resize_uninitialized(size, kResizeExact)) return false;
+        PreferLargePages(slot.plain.data(), size); // encoders look back at it
         if (isCoded && !slot.coded.resize_uninitialized(size, kResizeExact)) return false;
         m_Free.push_back(&slot);
     }
