@@ -78,21 +78,23 @@ PyObject* OpenWith(PyObject* name, std::unique_ptr<PythonSource> source, Open op
     return owner.release();
 }
 
-zarvo_open_options MakeOptions(uint64_t offset) {
-    zarvo_open_options options = ZARVO_OPEN_OPTIONS_INIT;
-    options.offset = offset;
-    return options;
+// A converter of PyArg_ParseTuple ("O&"): stores the tuple (offset, max_entries, max_directory_bytes, max_block_bytes,
+// cache_bytes) in a zarvo_open_options.
+int ConvertOptions(PyObject* numbers, void* options) {
+    auto* const stored = static_cast<zarvo_open_options*>(options);
+    return PyArg_ParseTuple(numbers, "O&O&O&O&O&", ConvertCount, &stored->offset, ConvertCount, &stored->max_entries,
+                            ConvertCount, &stored->max_directory_bytes, ConvertCount, &stored->max_block_bytes,
+                            ConvertCount, &stored->cache_bytes);
 }
 
 PyObject* OpenPath(PyObject*, PyObject* arguments) {
     PyObject* path = nullptr;
     PyObject* name = nullptr;
-    uint64_t offset = 0;
-    if (!PyArg_ParseTuple(arguments, "O&UO&", PyUnicode_FSConverter, &path, &name, ConvertCount, &offset))
+    zarvo_open_options options = ZARVO_OPEN_OPTIONS_INIT;
+    if (!PyArg_ParseTuple(arguments, "O&UO&", PyUnicode_FSConverter, &path, &name, ConvertOptions, &options))
         return nullptr;
     const Reference owned(path);
     const char* const text = PyBytes_AsString(path);
-    const zarvo_open_options options = MakeOptions(offset);
     return OpenWith(name, nullptr, [&](zarvo_archive** archive, zarvo_error** error) {
         return zarvo_open_path(text, &options, archive, error);
     });
@@ -101,9 +103,8 @@ PyObject* OpenPath(PyObject*, PyObject* arguments) {
 PyObject* OpenDescriptor(PyObject*, PyObject* arguments) {
     int descriptor = -1;
     PyObject* name = nullptr;
-    uint64_t offset = 0;
-    if (!PyArg_ParseTuple(arguments, "iUO&", &descriptor, &name, ConvertCount, &offset)) return nullptr;
-    const zarvo_open_options options = MakeOptions(offset);
+    zarvo_open_options options = ZARVO_OPEN_OPTIONS_INIT;
+    if (!PyArg_ParseTuple(arguments, "iUO&", &descriptor, &name, ConvertOptions, &options)) return nullptr;
     return OpenWith(name, nullptr, [&](zarvo_archive** archive, zarvo_error** error) {
         return zarvo_open_descriptor(descriptor, &options, archive, error);
     });
@@ -113,12 +114,11 @@ PyObject* OpenSource(PyObject*, PyObject* arguments) {
     PyObject* readAt = nullptr;
     uint64_t size = 0;
     PyObject* name = nullptr;
-    uint64_t offset = 0;
-    if (!PyArg_ParseTuple(arguments, "OO&UO&", &readAt, ConvertCount, &size, &name, ConvertCount, &offset))
+    zarvo_open_options options = ZARVO_OPEN_OPTIONS_INIT;
+    if (!PyArg_ParseTuple(arguments, "OO&UO&", &readAt, ConvertCount, &size, &name, ConvertOptions, &options))
         return nullptr;
     auto source = std::make_unique<PythonSource>(readAt, size);
     const zarvo_source callbacks = source->MakeCallbacks();
-    const zarvo_open_options options = MakeOptions(offset);
     return OpenWith(name, std::move(source), [&](zarvo_archive** archive, zarvo_error** error) {
         return zarvo_open_source(&callbacks, &options, archive, error);
     });

@@ -49,13 +49,13 @@ PyObject* CreateArchive(PyObject*, PyObject* arguments) {
     PyObject* path = nullptr;
     PyObject* folder = nullptr;
     PyObject* excluded = nullptr;
-    uint64_t threads = 0;
+    uint64_t threads = 0, memory = 0;
     PyObject* progress = nullptr;
     zarvo_create_options how = ZARVO_CREATE_OPTIONS_INIT;
-    if (!PyArg_ParseTuple(arguments, "O&O&OO&iiipO&zzpO", PyUnicode_FSConverter, &path, PyUnicode_FSConverter, &folder,
-                          &excluded, ConvertCount, &threads, &how.layout, &how.compression, &how.level,
-                          &how.is_streamed, ConvertCount, &how.block_size, &how.engine_version, &how.engine_revision,
-                          &how.force, &progress)) {
+    if (!PyArg_ParseTuple(arguments, "O&O&OO&O&iiipO&zzppO", PyUnicode_FSConverter, &path, PyUnicode_FSConverter,
+                          &folder, &excluded, ConvertCount, &threads, ConvertCount, &memory, &how.layout,
+                          &how.compression, &how.level, &how.is_streamed, ConvertCount, &how.block_size,
+                          &how.engine_version, &how.engine_revision, &how.force, &how.dry_run, &progress)) {
         Py_XDECREF(folder);
         return nullptr;
     }
@@ -69,6 +69,7 @@ PyObject* CreateArchive(PyObject*, PyObject* arguments) {
     how.report = TakeReport;
     zarvo_run_options options = ZARVO_RUN_OPTIONS_INIT;
     options.threads = LimitThreads(threads);
+    options.memory = memory;
     options.excluded = excludedPatterns.Get();
     options.progress = TellProgress;
     options.context = &creation;

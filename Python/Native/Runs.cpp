@@ -127,9 +127,10 @@ bool HasEndedWell(Run* run, LibraryCall* call, zarvo_code code, const std::strin
     return false;
 }
 
-zarvo_run_options MakeRunOptions(Run* run, uint64_t threads) {
+zarvo_run_options MakeRunOptions(Run* run, uint64_t threads, uint64_t memory) {
     zarvo_run_options options = ZARVO_RUN_OPTIONS_INIT;
     options.threads = LimitThreads(threads);
+    options.memory = memory;
     options.progress = TellProgress;
     options.context = run;
     return options;
@@ -145,11 +146,12 @@ PyObject* ExtractArchive(PyObject* self, PyObject* arguments) {
     PyObject* folder = nullptr;
     PyObject* wanted = nullptr;
     PyObject* excluded = nullptr;
-    uint64_t threads = 0, strip = 0;
+    uint64_t threads = 0, memory = 0;
     PyObject* progress = nullptr;
     zarvo_extract_options how = ZARVO_EXTRACT_OPTIONS_INIT;
-    if (!PyArg_ParseTuple(arguments, "O&OOO&iO&pO", PyUnicode_FSConverter, &folder, &wanted, &excluded, ConvertCount,
-                          &threads, &how.overwrite, ConvertCount, &strip, &how.keep_broken, &progress))
+    if (!PyArg_ParseTuple(arguments, "O&OOO&O&iO&ppO&O", PyUnicode_FSConverter, &folder, &wanted, &excluded,
+                          ConvertCount, &threads, ConvertCount, &memory, &how.overwrite, ConvertCount, &how.strip,
+                          &how.keep_broken, &how.dry_run, ConvertCount, &how.max_bytes, &progress))
         return nullptr;
     const Reference folderBytes(folder);
     const char* const folderText = PyBytes_AsString(folder);
@@ -157,9 +159,8 @@ PyObject* ExtractArchive(PyObject* self, PyObject* arguments) {
     if (!wantedPatterns.Add(wanted) || !excludedPatterns.Add(excluded)) return nullptr;
 
     Run run(self, progress);
-    how.strip = strip;
     how.report = TakeReport;
-    zarvo_run_options options = MakeRunOptions(&run, threads);
+    zarvo_run_options options = MakeRunOptions(&run, threads, memory);
     options.wanted = wantedPatterns.Get();
     options.excluded = excludedPatterns.Get();
     zarvo_summary summary = ZARVO_SUMMARY_INIT;
@@ -167,7 +168,8 @@ PyObject* ExtractArchive(PyObject* self, PyObject* arguments) {
     if (!call.IsAllowed()) return nullptr;
     const zarvo_code code = call.Unlocked(
         [&] { return zarvo_extract(run.self->archive, folderText, &options, &how, &summary, call.Error()); });
-    if (!HasEndedWell(&run, &call, code, folderText)) return nullptr;
+    const std::string subject = code == ZARVO_ERROR_SYSTEM ? folderText : *run.self->name;
+    if (!HasEndedWell(&run, &call, code, subject)) return nullptr;
 
     const Reference failures(PyList_New(0));
     if (failures == nullptr) return nullptr;
@@ -179,11 +181,11 @@ PyObject* ExtractArchive(PyObject* self, PyObject* arguments) {
 }
 
 PyObject* TestArchive(PyObject* self, PyObject* arguments) {
-    uint64_t threads = 0;
+    uint64_t threads = 0, memory = 0;
     PyObject* progress = nullptr;
-    if (!PyArg_ParseTuple(arguments, "O&O", ConvertCount, &threads, &progress)) return nullptr;
+    if (!PyArg_ParseTuple(arguments, "O&O&O", ConvertCount, &threads, ConvertCount, &memory, &progress)) return nullptr;
     Run run(self, progress);
-    const zarvo_run_options options = MakeRunOptions(&run, threads);
+    const zarvo_run_options options = MakeRunOptions(&run, threads, memory);
     zarvo_test_options what = ZARVO_TEST_OPTIONS_INIT;
     what.block = TakeDamagedBlock;
     what.entry = TakeDamagedEntry;

@@ -29,10 +29,11 @@ private:
 // For zarvo_run_options.
 uint32_t LimitThreads(uint64_t threads);
 
-// Archive.extract(folder, patterns, excluded, threads, overwrite, strip, keep_broken, progress). Returns the summary,
-// the failures of entries as (number, exception), and the numbers of patterns that matched nothing.
+// Archive.extract(folder, patterns, excluded, threads, memory, overwrite, strip, keep_broken, dry_run, max_bytes,
+// progress). Returns the summary, the failures of entries as (number, exception), and the numbers of patterns that
+// matched nothing.
 PyObject* ExtractArchive(PyObject* self, PyObject* arguments);
 
-// Archive.test(threads, progress). Returns the summary, the damaged entries as (number, readable bytes), and the
-// damaged blocks as (number, text).
+// Archive.test(threads, memory, progress). Returns the summary, the damaged entries as (number, readable bytes), and
+// the damaged blocks as (number, text).
 PyObject* TestArchive(PyObject* self, PyObject* arguments);

@@ -22,6 +22,7 @@ if TYPE_CHECKING:
 _LAYOUTS = ("ZarvoFS", "ZarvoWeb", "ZarvoRaw", "ZarvoArchive")
 _COMPRESSIONS = ("none", "lzma", "lz4", "lz4hc")
 _OVERWRITE = ("always", "never", "fail")
+_OPEN_OPTIONS = ("offset", "max_entries", "max_directory_bytes", "max_block_bytes", "cache_bytes")
 
 # A larger file is read piece by piece, so that the user can interrupt.
 _ONE_READ = 1 << 24
@@ -189,8 +190,8 @@ def _count_to_read(start: int, end: int, data_end: int) -> int:
     return max(0, min(end, max(start, data_end) + 1) - start)
 
 
-def _reopen(file: str | BinaryIO, offset: int) -> Archive:
-    return Archive(file, offset=offset)
+def _reopen(file: str | BinaryIO, options: dict[str, int]) -> Archive:
+    return Archive(file, **options)
 
 
 def _get_entry(archive: Archive, index: int) -> Entry:
@@ -210,16 +211,26 @@ class Archive(Mapping[str, Entry]):
     name: the path that it was opened by, or the name of the file object.
     """
 
-    def __init__(self, file: StrPath | BinaryIO, *, offset: int = 0) -> None:
+    def __init__(
+        self,
+        file: StrPath | BinaryIO,
+        *,
+        offset: int = 0,
+        max_entries: int = 0,
+        max_directory_bytes: int = 0,
+        max_block_bytes: int = 0,
+        cache_bytes: int = 0,
+    ) -> None:
         self._handle: _native.Archive | None = None
-        self._offset = offset
+        options = (offset, max_entries, max_directory_bytes, max_block_bytes, cache_bytes)
+        self._options = dict(zip(_OPEN_OPTIONS, options))
         self._info: Info | None = None
         self._length: int | None = None
         self._file: str | BinaryIO
         if isinstance(file, (str, os.PathLike)):
             self._file = os.path.abspath(file)  # where an unpickled copy finds it
             self.name: str = os.fspath(file)
-            self._handle = _native.open_path(file, self.name, offset)
+            self._handle = _native.open_path(file, self.name, options)
             return
         if not hasattr(file, "seek"):
             given = type(file).__name__
@@ -228,10 +239,10 @@ class Archive(Mapping[str, Entry]):
         self.name = str(getattr(file, "name", file))
         if _is_plain_file(file):
             file.flush()  # what was written and is not in the file yet
-            self._handle = _native.open_descriptor(file.fileno(), self.name, offset)
+            self._handle = _native.open_descriptor(file.fileno(), self.name, options)
         else:
             source = _FileSource(file)
-            self._handle = _native.open_source(source.read_at, source.size(), self.name, offset)
+            self._handle = _native.open_source(source.read_at, source.size(), self.name, options)
 
     @property
     def _native(self) -> _native.Archive:
@@ -314,9 +325,12 @@ class Archive(Mapping[str, Entry]):
         patterns: Iterable[str] | None = None,
         exclude: Iterable[str] | None = None,
         threads: int = 0,
+        memory: int = 0,
         overwrite: str = "always",
         strip: int = 0,
         keep_broken: bool = False,
+        dry_run: bool = False,
+        max_bytes: int = 0,
         progress: Callable[[Progress], object] | None = None,
     ) -> Extracted:
         """Write entries below a folder, which is made if it is missing. Nothing is written outside it.
@@ -324,13 +338,18 @@ class Archive(Mapping[str, Entry]):
         patterns: which entries to take, as for glob(). Default: all.
         exclude: which of them to leave out.
         threads: at most so many; 0 is one per processor.
+        memory: bytes that blocks may take while they are decoded, each twice its size; 0 is half of what is free. With
+            too little for all threads, fewer work; entries of a block that is too large even for one fail.
         overwrite: "always" replaces files that are there, "never" leaves them, and "fail" takes them for failures.
         strip: how many leading components each path loses.
         keep_broken: whether the bytes of a damaged file before the damage are written.
+        dry_run: whether everything is only read and decoded, and nothing is written.
+        max_bytes: of all files together; 0 is no limit.
         progress: called ten times a second. An exception that it raises ends the extraction.
 
         Raises ExtractionFailed at the end if entries failed or a pattern matches nothing. A disk that is full or can't
-        be written ends the extraction with an OSError.
+        be written ends the extraction with an OSError, and files of more than max_bytes are a LimitExceeded before
+        anything is written.
         """
         wanted = _to_list("patterns", patterns)
         summary, failed, unused = self._native.extract(
@@ -338,9 +357,12 @@ class Archive(Mapping[str, Entry]):
             wanted,
             _to_list("exclude", exclude),
             threads,
+            memory,
             _choose("overwrite", overwrite, _OVERWRITE),
             strip,
             keep_broken,
+            dry_run,
+            max_bytes,
             _wrap_progress(progress),
         )
         from ._records import Extracted
@@ -353,7 +375,7 @@ class Archive(Mapping[str, Entry]):
         return extracted
 
     def test(
-        self, *, threads: int = 0, progress: Callable[[Progress], object] | None = None
+        self, *, threads: int = 0, memory: int = 0, progress: Callable[[Progress], object] | None = None
     ) -> TestResult:
         """Decode every block once, and write nothing. Parameters are those of extract().
 
@@ -361,7 +383,7 @@ class Archive(Mapping[str, Entry]):
         """
         from ._records import Damage, TestResult
 
-        summary, entries, blocks = self._native.test(threads, _wrap_progress(progress))
+        summary, entries, blocks = self._native.test(threads, memory, _wrap_progress(progress))
         damaged = []
         for index, readable in entries:
             entry = _get_entry(self, index)
@@ -372,7 +394,7 @@ class Archive(Mapping[str, Entry]):
         return f"<zarvo.Archive {self.name!r}{' (closed)' if self.closed else ''}>"
 
     def __reduce__(self) -> tuple[Any, ...]:
-        return (_reopen, (self._file, self._offset))
+        return (_reopen, (self._file, self._options))
 
 
 def _choose(name: str, word: str, words: tuple[str, ...]) -> int:
@@ -404,16 +426,35 @@ def _wrap_progress(progress: Callable[[Progress], object] | None) -> Callable[..
     return lambda *numbers: told(Progress(*numbers))
 
 
-def open(file: StrPath | BinaryIO, *, offset: int = 0) -> Archive:
+def open(
+    file: StrPath | BinaryIO,
+    *,
+    offset: int = 0,
+    max_entries: int = 0,
+    max_directory_bytes: int = 0,
+    max_block_bytes: int = 0,
+    cache_bytes: int = 0,
+) -> Archive:
     """Open an archive, and read its header and directory.
 
     file: a path, or a binary file object that can seek, which stays open when the archive is closed. Nobody else may
     use the file object meanwhile. Exceptions that it raises come out of the call that reads.
     offset: of the archive's first byte in the file.
+    max_entries, max_directory_bytes: limits for the directory, in entries and in decoded bytes; 0 is 2^26 and 2^30.
+    max_block_bytes: limit for the decoded bytes of a block that is held in memory whole; 0 is 2^31.
+    cache_bytes: what decoded blocks may take between calls, so that the next read need not decode them again; 0 is
+        2^23.
 
-    Raises BadArchive when it is no archive, and OSError when it can't be read.
+    Raises BadArchive when it is no archive, LimitExceeded when it exceeds a limit, and OSError when it can't be read.
     """
-    return Archive(file, offset=offset)
+    return Archive(
+        file,
+        offset=offset,
+        max_entries=max_entries,
+        max_directory_bytes=max_directory_bytes,
+        max_block_bytes=max_block_bytes,
+        cache_bytes=cache_bytes,
+    )
 
 
 def create(
@@ -429,7 +470,9 @@ def create(
     engine_revision: str | None = None,
     exclude: Iterable[str] | None = None,
     force: bool = False,
+    dry_run: bool = False,
     threads: int = 0,
+    memory: int = 0,
     progress: Callable[[Progress], object] | None = None,
 ) -> Created:
     """Make an archive of the files and folders below a folder. The same files and options give the same bytes.
@@ -442,7 +485,9 @@ def create(
     engine_version, engine_revision: what the archive says it is for.
     exclude: patterns of what is left out.
     force: whether an archive that is there is replaced.
+    dry_run: whether only folders are read, and nothing is written.
     threads, progress: as for Archive.extract().
+    memory: bytes that all threads may take together; 0 is half of what is free.
 
     Raises CreationFailed if a file can't be read or the layout can't hold it, FileExistsError for an archive that is
     there, and ValueError for options that the layout does not allow. Then, and after an exception of progress, there is
@@ -453,6 +498,7 @@ def create(
         folder,
         _to_list("exclude", exclude),
         threads,
+        memory,
         _choose("layout", layout, _LAYOUTS),
         -1 if compression is None else _choose("compression", compression, _COMPRESSIONS),
         _to_level(level),
@@ -461,6 +507,7 @@ def create(
         engine_version,
         engine_revision,
         force,
+        dry_run,
         _wrap_progress(progress),
     )
     if failures:

@@ -28,7 +28,7 @@ class UnsupportedData(Error, NotImplementedError):
 
 
 class LimitExceeded(Error):
-    """The archive needs more than a limit of the library allows."""
+    """A limit, given or the library's own, would be exceeded."""
 
 
 class ArchiveChanged(Error):

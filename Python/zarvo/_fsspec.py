@@ -34,24 +34,27 @@ class ZarvoFileSystem(fsspec.AbstractFileSystem):  # type: ignore[misc]
         fo: Any,
         target_protocol: str | None = None,
         target_options: dict[str, Any] | None = None,
+        archive_options: dict[str, Any] | None = None,
         **kwargs: Any,
     ) -> None:
         """
         fo: the archive: a URL or a path, or a binary file object that can seek.
         target_protocol: of the URL, if it does not begin with it.
         target_options: what the archive's own file system is made with.
+        archive_options: what zarvo.open is called with: the offset, and limits.
         """
         super().__init__(**kwargs)
+        options = archive_options or {}
         if not isinstance(fo, str):
-            self.archive = Archive(fo)
+            self.archive = Archive(fo, **options)
             return
         there = fsspec.open(fo, "rb", protocol=target_protocol, **(target_options or {}))
         if isinstance(there.fs, LocalFileSystem):
-            self.archive = Archive(there.path)
+            self.archive = Archive(there.path, **options)
             return
         file = there.fs.open(there.path, "rb", block_size=_READ_AHEAD, cache_type="readahead")
         # The file system "memory" gives the same object, with one position, to everybody who opens the file.
-        self.archive = Archive(io.BytesIO(file.getvalue()) if isinstance(file, io.BytesIO) else file)
+        self.archive = Archive(io.BytesIO(file.getvalue()) if isinstance(file, io.BytesIO) else file, **options)
 
     @classmethod
     def _strip_protocol(cls, path: Any) -> Any:

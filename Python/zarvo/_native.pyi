@@ -7,6 +7,8 @@ _Info = tuple[int, int, str, str, int, int, int, int, tuple[int, int, int, int, 
 # Number, path, kind, size, offset, flags.
 EntryFields = tuple[int, str, str, int, int, int]
 _Summary = tuple[int, int, int, int]
+# Offset, max_entries, max_directory_bytes, max_block_bytes, cache_bytes; a zero asks for the default.
+OpenOptions = tuple[int, int, int, int, int]
 _Progress = Callable[[int, int, int, int], object]
 
 class Archive:
@@ -29,14 +31,17 @@ class Archive:
         patterns: list[str] | None,
         exclude: list[str] | None,
         threads: int,
+        memory: int,
         overwrite: int,
         strip: int,
         keep_broken: bool,
+        dry_run: bool,
+        max_bytes: int,
         progress: _Progress | None,
         /,
     ) -> tuple[_Summary, list[tuple[int, Exception]], list[int]]: ...
     def test(
-        self, threads: int, progress: _Progress | None, /
+        self, threads: int, memory: int, progress: _Progress | None, /
     ) -> tuple[_Summary, list[tuple[int, int]], list[tuple[int, str]]]: ...
 
 class Stream:
@@ -49,6 +54,7 @@ def create(
     folder: str | bytes | PathLike[str] | PathLike[bytes],
     exclude: list[str] | None,
     threads: int,
+    memory: int,
     layout: int,
     compression: int,
     level: int,
@@ -57,13 +63,14 @@ def create(
     engine_version: str | None,
     engine_revision: str | None,
     force: bool,
+    dry_run: bool,
     progress: _Progress | None,
     /,
 ) -> tuple[int, int, int, int, list[tuple[str, str]], list[tuple[str, Exception]]]: ...
 def open_path(
-    path: str | bytes | PathLike[str] | PathLike[bytes], name: str, offset: int, /
+    path: str | bytes | PathLike[str] | PathLike[bytes], name: str, options: OpenOptions, /
 ) -> Archive: ...
-def open_descriptor(descriptor: int, name: str, offset: int, /) -> Archive: ...
+def open_descriptor(descriptor: int, name: str, options: OpenOptions, /) -> Archive: ...
 def open_source(
-    read_at: Callable[[int, int], bytes], size: int, name: str, offset: int, /
+    read_at: Callable[[int, int], bytes], size: int, name: str, options: OpenOptions, /
 ) -> Archive: ...

@@ -13,6 +13,8 @@ STORED, LZMA, UNKNOWN = 0, 1, 9
 
 FOLDER = None  # in place of a file's bytes
 
+ROAD = pathlib.Path(__file__).parents[2] / "Samples" / "road.zarvo"
+
 
 def compress(data: bytes) -> bytes:
     alone = lzma.compress(data, lzma.FORMAT_ALONE, preset=0)

@@ -15,9 +15,7 @@ import unittest
 import zipfile
 
 import zarvo
-from archives import FOLDER, LZMA, TEXT, TREE, UNKNOWN, ArchiveTest, build
-
-ROAD = pathlib.Path(__file__).parents[2] / "Samples" / "road.zarvo"
+from archives import FOLDER, LZMA, ROAD, TEXT, TREE, UNKNOWN, ArchiveTest, build
 
 
 class Mapping(ArchiveTest):
@@ -202,6 +200,38 @@ class Errors(ArchiveTest):
             file.write(b"more")
         with self.assertRaises(zarvo.ArchiveChanged):
             archive["tables/one.csv"].read()
+
+
+class Limits(ArchiveTest):
+    def test_are_kept_by_every_way_to_open(self):
+        for options, message in (
+            ({"max_entries": 5}, r"6 entries; the limit \(max_entries\) is 5"),
+            ({"max_directory_bytes": 100}, r"the limit \(max_directory_bytes\) is 100"),
+        ):
+            with open(ROAD, "rb") as file:
+                for source in (ROAD, file, io.BytesIO(ROAD.read_bytes())):
+                    with self.assertRaisesRegex(zarvo.LimitExceeded, message, msg=source):
+                        zarvo.open(source, **options)
+        zarvo.open(ROAD, max_entries=6).close()
+        with self.assertRaises(ValueError):
+            zarvo.open(ROAD, max_entries=-1)
+
+    def test_of_blocks_are_kept_by_reads(self):
+        archive = zarvo.open(ROAD, max_block_bytes=16383)
+        for limited in (archive, pickle.loads(pickle.dumps(archive))):
+            with self.assertRaisesRegex(zarvo.LimitExceeded, "block 0 of 16384 bytes is too large"):
+                limited["readme.txt"].read()
+        self.assertEqual(47, len(zarvo.open(ROAD, max_block_bytes=16384)["readme.txt"].read()))
+
+    def test_of_the_cache_make_reads_decode_again(self):
+        for options, is_read_again in (({}, False), ({"cache_bytes": 1}, True)):
+            file = FlakyFile(ROAD.read_bytes())
+            archive = zarvo.open(file, **options)
+            archive["readme.txt"].read()
+            archive["road/of/one/file.txt"].read()  # of the last block
+            before = file.left
+            archive["readme.txt"].read()
+            self.assertEqual(is_read_again, file.left < before, options)
 
 
 class FlakyFile(io.BytesIO):

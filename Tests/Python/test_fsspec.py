@@ -149,6 +149,15 @@ class FileSystem(ArchiveTest):
         self.assertEqual(entries[250][1], there.cat("c/50"))
         self.assertLessEqual(sum(Elsewhere.fetched) - before, (1 << 16) * 2 + block)
 
+    def test_gives_options_to_the_archive(self):
+        archive = self.path.read_bytes()
+        self.path.write_bytes(b"front" + archive)
+        for fo in (str(self.path), f"elsewhere://{self.path}", io.BytesIO(b"front" + archive)):
+            fs = fsspec.filesystem("zarvo", fo=fo, archive_options={"offset": 5})
+            self.assertEqual(TEXT, fs.cat("tables/one.csv"), fo)
+        with self.assertRaises(zarvo.LimitExceeded):
+            fsspec.filesystem("zarvo", fo=str(self.path), archive_options={"offset": 5, "max_entries": 3})
+
     def test_can_be_pickled_and_made_of_file_objects(self):
         there = fsspec.filesystem("zarvo", fo=f"elsewhere://{self.path}")
         for made in (self.fs, there, fsspec.filesystem("zarvo", fo=io.BytesIO(self.path.read_bytes()))):

@@ -4,7 +4,7 @@ import pickle
 import unittest
 
 import zarvo
-from archives import FOLDER, LZMA, TEXT, TREE, ArchiveTest
+from archives import FOLDER, LZMA, ROAD, TEXT, TREE, ArchiveTest
 
 
 class Extraction(ArchiveTest):
@@ -90,6 +90,29 @@ class Extraction(ArchiveTest):
             archive.extract(self.folder / "a.zarvo")
         self.assertEqual(str(self.folder / "a.zarvo"), caught.exception.filename)
 
+    def test_keeps_limits(self):
+        archive = zarvo.open(ROAD)
+        with self.assertRaisesRegex(zarvo.LimitExceeded, r"road.zarvo: .*; the limit \(max_bytes\) is 78353"):
+            archive.extract(self.folder / "out", max_bytes=78353)
+        self.assertFalse((self.folder / "out").exists())
+        with self.assertRaises(zarvo.ExtractionFailed) as caught:
+            archive.extract(self.folder / "out", memory=16384)
+        failed = {path: type(error) for path, error in caught.exception.failures}
+        self.assertEqual(
+            dict.fromkeys(("readme.txt", "tables/squares.csv", "road/of/one/file.txt"), zarvo.LimitExceeded), failed
+        )
+        tested = archive.test(memory=16384)
+        self.assertEqual("block 0 of 16384 bytes is too large to be held in memory", tested.blocks[0])
+        self.assertEqual(4, archive.extract(self.folder / "out", max_bytes=78354, memory=32768).files)
+
+    def test_of_a_dry_run_writes_nothing(self):
+        archive = self.open([("good", b"2"), ("broken", TEXT)], kind=LZMA, damage=[1])
+        with self.assertRaises(zarvo.ExtractionFailed) as caught:
+            archive.extract(self.folder / "out", dry_run=True)
+        self.assertEqual(["broken"], [path for path, _ in caught.exception.failures])
+        self.assertEqual(1, caught.exception.extracted.files)
+        self.assertFalse((self.folder / "out").exists())
+
     def test_of_nothing_names_damage(self):
         archive = self.open([("good", b"2"), ("broken", TEXT)], kind=LZMA, damage=[1])
         result = archive.test(threads=2)
@@ -132,6 +155,17 @@ class Creation(ArchiveTest):
             self.assertGreater(getattr(info.blocks, kind), 0, options)
             self.assertEqual(options.get("layout", "ZarvoFS"), info.layout)
             self.assertEqual(options.get("engine_version", "5.x.x"), info.engine_version)
+
+    def test_keeps_its_limit_of_memory(self):
+        with self.assertRaisesRegex(zarvo.LimitExceeded, "bytes of memory, and the limit is 4096"):
+            zarvo.create(self.new, self.made_of, memory=4096)
+        self.assertFalse(self.new.exists())
+
+    def test_of_a_dry_run_writes_nothing(self):
+        (self.made_of / "link").symlink_to("readme.txt")
+        created = zarvo.create(self.new, self.made_of, dry_run=True)
+        self.assertEqual((4, ["link"]), (created.files, [path for path, _ in created.left_out]))
+        self.assertFalse(self.new.exists())
 
     def test_says_what_it_leaves_out(self):
         (self.made_of / "link").symlink_to("readme.txt")
