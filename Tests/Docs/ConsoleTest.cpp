@@ -3,6 +3,7 @@
 #include "Tests/Docs/ScriptFolder.h"
 
 #include <regex>
+#include <set>
 
 namespace fs = std::filesystem;
 
@@ -57,7 +58,24 @@ protected:
         Replace("python3", "PYTHONPATH=" ZARVO_PYTHON_PATH " exec /usr/bin/python3 \"$@\"");
     }
 
-    Transcript RunLine(const std::string& command) { return Run("/bin/bash", {"-c", command}); }
+    // Runs a line of shell where the lines before it have gone to.
+    Transcript RunLine(const std::string& command) {
+        const std::string placeFile = m_Folder / "build/place";
+        const std::string shell = "cd \"$1\" && trap 'pwd >\"$2\"' EXIT\n" + command;
+        const Transcript transcript = Run("/bin/bash", {"-c", shell, "bash", m_Place, placeFile});
+        m_Place = ReadFile(placeFile);
+        m_Place.pop_back(); // the newline
+        return transcript;
+    }
+
+    std::set<std::string> ListRoot() const {
+        std::set<std::string> names;
+        for (const fs::directory_entry& entry : fs::directory_iterator(m_Folder.Path()))
+            names.insert(entry.path().filename());
+        return names;
+    }
+
+    std::string m_Place = m_Folder.Path();
 };
 
 class ConsoleOf : public Console, public testing::WithParamInterface<const char*> {};
@@ -67,6 +85,7 @@ INSTANTIATE_TEST_SUITE_P(Documents, ConsoleOf, testing::Values("README.md", "doc
 TEST_P(ConsoleOf, PrintsWhatTheDocumentShows) {
     const std::vector<Step> steps = ReadSteps(VARNEX_SOURCE_DIR "/" + std::string(GetParam()));
     EXPECT_LT(3u, steps.size());
+    const std::set<std::string> namesBefore = ListRoot();
     const bool canMount = access("/dev/fuse", R_OK | W_OK) == 0;
     const bool canImport = *ZARVO_PYTHON_PATH != '\0' && !VARNEX_SANITIZED; // Python itself is not sanitized
     std::string leftOut;
@@ -82,6 +101,7 @@ TEST_P(ConsoleOf, PrintsWhatTheDocumentShows) {
         EXPECT_EQ(0, status) << step.command;
         EXPECT_EQ(WithoutSeconds(step.output), WithoutSeconds(output)) << step.command;
     }
+    EXPECT_EQ(namesBefore, ListRoot()); // build/ and *_data are no part of the source
     if (!leftOut.empty()) GTEST_SKIP() << "this system can't run:" << leftOut;
 }
 
