@@ -19,6 +19,8 @@ int ConvertCount(PyObject* number, void* count) {
     if (PyErr_Occurred() == nullptr) return 1;
     if (PyErr_ExceptionMatches(PyExc_OverflowError) != 0)
         PyErr_Format(PyExc_ValueError, "%S is not a number from 0 to 2^64 - 1", number);
+    else if (PyErr_ExceptionMatches(PyExc_TypeError) != 0)
+        PyErr_Format(PyExc_TypeError, "expected an int, not %R", number);
     return 0;
 }
 
