@@ -218,9 +218,8 @@ std::string DescribeSubcommand(const Subcommand& subcommand) {
     text += ".\n";
     text[text.find("\n\n") + 2] -= 'a' - 'A';
     const bool hasPatterns = subcommand.operands.find("PATTERN") != std::string_view::npos;
-    if (!subcommand.about.empty() || hasPatterns) text += '\n';
-    text += subcommand.about;
-    if (hasPatterns) text += kAboutPatterns;
+    if (!subcommand.about.empty()) (text += '\n') += subcommand.about;
+    if (hasPatterns) (text += '\n') += kAboutPatterns;
 
     std::vector<std::pair<std::string, std::string_view>> rows;
     if (isNone) {
