@@ -28,8 +28,9 @@ TEST_F(Scripts, AskForAllTheirPackagesAtOnce) {
     const std::string build = "g++ cmake ninja-build liblz4-dev lzma-dev libcli11-dev nlohmann-json3-dev libssl-dev "
                               "libfuse3-dev ",
                       test = build + "libgtest-dev clang libclang-rt-14-dev llvm jq fuse3 python3-dev python3-fsspec",
-                      lint = build + "libgtest-dev libbenchmark-dev liblzma-dev clang clang-tidy-14 gcovr mandoc git python3 "
-                                     "python3-dev";
+                      lint = build +
+                             "libgtest-dev libbenchmark-dev liblzma-dev clang clang-tidy-14 gcovr mandoc git python3 "
+                             "python3-dev";
     struct Row {
         std::string script;
         std::vector<std::string> arguments;
