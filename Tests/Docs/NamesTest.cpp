@@ -59,6 +59,9 @@ std::vector<std::string> ReadRow(const std::string& document, const std::string&
     return FindAll(document.substr(from + 1, document.find('\n', from + 1) - from), "\\| ([^|\n]+) (?=\\|)");
 }
 
+// The columns of wall times and of peak memory.
+constexpr size_t kWall = 2, kPeak = 5;
+
 double AsNumber(const std::vector<std::string>& row, size_t column) {
     return column < row.size() ? std::stod(row[column]) : 0;
 }
@@ -68,6 +71,9 @@ std::string Format(const char* format, double number) {
     (void)snprintf(text, sizeof(text), format, number);
     return text;
 }
+
+// With its lines joined.
+std::string ReadReadme() { return std::regex_replace(ReadFile(kRoot / "README.md"), std::regex("\\s+"), " "); }
 
 } // namespace
 
@@ -91,8 +97,7 @@ TEST(Readme, ShowsTheFiguresOfTheLastRun) {
     const std::vector<std::string> tree = FindAll(measured, "\n([0-9,]+ files, \\d+ MB);");
     const std::vector<std::string> row = ReadRow(measured, "**LZ4HC chunks**");
     const std::vector<std::string> other = ReadRow(measured, "`unsquashfs -p 1`, lz4hc");
-    const double floor = AsNumber(ReadRow(measured, "floor of LZ4HC chunks"), 2);
-    constexpr size_t kWall = 2, kPeak = 5;
+    const double floor = AsNumber(ReadRow(measured, "floor of LZ4HC chunks"), kWall);
     const std::vector<std::string> expected = {tree.empty() ? "" : tree[0],
                                                Format("%.2f", AsNumber(row, kWall)),
                                                Format("%.0f", (AsNumber(row, kWall) / floor - 1) * 100),
@@ -100,7 +105,7 @@ TEST(Readme, ShowsTheFiguresOfTheLastRun) {
                                                Format("%.0f", AsNumber(row, kPeak)),
                                                Format("%.0f", AsNumber(other, kPeak))};
 
-    const std::string text = std::regex_replace(ReadFile(kRoot / "README.md"), std::regex("\\s+"), " ");
+    const std::string text = ReadReadme();
     const std::regex figures(
         "extracts ([0-9,]+ files) \\((\\d+ MB), LZ4HC\\) in ([0-9.]+) s\\. That is (\\d+) % longer .*?"
         "`unsquashfs -p 1` needs ([0-9.]+) s .*?"
@@ -111,4 +116,32 @@ TEST(Readme, ShowsTheFiguresOfTheLastRun) {
     for (size_t index = 3; index < found.size(); ++index)
         shown.push_back(found.str(index));
     EXPECT_EQ(expected, shown);
+}
+
+TEST(Readme, RoundsTheFiguresOfZarvo) {
+    const std::string measured = ReadFile(kRoot / "docs/performance.md");
+    const std::string text = ReadReadme();
+    const std::string peak = Format("%.0f", AsNumber(ReadRow(measured, "**`extract`: LZ4HC chunks**"), kPeak));
+    EXPECT_NE(std::string::npos, text.find("`zarvo` takes about " + peak + " MiB")) << peak;
+
+    struct Case {
+        std::string sentence;
+        double share;
+        std::string row;
+        std::string other;
+    };
+    for (const Case& each :
+         {Case{.sentence = "it extracts LZ4HC in about half the time of `unsquashfs`",
+         .share = 0.5,
+         .row = "**`extract`: LZ4HC chunks**",
+         .other = "`unsquashfs -p 2`, lz4hc"},
+          Case{.sentence = "LZMA blocks, with a decoder of its own, in about three fifths of the time "
+                           "of `7zz`",
+          .share = 0.6,
+          .row = "**`extract`: LZMA chunks**",
+          .other = "`7zz x -mmt=2`, LZMA2 blocks of 128 KiB"}}) {
+        EXPECT_NE(std::string::npos, text.find(each.sentence)) << each.sentence;
+        const double other = AsNumber(ReadRow(measured, each.other), kWall);
+        EXPECT_NEAR(each.share, AsNumber(ReadRow(measured, each.row), kWall) / other, 0.05) << each.sentence;
+    }
 }
