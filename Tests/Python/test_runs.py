@@ -85,6 +85,8 @@ class Extraction(ArchiveTest):
         ):
             with self.assertRaises(error, msg=options):
                 archive.extract(self.folder / "out", **options)
+        with self.assertRaisesRegex(TypeError, "expected an int, not None"):
+            archive.extract(self.folder / "out", threads=None)
         self.assertFalse((self.folder / "out").exists())
         with self.assertRaises(OSError) as caught:
             archive.extract(self.folder / "a.zarvo")
