@@ -25,7 +25,7 @@ TEST_F(Scripts, AskForAllTheirPackagesAtOnce) {
     Replace("dpkg-query", "exit 1");
     Replace("sudo", "exit 1");
     Replace("id", "echo 1000");
-    const std::string build = "g++ cmake ninja-build liblz4-dev lzma-dev libcli11-dev nlohmann-json3-dev libssl-dev "
+    const std::string build = "g++ cmake ninja-build liblz4-dev lzma-dev nlohmann-json3-dev libssl-dev "
                               "libfuse3-dev ",
                       test = build + "libgtest-dev clang libclang-rt-14-dev llvm jq fuse3 python3-dev python3-fsspec",
                       lint = build +

@@ -11,10 +11,13 @@
 
 class Arguments {
 public:
-    // Options may stand anywhere, also before the subcommand; the rest are operands, in their order. nullopt when the
-    // arguments make no sense: *complaint then says why, and *subcommand whose help to look at.
-    static std::optional<Arguments> Parse(const std::vector<std::string>& arguments, const Subcommand** subcommand,
-                                          std::string* complaint);
+    // arguments: without the program's name. Options may stand anywhere, also before the subcommand; the rest are
+    // operands, in their order.
+    explicit Arguments(const std::vector<std::string>& arguments);
+
+    // What makes no sense about them, or an empty text. If there is something, only the subcommand is of use: its help
+    // says more.
+    const std::string& GetComplaint() const { return m_Complaint; }
 
     const Subcommand& GetSubcommand() const { return *m_Subcommand; }
     const std::vector<std::string>& GetOperands() const { return m_Operands; }
@@ -28,11 +31,17 @@ public:
     std::vector<std::string> FindAll(const Option& option) const;
 
 private:
-    explicit Arguments(const Subcommand& subcommand) : m_Subcommand(&subcommand) {}
+    Arguments(const Subcommand& subcommand, const std::vector<std::string>& arguments);
+    bool ReadOptions(std::string_view argument, const std::string* next);
+    void CheckValues();
+    void CheckOperands();
+    void Complain(std::string complaint); // the first one is kept
 
     const Subcommand* m_Subcommand;
     std::vector<std::string> m_Operands;
     std::vector<std::pair<const Option*, std::string>> m_Options; // that were given; a flag's value is of no meaning
+    std::string m_Complaint;
+    bool m_AreKnown = true; // whether all options before the first operand are the subcommand's
 };
 
 // "16M" is 16,777,216: a number and K, M, G or nothing. nullopt when it is none, 0 or over 64 bits.

@@ -10,20 +10,19 @@
 namespace {
 
 int RunSubcommand(const World& world, OutputBuffer& output, Console& console, std::string& done) {
-    const Subcommand* subcommand = nullptr;
-    std::string complaint;
-    const std::optional<Arguments> arguments = Arguments::Parse(world.arguments, &subcommand, &complaint);
-    if (!arguments) return RefuseUsage(console, *subcommand, complaint);
-    if (arguments->Has(kHelp)) {
+    const Arguments arguments(world.arguments);
+    const Subcommand* const subcommand = &arguments.GetSubcommand();
+    if (!arguments.GetComplaint().empty()) return RefuseUsage(console, *subcommand, arguments.GetComplaint());
+    if (arguments.Has(kHelp)) {
         output.Write(DescribeSubcommand(*subcommand));
         return kAllDone;
     }
-    if (arguments->Has(kVersion)) {
+    if (arguments.Has(kVersion)) {
         output.Write("zarvo " + std::string(zarvo_version()) + "\n");
         return kAllDone;
     }
 
-    const Run run = {.arguments = *arguments, .input = world.input, .output = output, .console = console, .done = done};
+    const Run run = {.arguments = arguments, .input = world.input, .output = output, .console = console, .done = done};
     if (subcommand == &kList) return RunList(run);
     if (subcommand == &kInfo) return RunInfo(run);
     if (subcommand == &kExtract) return RunExtract(run);

@@ -6,7 +6,7 @@ namespace {
 class ZarvoArguments : public ZarvoTest {};
 
 TEST_F(ZarvoArguments, StandAnywhere) {
-    for (const char* const name : {"list", "cat", "-l", "--", "[a,b]", "-"})
+    for (const char* const name : {"list", "cat", "create", "-l", "--", "[a,b]", "-"})
         MakeArchive(name, Archive("a:x b,c:y [a,b]:z -l:v"));
     const std::string lines = "f 1 0 a\nf 1 1 b,c\nf 1 2 [a,b]\nf 1 3 -l\n", paths = "a\nb,c\n[a,b]\n-l\n";
     const struct {
@@ -29,6 +29,7 @@ TEST_F(ZarvoArguments, StandAnywhere) {
         {{"list", "-j", "1", "-j", "2", "-qq", "-lll", "list"}, lines},
         {{"-qo", "test", "extract", "--dry-run", "list"}, paths}, // "test" is -o's value
         {{"--strip=0", "-qx", "list", "extract", "--dry-run", "list"}, paths},
+        {{"-l", "list", "create"}, lines}, // not "list" as the value of create's -l
     };
     for (const auto& [arguments, output] : kCases) {
         SCOPED_TRACE(arguments[0] + " " + arguments[1]);
@@ -53,6 +54,8 @@ TEST_F(ZarvoArguments, ThatMakeNoSenseAreRefusedInALine) {
         {{"cat", "a"}, "zarvo: no pattern is given; see 'zarvo cat --help'"},
         {{"info", "-l", "a"}, "zarvo: no such option: '-l'; see 'zarvo info --help'"},
         {{"-z", "list", "a"}, "zarvo: no such option: '-z'; see 'zarvo list --help'"},
+        {{"-zx", "list", "extract"}, "zarvo: no such option: '-z'; see 'zarvo list --help'"},
+        {{"-x", "list", "extract", "-z"}, "zarvo: no such option: '-z'; see 'zarvo extract --help'"},
         {{"list", "-lz", "a"}, "zarvo: no such option: '-z'; see 'zarvo list --help'"},
         {{"list", "-q-", "a"}, "zarvo: no such option: '--'; see 'zarvo list --help'"},
         {{"list", "-!", "a"}, "zarvo: no such option: '-!'; see 'zarvo list --help'"},
