@@ -34,6 +34,9 @@
 
 namespace zarvo {
 
+// Of the library, such as "0.2.0".
+inline std::string_view version() { return zarvo_version(); }
+
 // Why an operation failed. As a bool: whether it failed.
 class [[nodiscard]] error {
 public:
@@ -175,6 +178,15 @@ error check(Call&& call) {
     return call_library(true, call);
 }
 
+// Makes a plain call that fills a value; call: (value, error) -> code.
+template <typename T, typename Call>
+result<T> fill(T value, Call&& call) {
+    error failure = check([&](zarvo_error** why) { return call(&value, why); });
+    rethrow();
+    if (failure) return failure;
+    return value;
+}
+
 } // namespace detail
 
 // Where the bytes of an archive come from when the library does not read them itself. Several threads may call read_at
@@ -307,6 +319,19 @@ struct [[nodiscard]] read_result {
     zarvo::error error;
 };
 
+namespace detail {
+
+// Makes a plain call that reads; call: (count, error) -> code.
+template <typename Call>
+read_result read_with(Call&& call) {
+    read_result read;
+    read.error = check([&](zarvo_error** why) { return call(&read.count, why); });
+    rethrow();
+    return read;
+}
+
+} // namespace detail
+
 // A file that is read from its start on. Its archive must outlive it. See zarvo_stream.
 class stream {
 public:
@@ -314,12 +339,9 @@ public:
 
     // Into the front of buffer; 0 bytes at the end.
     read_result read(std::span<std::byte> buffer) {
-        read_result read;
-        read.error = detail::check([&](zarvo_error** failure) {
-            return zarvo_stream_read(m_Stream.get(), buffer.data(), buffer.size(), &read.count, failure);
+        return detail::read_with([&](size_t* count, zarvo_error** why) {
+            return zarvo_stream_read(m_Stream.get(), buffer.data(), buffer.size(), count, why);
         });
-        detail::rethrow();
-        return read;
     }
     void seek(uint64_t position) { (void)zarvo_stream_seek(m_Stream.get(), position); }
 
@@ -519,29 +541,31 @@ public:
 
     // What a path names: see zarvo_find.
     result<uint64_t> find(std::string_view path) const {
-        uint64_t item = ZARVO_NO_ITEM;
-        error failure =
-            detail::check([&](zarvo_error** why) { return zarvo_find(get(), path.data(), path.size(), &item, why); });
-        detail::rethrow();
-        if (failure) return failure;
-        return item;
+        return detail::fill(uint64_t{0}, [&](uint64_t* item, zarvo_error** why) {
+            return zarvo_find(get(), path.data(), path.size(), item, why);
+        });
     }
+    // Entries and implied folders together; 0 when memory is refused.
+    uint64_t item_count() const { return zarvo_item_count(get()); }
     result<zarvo_item> item(uint64_t index) const {
-        zarvo_item item = ZARVO_ITEM_INIT;
-        error failure = detail::check([&](zarvo_error** why) { return zarvo_get_item(get(), index, &item, why); });
-        detail::rethrow();
-        if (failure) return failure;
-        return item;
+        return detail::fill(zarvo_item ZARVO_ITEM_INIT, [&](zarvo_item* item, zarvo_error** why) {
+            return zarvo_get_item(get(), index, item, why);
+        });
+    }
+    // In its normal form.
+    result<std::string> item_path(uint64_t index) const {
+        result<zarvo_item> found = item(index);
+        if (!found) return std::move(found).error();
+        return detail::fill(std::string(found->path_length, '\0'), [&](std::string* path, zarvo_error** why) {
+            return zarvo_get_item_path(get(), index, path->data(), why); // its NUL goes where the string has one
+        });
     }
 
     // A range of an entry, into the front of buffer.
     read_result read(uint64_t index, uint64_t offset, std::span<std::byte> buffer) {
-        read_result read;
-        read.error = detail::check([&](zarvo_error** why) {
-            return zarvo_read(get(), index, offset, buffer.data(), buffer.size(), &read.count, why);
+        return detail::read_with([&](size_t* count, zarvo_error** why) {
+            return zarvo_read(get(), index, offset, buffer.data(), buffer.size(), count, why);
         });
-        detail::rethrow();
-        return read;
     }
     result<stream> open_stream(uint64_t index) {
         zarvo_stream* opened = nullptr;
@@ -552,12 +576,9 @@ public:
         return made;
     }
     result<uint64_t> readable(uint64_t index) {
-        uint64_t readable = 0;
-        error failure =
-            detail::check([&](zarvo_error** why) { return zarvo_get_readable(get(), index, &readable, why); });
-        detail::rethrow();
-        if (failure) return failure;
-        return readable;
+        return detail::fill(uint64_t{0}, [&](uint64_t* readable, zarvo_error** why) {
+            return zarvo_get_readable(get(), index, readable, why);
+        });
     }
 
     uint64_t block_count() const { return zarvo_block_count(get()); }
@@ -568,11 +589,9 @@ public:
     }
     // buffer has room for the whole block.
     read_result read_block(uint64_t index, std::span<std::byte> buffer) {
-        read_result read;
-        read.error = detail::check(
-            [&](zarvo_error** why) { return zarvo_read_block(get(), index, buffer.data(), &read.count, why); });
-        detail::rethrow();
-        return read;
+        return detail::read_with([&](size_t* count, zarvo_error** why) {
+            return zarvo_read_block(get(), index, buffer.data(), count, why);
+        });
     }
 
     // Writes entries below a folder: see zarvo_extract.

@@ -5,13 +5,6 @@
 
 namespace {
 
-std::string ItemPath(const zarvo::archive& archive, uint64_t item) {
-    std::string path(archive.item(item)->path_length + 1, '?');
-    EXPECT_EQ(ZARVO_OK, zarvo_get_item_path(archive.get(), item, path.data(), nullptr));
-    path.pop_back();
-    return path;
-}
-
 // The whole tree, a line an item: its path, "/" after a folder, "*" after an implied one.
 std::string Tree(const zarvo::archive& archive) {
     std::string lines;
@@ -19,7 +12,7 @@ std::string Tree(const zarvo::archive& archive) {
         uint64_t child = archive.item(folder)->first_child;
         while (child != ZARVO_NO_ITEM) {
             const zarvo_item item = *archive.item(child);
-            lines += ItemPath(archive, child);
+            lines += *archive.item_path(child);
             if (item.kind == ZARVO_FOLDER) lines += "/";
             if (item.is_implied != 0) lines += "*";
             lines += "\n";
@@ -124,7 +117,9 @@ TEST(Entries, FormATreeInTheArchivesOrder) {
               "c/d/g\n"
               "a\n",
               Tree(archive));
-    EXPECT_EQ(8u + 3u, zarvo_item_count(archive.get()));
+    EXPECT_EQ(8u + 3u, archive.item_count());
+    EXPECT_EQ("", *archive.item_path(ZARVO_ROOT));
+    EXPECT_EQ(ZARVO_ERROR_ARGUMENT, archive.item_path(ZARVO_NO_ITEM).error().code());
 }
 
 // A path of many components, and many paths that share them, cost their length and no more.
@@ -142,7 +137,7 @@ TEST(Entries, DeepAndManyPathsAreFound) {
         zarvo::result<uint64_t> found = archive.find(entry.path());
         ASSERT_EQ(entry.index(), found ? *found : ZARVO_NO_ITEM) << entry.index();
     }
-    EXPECT_EQ(5'002u + 20'000u + 700u, zarvo_item_count(archive.get()));
+    EXPECT_EQ(5'002u + 20'000u + 700u, archive.item_count());
 }
 
 // Looking at each folder of a path with very many components costs no walk along the path.

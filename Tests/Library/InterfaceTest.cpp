@@ -17,6 +17,8 @@ constexpr size_t kSmall = 512;
 int s_RequestsLeft = -1;         // none
 bool s_IsRefusalLasting = false; // those after it, too
 
+constexpr char kDeclaredFunction[] = "ZARVO_API[^;(]*[ *](zarvo_\\w+)\\(";
+
 std::set<std::string> NamesIn(const std::string& text, const char* pattern) {
     const std::regex names(pattern);
     std::set<std::string> found;
@@ -40,8 +42,15 @@ TEST(Interface, LibraryExportsWhatTheHeaderDeclares) {
     const std::string header = ReadFile(VARNEX_SOURCE_DIR "/Library/include/zarvo.h");
     const auto [status, symbols] = RunProgram("/usr/bin/nm", {"-D", "--defined-only", "--format=posix", ZARVO_LIBRARY});
     EXPECT_EQ(0, status);
-    EXPECT_EQ(NamesIn(header, "ZARVO_API[^;(]*[ *](zarvo_\\w+)\\("), NamesIn(symbols, "(zarvo_\\w+)@?\\S* T"));
+    EXPECT_EQ(NamesIn(header, kDeclaredFunction), NamesIn(symbols, "(zarvo_\\w+)@?\\S* T"));
     EXPECT_EQ(std::set<std::string>{"ZARVO_0"}, NamesIn(symbols, "(?:^|\n)((?!zarvo_)\\w+)"));
+}
+
+TEST(Interface, WrapperCallsEveryFunctionOfTheHeader) {
+    const std::string header = ReadFile(VARNEX_SOURCE_DIR "/Library/include/zarvo.h");
+    const std::string wrapper = ReadFile(VARNEX_SOURCE_DIR "/Library/include/zarvo.hpp");
+    EXPECT_EQ(NamesIn(header, kDeclaredFunction), NamesIn(wrapper, "\\b(zarvo_\\w+)\\("));
+    EXPECT_EQ(zarvo_version(), zarvo::version());
 }
 
 TEST(Interface, StructuresAreWhereProgramsExpectThem) {
@@ -289,10 +298,10 @@ TEST(Interface, TreeIsRightAfterARefusedRequest) {
         const zarvo::archive archive = OpenBytes(bytes);
         s_IsRefusalLasting = true;
         s_RequestsLeft = refused;
-        isRefused = zarvo_item_count(archive.get()) == 0;
+        isRefused = archive.item_count() == 0;
         s_RequestsLeft = -1;
         s_IsRefusalLasting = false;
-        EXPECT_EQ(300u, zarvo_item_count(archive.get()));
+        EXPECT_EQ(300u, archive.item_count());
         uint64_t folders = 0;
         uint64_t folder = archive.item(ZARVO_ROOT)->first_child;
         for (; folder != ZARVO_NO_ITEM && folders <= 100; folder = archive.item(folder)->next_sibling)

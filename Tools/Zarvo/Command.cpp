@@ -18,7 +18,7 @@ int RunSubcommand(const World& world, OutputBuffer& output, Console& console, st
         return kAllDone;
     }
     if (arguments.Has(kVersion)) {
-        output.Write("zarvo " + std::string(zarvo_version()) + "\n");
+        output.Write("zarvo " + std::string(zarvo::version()) + "\n");
         return kAllDone;
     }
 

@@ -16,7 +16,7 @@ static bool HasLongName(const zarvo::entry& entry) {
 
 zarvo::error MountTree::Build() {
     if (zarvo::result<uint64_t> root = m_Archive.find(""); !root) return std::move(root).error();
-    const uint64_t count = zarvo_item_count(m_Archive.get());
+    const uint64_t count = m_Archive.item_count();
     std::vector<uint64_t> parents(count, ZARVO_ROOT);
     for (uint64_t item = 0; item < count; ++item)
         for (uint64_t child = m_Archive.item(item)->first_child; child != ZARVO_NO_ITEM;
@@ -76,13 +76,8 @@ std::optional<MountTree::Node> MountTree::Get(uint64_t number) const {
 }
 
 std::string MountTree::GetPath(uint64_t number) const {
-    const uint64_t item = ItemOf(number);
-    const zarvo::result<zarvo_item> found = m_Archive.item(item);
-    if (!found) return "";
-    std::string path(found->path_length + 1, '\0');
-    (void)zarvo_get_item_path(m_Archive.get(), item, path.data(), nullptr); // the item is there
-    path.pop_back();
-    return path;
+    zarvo::result<std::string> path = m_Archive.item_path(ItemOf(number));
+    return path ? *std::move(path) : "";
 }
 
 std::optional<MountTree::Node> MountTree::FindPath(std::string_view path) const {

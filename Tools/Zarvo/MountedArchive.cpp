@@ -222,7 +222,7 @@ void MountedArchive::GetStatistics(fuse_req_t request) {
     struct statvfs statistics = {};
     statistics.f_bsize = statistics.f_frsize = kPageSize;
     statistics.f_blocks = (info.data_size + kPageSize - 1) / kPageSize;
-    statistics.f_files = zarvo_item_count(m_Archive->get());
+    statistics.f_files = m_Archive->item_count();
     statistics.f_namemax = MountTree::kMaxName;
     fuse_reply_statfs(request, &statistics);
 }
