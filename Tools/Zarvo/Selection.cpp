@@ -6,41 +6,45 @@
 #include <cerrno>
 #include <cstring>
 #include <fcntl.h>
+#include <iterator>
+#include <new>
 #include <unistd.h>
 
 namespace {
 
-// The whole contents. nullopt and errno when they can't be read, or when a signal has come.
-std::optional<std::string> ReadAll(int descriptor, const OutputBuffer& output) {
-    std::string text;
-    char piece[65'536];
-    while (true) {
-        const ssize_t count = read(descriptor, piece, sizeof(piece));
-        if (count == 0) return text;
-        if (count > 0)
-            text.append(piece, static_cast<size_t>(count));
-        else if (errno != EINTR || output.HasSignal())
-            return std::nullopt;
+// The lines of a file, of which the last may lack its end. nullopt and errno when it can't be read or takes more memory
+// than there is, or when a signal has come.
+std::optional<std::vector<std::string>> ReadLines(int descriptor, char end, const OutputBuffer& output) {
+    try {
+        std::string text;
+        char piece[65'536];
+        while (const ssize_t count = read(descriptor, piece, sizeof(piece))) {
+            if (count > 0)
+                text.append(piece, static_cast<size_t>(count));
+            else if (errno != EINTR || output.HasSignal())
+                return std::nullopt;
+        }
+        std::vector<std::string> lines;
+        for (size_t from = 0; from < text.size();) {
+            const size_t to = std::min(text.find(end, from), text.size());
+            lines.push_back(text.substr(from, to - from));
+            from = to + 1;
+        }
+        return lines;
+    } catch (const std::bad_alloc&) {
+        errno = ENOMEM;
+        return std::nullopt;
     }
 }
 
-std::optional<std::string> ReadAll(const std::string& path, const OutputBuffer& output) {
+std::optional<std::vector<std::string>> ReadLines(const std::string& path, char end, const OutputBuffer& output) {
     const int descriptor = open(path.c_str(), O_RDONLY | O_CLOEXEC);
     if (descriptor < 0) return std::nullopt;
-    std::optional<std::string> text = ReadAll(descriptor, output);
+    std::optional<std::vector<std::string>> lines = ReadLines(descriptor, end, output);
     const int error = errno;
     (void)close(descriptor); // it was only read
     errno = error;
-    return text;
-}
-
-// The last line may lack its end.
-void AppendLines(const std::string& text, char end, std::vector<std::string>& lines) {
-    for (size_t from = 0; from < text.size();) {
-        const size_t to = std::min(text.find(end, from), text.size());
-        lines.push_back(text.substr(from, to - from));
-        from = to + 1;
-    }
+    return lines;
 }
 
 } // namespace
@@ -51,10 +55,9 @@ PatternList ReadPatterns(const Run& run) {
     list.isEverything = list.patterns.empty() && !run.arguments.Has(kFilesFrom);
     const char end = run.arguments.Has(kNul) || run.arguments.Has(kNulInput) ? '\0' : '\n';
     for (const std::string& file : run.arguments.FindAll(kFilesFrom)) {
-        const std::optional<std::string> text =
-            file == "-" ? ReadAll(run.input, run.output) : ReadAll(file, run.output);
-        if (text) {
-            AppendLines(*text, end, list.patterns);
+        auto lines = file == "-" ? ReadLines(run.input, end, run.output) : ReadLines(file, end, run.output);
+        if (lines) {
+            std::ranges::move(*lines, std::back_inserter(list.patterns));
         } else if (!run.output.HasSignal()) {
             run.console.Say(file == "-" ? "standard input" : file, strerror(errno));
             list.isComplete = false;

@@ -53,6 +53,13 @@ TEST_F(ZarvoProcess, FailsWhereItsDescriptorsDo) {
         EXPECT_EQ(heard, Shell(line)) << line;
 }
 
+TEST_F(ZarvoProcess, NamesAListThatNeverEnds) {
+    if (VARNEX_SANITIZED) GTEST_SKIP() << "sanitizers need more address space than the limit allows";
+    MakeArchive("a.zarvo", Archive("a:x b:x"));
+    EXPECT_EQ(Transcript(1, "zarvo: /dev/zero: Cannot allocate memory\na\n"),
+              Shell("ulimit -v 500000; $Z list --files-from=/dev/zero a.zarvo a"));
+}
+
 TEST_F(ZarvoProcess, SurvivesALimitOfFileSizes) {
     MakeArchive("a.zarvo", Archive("large:z3000 small:x"));
     EXPECT_EQ(Transcript(1, "zarvo: a.zarvo: large: File too large\nsmall\n"),
