@@ -1,7 +1,6 @@
 // Prints a shell's completions for zarvo, made of the table of options: ZarvoCompletions bash|zsh|fish
 #include "Tools/Zarvo/Options.h"
 
-#include <algorithm>
 #include <cstdio>
 #include <cstring>
 
@@ -37,29 +36,27 @@ std::string MakeBashValueCase(const Option& option) {
     if (option.kind != ValueKind::kFile) action = "compopt +o default; " + action;
     if (option.kind == ValueKind::kChoice)
         action = "mapfile -t COMPREPLY < <(compgen -W '" + GetChoices(option) + "' -- \"$word\"); " + action;
-    return "    " + Join(GetForms(option), "|") + ") " + action + " ;;\n";
+    return "        " + Join(GetForms(option), "|") + ") " + action + " ;;\n";
+}
+
+std::string MakeBashSubcommandCase(const Subcommand& subcommand) {
+    std::vector<std::string> forms;
+    std::string values;
+    for (const Option* const option : subcommand.options) {
+        for (const std::string& form : GetForms(*option))
+            forms.push_back(form);
+        if (!option->value.empty()) values += MakeBashValueCase(*option);
+    }
+    return "    '" + std::string(subcommand.name) + "') options='" + Join(forms, " ") + "'\n        case $before in\n" +
+           values + "        esac ;;\n";
 }
 
 std::string MakeBash() {
     std::vector<std::string> names;
-    std::string values, options;
-    std::vector<const Option*> seen; // several subcommands take the same
-    const auto add = [&](const Subcommand& subcommand) {
-        std::vector<std::string> forms;
-        for (const Option* const option : subcommand.options) {
-            for (const std::string& form : GetForms(*option))
-                forms.push_back(form);
-            const bool isNew = std::find(seen.begin(), seen.end(), option) == seen.end();
-            if (isNew && !option->value.empty()) values += MakeBashValueCase(*option);
-            seen.push_back(option);
-        }
-        options += "    " + (subcommand.name.empty() ? "''" : std::string(subcommand.name)) + ") options='" +
-                   Join(forms, " ") + "' ;;\n";
-    };
-    add(kNoSubcommand);
+    std::string cases = MakeBashSubcommandCase(kNoSubcommand);
     for (const Subcommand* const subcommand : GetSubcommands()) {
         names.emplace_back(subcommand->name);
-        add(*subcommand);
+        cases += MakeBashSubcommandCase(*subcommand);
     }
     return "# Completes zarvo in bash. Made by the build.\n"
            "_zarvo() {\n"
@@ -68,9 +65,6 @@ std::string MakeBash() {
            "    if [[ $word == '=' ]]; then word=''; elif [[ $before == '=' ]]; then "
            "before=${COMP_WORDS[COMP_CWORD-2]}; fi\n"
            "    COMPREPLY=()\n"
-           "    case $before in\n" +
-           values +
-           "    esac\n"
            "    for ((index = 1; index < COMP_CWORD; ++index)); do\n"
            "        case ${COMP_WORDS[index]} in\n"
            "        --) return ;;\n"
@@ -80,7 +74,7 @@ std::string MakeBash() {
            "        esac\n"
            "    done\n"
            "    case $subcommand in\n" +
-           options +
+           cases +
            "    esac\n"
            "    if [[ $word == -* ]]; then\n"
            "        mapfile -t COMPREPLY < <(compgen -W \"$options\" -- \"$word\")\n"

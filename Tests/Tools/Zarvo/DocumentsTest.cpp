@@ -115,6 +115,8 @@ TEST_F(ZarvoCompletionsTest, OfBashFollowTheSubcommand) {
         {"zarvo list --progress = al", "always"},
         {"zarvo list --progress =", "auto always never"},
         {"zarvo list -j ''", ""},
+        {"zarvo create -l --f", ""}, // as the value
+        {"zarvo list -l --f", "--files-from"},
         {"zarvo extract --overwrite ''", "always never fail"},
         {"zarvo sum -a sha", "sha256 sha1 sha512"},
         {"zarvo list -- --j", ""},
