@@ -12,6 +12,33 @@ std::string_view GetLayoutName(int32_t layout) {
     }
 }
 
+// The numbers, in their order.
+struct Number {
+    uint64_t zarvo_info::*value;
+    const char* name; // for people
+    const char* unit;
+    const char* key;         // in JSON
+    bool isOfBlocks = false; // in JSON, in the object "blocks"
+};
+constexpr Number kNumbers[] = {
+    {&zarvo_info::recorded_size, "recorded size", " bytes", "recordedSize"},
+    {&zarvo_info::file_size, "file size", " bytes", "fileSize"},
+    {&zarvo_info::data_size, "data size", " bytes", "dataSize"},
+    {&zarvo_info::stored_size, "stored size", " bytes", "storedSize"},
+    {&zarvo_info::block_count, "blocks", "", "count", true},
+    {&zarvo_info::largest_block, "largest block", " bytes", "largest", true},
+    {&zarvo_info::streamed_blocks, "blocks streamed", "", "streamed", true},
+    {&zarvo_info::blocks_none, "blocks stored", "", "none", true},
+    {&zarvo_info::blocks_lzma, "blocks LZMA", "", "lzma", true},
+    {&zarvo_info::blocks_lz4, "blocks LZ4", "", "lz4", true},
+    {&zarvo_info::blocks_lz4hc, "blocks LZ4HC", "", "lz4hc", true},
+    {&zarvo_info::blocks_unknown, "blocks unknown", "", "unknown", true},
+    {&zarvo_info::entry_count, "entries", "", "entries"},
+    {&zarvo_info::file_count, "files", "", "files"},
+    {&zarvo_info::folder_count, "folders", "", "folders"},
+    {&zarvo_info::file_bytes, "bytes of files", " bytes", "fileBytes"},
+};
+
 Json Describe(const std::string& path, const zarvo_info& info) {
     Json object;
     object["archive"] = MakeJsonText(path);
@@ -19,23 +46,8 @@ Json Describe(const std::string& path, const zarvo_info& info) {
     object["version"] = info.version;
     object["engineVersion"] = MakeJsonText(info.engine_version);
     object["engineRevision"] = MakeJsonText(info.engine_revision);
-    object["recordedSize"] = info.recorded_size;
-    object["fileSize"] = info.file_size;
-    object["dataSize"] = info.data_size;
-    object["storedSize"] = info.stored_size;
-    Json& blocks = object["blocks"];
-    blocks["count"] = info.block_count;
-    blocks["largest"] = info.largest_block;
-    blocks["streamed"] = info.streamed_blocks;
-    blocks["none"] = info.blocks_none;
-    blocks["lzma"] = info.blocks_lzma;
-    blocks["lz4"] = info.blocks_lz4;
-    blocks["lz4hc"] = info.blocks_lz4hc;
-    blocks["unknown"] = info.blocks_unknown;
-    object["entries"] = info.entry_count;
-    object["files"] = info.file_count;
-    object["folders"] = info.folder_count;
-    object["fileBytes"] = info.file_bytes;
+    for (const Number& number : kNumbers)
+        (number.isOfBlocks ? object["blocks"] : object)[number.key] = info.*number.value;
     return object;
 }
 
@@ -47,29 +59,13 @@ void WriteLines(OutputBuffer& output, const std::string& path, const zarvo_info&
         output.WriteText(value);
         output.Write("\n");
     };
-    const auto number = [&](std::string_view name, uint64_t value) { line(name, std::to_string(value)); };
-    const auto bytes = [&](std::string_view name, uint64_t value) { line(name, std::to_string(value) + " bytes"); };
     line("archive", path);
     line("layout", GetLayoutName(info.layout));
-    number("version", info.version);
+    line("version", std::to_string(info.version));
     line("engine version", info.engine_version);
     line("engine revision", info.engine_revision);
-    bytes("recorded size", info.recorded_size);
-    bytes("file size", info.file_size);
-    bytes("data size", info.data_size);
-    bytes("stored size", info.stored_size);
-    number("blocks", info.block_count);
-    bytes("largest block", info.largest_block);
-    number("blocks streamed", info.streamed_blocks);
-    number("blocks stored", info.blocks_none);
-    number("blocks LZMA", info.blocks_lzma);
-    number("blocks LZ4", info.blocks_lz4);
-    number("blocks LZ4HC", info.blocks_lz4hc);
-    number("blocks unknown", info.blocks_unknown);
-    number("entries", info.entry_count);
-    number("files", info.file_count);
-    number("folders", info.folder_count);
-    bytes("bytes of files", info.file_bytes);
+    for (const Number& number : kNumbers)
+        line(number.name, std::to_string(info.*number.value) + number.unit);
 }
 
 } // namespace
