@@ -3,11 +3,13 @@
 #include <algorithm>
 
 size_t MountReader::FitThreads(const zarvo::archive& archive, size_t threads, uint64_t maxBlockBytes) {
+    const uint64_t fileSize = archive.info().file_size;
     uint64_t largest = 1;
     for (uint64_t index = 0; index < archive.block_count(); ++index) {
         const zarvo_block block = archive.block(index);
-        const bool isHeld = block.kind != ZARVO_KIND_NONE && !IsStreamed(block, maxBlockBytes);
-        if (isHeld && block.size <= maxBlockBytes) largest = std::max<uint64_t>(largest, block.size);
+        if (block.kind == ZARVO_KIND_NONE || IsStreamed(block, maxBlockBytes)) continue;
+        const uint64_t bytes = std::max<uint64_t>(block.size, std::min<uint64_t>(block.stored_size, fileSize));
+        if (bytes <= maxBlockBytes) largest = std::max(largest, bytes); // larger ones are refused
     }
     return std::clamp<uint64_t>(maxBlockBytes / largest, 1, threads);
 }
@@ -26,7 +28,7 @@ bool MountReader::IsStreamed(const zarvo_block& block, uint64_t maxBlockBytes) {
     return block.kind == ZARVO_KIND_LZMA && (block.is_streamed == 1 || block.size > maxBlockBytes);
 }
 
-// Of a position below the data's size.
+// The block that holds a position, which lies below the data's size.
 uint64_t MountReader::FindBlock(uint64_t position) const {
     uint64_t low = 0, high = m_BlockCount;
     while (high - low > 1) {

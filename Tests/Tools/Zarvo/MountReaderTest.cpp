@@ -32,6 +32,13 @@ TEST(ZarvoMountReader, HasAsManyThreadsAsMemoryAllows) {
         EXPECT_EQ(size_t(threads), MountReader::FitThreads(*archive, 8, uint64_t(maxBlockBytes))) << maxBlockBytes;
 }
 
+TEST(ZarvoMountReader, CountsBlocksAsTheyAreStored) {
+    const std::string bytes = BuildArchive(Archive("lz4 chunk=100000 f:r300000")).bytes;
+    const zarvo::result<zarvo::archive> archive = zarvo::archive::open(std::as_bytes(std::span(bytes)));
+    ASSERT_LT(100'000u, archive->block(0).stored_size);
+    EXPECT_EQ(1u, MountReader::FitThreads(*archive, 8, 200'000));
+}
+
 TEST(ZarvoMountReader, ReadsAStreamAgainThatFailedOnce) {
     const BuiltArchive built = BuildArchive(Archive("lzma streamed chunk=2000000 f:r6000000"));
     size_t limit = SIZE_MAX;
