@@ -21,12 +21,12 @@ public:
         std::sort(m_Problems.begin(), m_Problems.end());
     }
 
-    // Appends the indices of the files that one pattern chooses, in the archive's order. *isMatched says whether it has
-    // matched anything; unchanged where not.
+    // Appends the indices of the files that one pattern chooses, in the archive's order. *isMatched becomes true if it
+    // matches anything.
     zarvo::error Find(const std::string& pattern, std::vector<uint64_t>& files, bool* isMatched) const {
         const size_t before = files.size();
-        // A path without globs is looked up, so that many of them don't cost a walk over all entries each. What the
-        // tree of items does not hold is looked up in order.
+        // A path without globs is looked up, so that many of them don't cost a walk over all entries each. Entries with
+        // problems are not in the tree of items, but in a sorted list.
         if (IsPlainPath(pattern)) {
             if (zarvo::result<uint64_t> item = m_Archive.find(pattern)) {
                 *isMatched = true;
@@ -50,8 +50,8 @@ public:
     }
 
 private:
-    // In whatever form: names are compared by component. Not what stands for everything, which is nothing in an empty
-    // archive.
+    // Whether a pattern is a path without globs. One that stands for everything is none: it matches nothing in an empty
+    // archive, where the root is found.
     static bool IsPlainPath(const std::string& pattern) {
         return pattern.find_first_of("*?[\\") == std::string::npos && !zarvo::normalize_path(pattern).empty();
     }

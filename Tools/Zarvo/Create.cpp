@@ -22,7 +22,7 @@ int32_t ReadCompression(const std::string& name) {
                             : ZARVO_KIND_LZ4HC;
 }
 
-// What the options say, with the defaults that depend on each other; and what makes no sense about them.
+// Sets how to what the options say. Returns what makes no sense about them, or an empty text.
 std::string ReadForm(const Arguments& arguments, zarvo::create_options& how) {
     const std::string* const layout = arguments.Find(kLayout);
     if (layout != nullptr) how.layout = ReadLayout(*layout);

@@ -27,8 +27,8 @@ public:
     zarvo::read_result Read(const zarvo::entry& entry, uint64_t offset, std::span<std::byte> buffer);
 
 private:
-    // What is decoded of a file in a streamed block at a time: of every kPieceSize bytes of the block what is the
-    // file's.
+    // What is decoded at a time. A streamed block is cut every kPieceSize bytes, and a range is what a file has between
+    // two cuts.
     struct Range {
         uint64_t from; // in the file
         uint64_t to;

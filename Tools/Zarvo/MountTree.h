@@ -59,7 +59,7 @@ private:
     zarvo::archive& m_Archive;
     uint64_t m_Hidden = 0;
 
-    // The items that are not what their own entry says, as that clashes with an earlier one: the entry that is shown
-    // instead, or ZARVO_NO_ITEM for a folder that others imply.
+    // Items whose own entry is not shown, because it clashes with an earlier one: the entry that is shown instead, or
+    // ZARVO_NO_ITEM for an implied folder.
     std::map<uint64_t, uint64_t> m_Replaced;
 };

@@ -7,8 +7,8 @@
 #include <string>
 #include <string_view>
 
-// Results. After a failure, what is written is dropped. Once a signal asks the run to end, so is what would have to
-// wait.
+// Results. After a failure, all that is written is dropped; once a signal asks the run to end, what the descriptor does
+// not take at once.
 class OutputBuffer {
 public:
     // signal: holds the number of a signal that has come, or 0. May be nullptr.
@@ -64,7 +64,7 @@ private:
 };
 
 // Messages and progress. Results that wait in the output are written before a message, so that both are in order where
-// they go to the same place. A standard error that fails is nobody's business.
+// they go to the same place. Failures of standard error are ignored.
 class Console {
 public:
     Console(int descriptor, bool isTerminal, OutputBuffer& output)

@@ -9,7 +9,7 @@
 
 struct PatternList {
     std::vector<std::string> patterns;
-    bool isEverything = false; // none were asked for
+    bool isEverything = false; // no patterns were asked for
     bool isComplete = true;    // false: a file of --files-from could not be read, which has been said
 };
 
