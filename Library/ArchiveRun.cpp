@@ -9,6 +9,9 @@ namespace {
 
 constexpr UInt32 kMaxThreads = 1'024;
 
+// How often results are told. Callers may hold something for each file until then, and small files are many.
+constexpr auto kReportInterval = std::chrono::milliseconds(10);
+
 // A block takes its decoded bytes, and its stored ones, which are no more.
 UInt64 MaxBlockBytes(zarvo_archive* archive, UInt64 memory) { return std::min(archive->MaxBlockBytes(), memory / 2); }
 
@@ -59,7 +62,7 @@ zarvo_code ArchiveRun::AddPlanned(const OutputPlan& plan, Failure* failure) {
             Failure refusal;
             plan.SetRefusal(entry, &refusal);
             SetFailed(entry, refusal);
-        } else if (verdict == OutputPlan::kFile && IsSettledBefore(entry)) {
+        } else if (IsSettledBefore(entry)) {
             continue;
         } else if (verdict == OutputPlan::kFolder || node.size == 0 || IsOutsideData(node)) {
             if (!m_Data.AddOther(entry)) return failure->SetMemory();
@@ -138,7 +141,7 @@ void ArchiveRun::WorkAlone() {
 void ArchiveRun::BetweenFiles() {
     if (!m_IsAlone) return;
     const Clock::time_point now = Clock::now();
-    if (now - m_LastLook < kProgressInterval) return;
+    if (now - m_LastLook < kReportInterval) return;
     m_LastLook = now;
     Look();
 }
@@ -146,13 +149,17 @@ void ArchiveRun::BetweenFiles() {
 // Tells what there is to tell meanwhile, on the calling thread.
 void ArchiveRun::Look() {
     TellReports(false);
+    const Clock::time_point now = Clock::now();
+    if (now - m_LastProgress < kProgressInterval) return;
+    m_LastProgress = now;
     if (TellProgress()) return;
     m_IsStopped = true;
     m_Data.Stop();
 }
 
 void ArchiveRun::Watch(UInt32 count) {
-    m_Workers.WaitFor(count, [&] { Look(); });
+    const auto look = [this] { Look(); };
+    m_Workers.WaitFor(count, look, kReportInterval);
 }
 
 // Tells the results that have no missing one before them.

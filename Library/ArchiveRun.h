@@ -42,7 +42,7 @@ protected:
     // after Plan and before Run.
     [[nodiscard]] zarvo_code AddPlanned(const OutputPlan& plan, Failure* failure);
 
-    // Whether a file's result is known, and set, before its bytes are. Called by AddPlanned.
+    // Whether the result of an entry is known, and set, before the run begins. Called by AddPlanned.
     virtual bool IsSettledBefore(UInt32) { return false; }
 
     // The run will not begin: none of the entries is done.
@@ -89,6 +89,7 @@ private:
     bool m_IsStopped = false; // by the caller
     bool m_IsAlone = false;   // the calling thread does the work
     Clock::time_point m_LastLook = Clock::now();
+    Clock::time_point m_LastProgress = m_LastLook;
 
     dynamic_array<UInt8> m_States{kMemLabelFileSystem}; // State; written and read by atomic references
     size_t m_Reported = 0;                              // entries whose results have been told

@@ -142,7 +142,7 @@ void Extraction::TryPlace(Worker* worker, UInt32 entry, const Failure* damage) {
 
 // What is there already and stays there need not be decoded. It is looked for again when the file gets its name.
 bool Extraction::IsSettledBefore(UInt32 entry) {
-    if (!m_Looker) return false;
+    if (!m_Looker || zarvo_archive::IsFolder(Nodes()[entry])) return false;
     Failure failure; // which the run meets, too
     const int folder = FindFolder(m_Looker.get(), entry, &failure);
     return folder >= 0 && IsKept(entry, folder, m_Looker->name.c_str());

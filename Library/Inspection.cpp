@@ -84,16 +84,31 @@ zarvo_code VisitRun::Visit(Failure* failure) {
     return Run(failure);
 }
 
-// What no file system takes is not handed over.
+// Whatever has no bytes to hand over. If its turn came after all data, the results of most other entries would have to
+// wait for it.
 bool VisitRun::IsSettledBefore(UInt32 entry) {
-    for (PathComponents at(m_Plan.PathOnDisk(entry)); at.Next();) {
-        if (at.Name().size() <= NAME_MAX) continue;
-        Failure failure;
-        (void)failure.SetSystem(ENAMETOOLONG);
-        SetFailed(entry, failure);
-        return true;
+    const Node& node = Nodes()[entry];
+    Failure failure;
+    if (!zarvo_archive::IsFolder(node)) {
+        if (!HasNameForDisk(entry))
+            (void)failure.SetSystem(ENAMETOOLONG);
+        else if (node.size != 0 && IsOutsideData(node))
+            (void)SetOutsideData(&failure);
+        else if (node.size != 0)
+            return false;
     }
-    return false;
+    if (failure.code == ZARVO_OK)
+        SetDone(entry);
+    else
+        SetFailed(entry, failure);
+    return true;
+}
+
+// Whether there are file systems that take the path.
+bool VisitRun::HasNameForDisk(UInt32 entry) const {
+    for (PathComponents at(m_Plan.PathOnDisk(entry)); at.Next();)
+        if (at.Name().size() > NAME_MAX) return false;
+    return true;
 }
 
 void VisitRun::HandOver(UInt32 entry, UInt64 offset, const UInt8* bytes, UInt64 size) {
@@ -127,13 +142,6 @@ void VisitRun::EndFile(UInt32, SharedFile* file) {
 }
 
 void VisitRun::DropFile(SharedFile* file) { Delete(file, kMemLabelFileSystem); }
-
-void VisitRun::TakeOther(UInt32 worker, UInt32 entry) {
-    if (!IsOutsideData(Nodes()[entry]) || zarvo_archive::SizeOf(Nodes()[entry]) == 0) return SetDone(entry);
-    Failure damage;
-    (void)SetOutsideData(&damage);
-    TakeFile(worker, entry, nullptr, 0, &damage);
-}
 
 void VisitRun::Report(const zarvo_report& report) {
     if (m_What.report != nullptr) m_What.report(Options().context, &report);

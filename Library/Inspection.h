@@ -50,6 +50,7 @@ public:
 
 private:
     bool IsSettledBefore(UInt32 entry) override;
+    bool HasNameForDisk(UInt32 entry) const;
     void HandOver(UInt32 entry, UInt64 offset, const UInt8* bytes, UInt64 size);
 
     void TakeFile(UInt32 worker, UInt32 entry, const UInt8* bytes, UInt64 readable, const Failure* damage) override;
@@ -57,7 +58,7 @@ private:
     void TakePart(UInt32 worker, SharedFile* file, UInt64 offset, const UInt8* bytes, UInt64 size) override;
     void EndFile(UInt32 worker, SharedFile* file) override;
     void DropFile(SharedFile* file) override;
-    void TakeOther(UInt32 worker, UInt32 entry) override;
+    void TakeOther(UInt32, UInt32) override {} // there is none
     void TakeDamage(UInt32, UInt64, UInt64, const Failure&) override {}
     void Report(const zarvo_report& report) override;
 

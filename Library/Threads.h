@@ -40,9 +40,9 @@ public:
 
     // Returns when count workers have ended, and calls meanwhile() at each interval until then, with no lock held.
     template <typename Meanwhile>
-    void WaitFor(UInt32 count, Meanwhile&& meanwhile) {
+    void WaitFor(UInt32 count, Meanwhile&& meanwhile, std::chrono::milliseconds interval = kProgressInterval) {
         std::unique_lock lock(m_Lock);
-        while (!m_HasEnded.wait_for(lock, kProgressInterval, [&] { return m_Ended == count; })) {
+        while (!m_HasEnded.wait_for(lock, interval, [&] { return m_Ended == count; })) {
             lock.unlock();
             meanwhile();
             lock.lock();

@@ -2,6 +2,8 @@
 #include "Tests/Library/ExtractionTest.h"
 #include "Tests/Support/FolderTree.h"
 
+#include <chrono>
+#include <condition_variable>
 #include <map>
 #include <mutex>
 #include <sys/resource.h>
@@ -75,6 +77,32 @@ TEST(Runs, HandOverEachFileInOrder) {
         for (size_t index = 0; index < entries.size(); ++index)
             EXPECT_EQ(Delivered{entries[index].bytes}, Delivered{seen[index]}) << index;
     }
+}
+
+// Callers may hold something for each file until its result is told.
+TEST(Runs, TellOfFoldersBeforeTheDataIsRead) {
+    const std::string bytes =
+        BuildArchive(
+            {.entries = {{.path = "folder", .flags = kFolderEntry}, {.path = "empty"}, {.path = "file", .bytes = "1"}}})
+            .bytes;
+    zarvo::archive archive = OpenBytes(bytes);
+    std::mutex lock;
+    std::condition_variable isTold;
+    uint64_t told = 0, toldBefore = 0;
+    zarvo::visit_options visit;
+    visit.report = [&](const zarvo_report&) {
+        const std::lock_guard guard(lock);
+        ++told;
+        isTold.notify_one();
+    };
+    visit.bytes = [&](uint64_t, uint64_t, std::span<const std::byte>) {
+        std::unique_lock guard(lock);
+        isTold.wait_for(guard, std::chrono::seconds(10), [&] { return told == 2; });
+        toldBefore = told;
+    };
+    ASSERT_EQ(ZARVO_OK, archive.visit({.threads = 1}, visit).error.code());
+    EXPECT_EQ(2u, toldBefore);
+    EXPECT_EQ(3u, told);
 }
 
 // A block that the budget can't hold is streamed where its kind allows it. Where not, all files in it fail, also those

@@ -85,6 +85,22 @@ TEST_F(ZarvoSum, PrintsWhatTheSystemsProgramsPrint) {
     }
 }
 
+// The last entry's bytes come first, so that all others wait.
+TEST_F(ZarvoSum, KeepsTheArchivesOrder) {
+    constexpr size_t kCount = 5'000;
+    ArchiveDescription archive;
+    for (size_t index = 0; index < kCount; ++index) {
+        const std::string number = std::to_string(10'000 + index);
+        archive.entries.push_back({.path = number, .bytes = number});
+        archive.fields["node[" + std::to_string(index) + "].offset"] = (kCount - 1 - index) * number.size();
+    }
+    MakeArchive("a.zarvo", archive);
+    EXPECT_EQ(0, Zarvo({"extract", "-q", "-o", "out", "a.zarvo"}).status);
+    const Transcript expected = RunProgram("/bin/bash", {"-c", "cd out && sha256sum *"});
+    for (const char* const threads : {"1", "8"})
+        EXPECT_EQ((Heard{0, expected.second, ""}), Zarvo({"sum", "-j", threads, "a.zarvo"})) << threads;
+}
+
 TEST_F(ZarvoSum, IsTakenByTheProgramThatChecks) {
     MakeArchive("a.zarvo", {.entries = {{.path = "-", .bytes = "1"}, {.path = "a\r\nb", .bytes = "2"}}});
     EXPECT_EQ(0, Zarvo({"extract", "-q", "a.zarvo"}).status);
@@ -94,8 +110,8 @@ TEST_F(ZarvoSum, IsTakenByTheProgramThatChecks) {
 }
 
 TEST_F(ZarvoSum, SaysOfOtherFilesWhatIsWrong) {
-    ArchiveDescription archive = Archive("a:1 bad:abc ../b:x a/c:x d|");
-    archive.blocks = {{.size = 1}, {.size = 3, .type = kCompressionLz4, .stored = std::string(2, '\xFF')}};
+    ArchiveDescription archive = Archive("a:1 bad:abcdef ../b:x a/c:x d|");
+    archive.blocks = {{.size = 4}, {.size = 3, .type = kCompressionLz4, .stored = std::string(2, '\xFF')}};
     MakeArchive("a.zarvo", archive);
     EXPECT_EQ((Heard{1, std::string(kDigestOf1) + "  a\n",
                      "zarvo: a.zarvo: bad: block 1 is damaged\n"
