@@ -32,7 +32,7 @@ zarvo_code Creation::AddEntries(const EntryList& entries, Failure* failure) {
 
 zarvo_code Creation::Write(EntrySource* source, Failure* failure) {
     if (const zarvo_code code = Settle(failure); code != ZARVO_OK) return code;
-    const zarvo_code code = m_How.dry_run != 0 ? m_File.CheckCanOpen(failure) : WriteFile(source, failure);
+    const zarvo_code code = m_How.dry_run != 0 ? CheckCanWrite(source, failure) : WriteFile(source, failure);
     if (code != ZARVO_OK) return code;
     TellDone();
     return ZARVO_OK;
@@ -93,6 +93,18 @@ void Creation::TellLeftOut() {
         ++m_Summary.failures;
         Tell(m_LeftOut.PathOf(index), EntryList::IsFolder(m_LeftOut[index]), ZARVO_OUTCOME_LEFT_OUT, why);
     }
+}
+
+// Finds the failures that WriteFile would meet in the order in which it would meet them.
+zarvo_code Creation::CheckCanWrite(EntrySource* source, Failure* failure) {
+    if (const zarvo_code code = m_File.CheckCanOpen(failure); code != ZARVO_OK) return code;
+    for (const bool areEmpty : {true, false})
+        for (size_t index = 0; index < m_Entries.size(); ++index) {
+            const EntryList::Entry& entry = m_Entries[index];
+            if (EntryList::IsFolder(entry) || (entry.size == 0) != areEmpty) continue;
+            if (source->CheckCanRead(m_Entries, entry, failure) != ZARVO_OK) return FailEntry(index, *failure);
+        }
+    return ZARVO_OK;
 }
 
 zarvo_code Creation::WriteFile(EntrySource* source, Failure* failure) {

@@ -35,6 +35,7 @@ private:
     [[nodiscard]] bool LeaveOutFolders();
     void MarkFoldersOfFiles();
     void TellLeftOut();
+    zarvo_code CheckCanWrite(EntrySource* source, Failure* failure);
     zarvo_code WriteFile(EntrySource* source, Failure* failure);
     void TellDone();
     void TellFailed(core::string_ref path, bool isFolder, const Failure& failure);

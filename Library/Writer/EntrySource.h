@@ -15,4 +15,7 @@ public:
     // size meanwhile is a failure. Several threads call it at once, each with its own number.
     virtual zarvo_code Read(UInt32 thread, const EntryList& list, const EntryList::Entry& entry, UInt64 offset,
                             UInt8* bytes, size_t size, Failure* failure) = 0;
+
+    // For dry runs, on one thread: whether Read can get at an entry, as far as can be known without reading.
+    virtual zarvo_code CheckCanRead(const EntryList&, const EntryList::Entry&, Failure*) { return ZARVO_OK; }
 };

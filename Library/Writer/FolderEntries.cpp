@@ -162,14 +162,19 @@ bool FolderEntries::PrepareToRead(UInt32 threads) {
     return true;
 }
 
+// The descriptor of a file's folder, which is the reader's, or -1 after a failure. *name: the file's name in it.
+int FolderEntries::FindFolder(Reader* reader, core::string_ref path, const char** name, Failure* failure) {
+    const size_t slash = path.rfind('/');
+    *name = path.data() + (slash == core::string_ref::npos ? 0 : slash + 1);
+    return reader->folders.Get(path.substr(0, slash == core::string_ref::npos ? 0 : slash), failure);
+}
+
 // Folders that are kept open give way when descriptors run out.
 int FolderEntries::OpenFile(Reader* reader, core::string_ref path, Failure* failure) {
-    const size_t slash = path.rfind('/');
-    const core::string_ref above = slash == core::string_ref::npos ? core::string_ref() : path.substr(0, slash);
-    const char* const name = path.data() + (slash == core::string_ref::npos ? 0 : slash + 1);
     for (bool isSecondTry = false;; isSecondTry = true) {
         *failure = {};
-        const int folder = reader->folders.Get(above, failure);
+        const char* name = nullptr;
+        const int folder = FindFolder(reader, path, &name, failure);
         if (folder >= 0) {
             // Not to wait for a pipe that has taken the file's place.
             constexpr int kFlags = O_RDONLY | O_NOFOLLOW | O_NONBLOCK | O_NOCTTY | O_CLOEXEC;
@@ -217,4 +222,12 @@ zarvo_code FolderEntries::Read(UInt32 thread, const EntryList& list, const Entry
     }
     close(descriptor);
     return code;
+}
+
+zarvo_code FolderEntries::CheckCanRead(const EntryList& list, const EntryList::Entry& entry, Failure* failure) {
+    if (!PrepareToRead(1)) return failure->SetMemory();
+    const char* name = nullptr;
+    const int folder = FindFolder(m_Readers[0], list.PathOf(entry), &name, failure);
+    if (folder < 0) return failure->code;
+    return faccessat(folder, name, R_OK, AT_EACCESS) == 0 ? ZARVO_OK : failure->SetSystem(errno);
 }

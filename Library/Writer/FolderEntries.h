@@ -35,6 +35,7 @@ public:
     [[nodiscard]] bool PrepareToRead(UInt32 threads) override;
     zarvo_code Read(UInt32 thread, const EntryList& list, const EntryList::Entry& entry, UInt64 offset, UInt8* bytes,
                     size_t size, Failure* failure) override;
+    zarvo_code CheckCanRead(const EntryList& list, const EntryList::Entry& entry, Failure* failure) override;
 
 private:
     class Search;
@@ -45,6 +46,7 @@ private:
     };
     static constexpr size_t kFoldersOfReader = 4;
 
+    static int FindFolder(Reader* reader, core::string_ref path, const char** name, Failure* failure);
     int OpenFile(Reader* reader, core::string_ref path, Failure* failure);
 
     OutputFolder m_Root;

@@ -64,6 +64,20 @@ TEST_F(Creation, FailsInADryRunAsItWouldWithoutOne) {
     }
 }
 
+TEST_F(Creation, NamesAFileThatCannotBeReadInADryRun) {
+    Put("d/a", "x");
+    Put("d/b", "x");
+    Put("empty", "");
+    fs::permissions(m_Folder.Path(), fs::perms::all);
+    for (const std::string path : {"d/b", "empty"}) { // one more each time; empty files are the first to be opened
+        fs::permissions(In() + "/" + path, fs::perms::none);
+        const OrdinaryUser user;
+        const Made dry = Create(Archive(), In(), {.dry_run = true});
+        EXPECT_EQ(path + " failed: Permission denied\n", dry.reports);
+        EXPECT_EQ(dry, Create(Archive(), In()));
+    }
+}
+
 TEST_F(Creation, NamesAFolderThatCannotBeRead) {
     EXPECT_EQ(" failed: No such file or directory\n", Create(Archive(), m_Folder / "none").reports);
     WriteFile(m_Folder / "file", "");
@@ -165,6 +179,12 @@ TEST_F(Creation, NamesAFileThatChangesMeanwhile) {
          [](const std::string& path) {
              fs::remove(path);
              EXPECT_EQ(0, mkfifo(path.c_str(), 0600));
+         },
+         "the file has changed: it had 200000 bytes"},
+        {"becomes a folder",
+         [](const std::string& path) {
+             fs::remove(path);
+             fs::create_directory(path);
          },
          "the file has changed: it had 200000 bytes"},
     };
