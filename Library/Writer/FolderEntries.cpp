@@ -41,7 +41,7 @@ public:
     }
 
 private:
-    static constexpr size_t kFoldersOfSearch = 16;
+    static constexpr size_t kFoldersOfSearch = 8; // of the 16 descriptors that a process may be down to
 
     zarvo_code ListFolder(core::string_ref path, Failure* failure) {
         if (m_Path.grow(path.size() + NAME_MAX + 2) == nullptr) return failure->SetMemory();

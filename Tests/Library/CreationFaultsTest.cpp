@@ -125,6 +125,18 @@ TEST_F(Creation, WorksWhereTheSystemLacksMuch) {
     }
 }
 
+// Fewer than the folders that each thread would keep open.
+TEST_F(Creation, NeedsFewDescriptors) {
+    std::string path;
+    for (int folder = 0; folder < 30; ++folder) {
+        const std::string name = std::to_string(folder);
+        Put(name + "/a", "x");
+        Put((path += name + "/") + "b", "x");
+    }
+    const FewDescriptors few(16);
+    EXPECT_EQ((Made{.files = 60}), Create(Archive(), In(), {}, {.threads = 4}));
+}
+
 TEST_F(Creation, ReplacesThePartThatAKilledRunLeft) {
     Put("a", "x");
     WriteFile(m_Folder / ".a.zarvo.zarvo-part", std::string(100'000, 'p'));

@@ -4,28 +4,9 @@
 #include "Tests/Support/FolderTree.h"
 
 #include <deque>
-#include <sys/resource.h>
 #include <unistd.h>
 
-namespace {
-
 namespace fs = std::filesystem;
-
-// While it is there, the process may have so many descriptors open.
-class FewDescriptors : private NonCopyable {
-public:
-    explicit FewDescriptors(rlim_t count) {
-        EXPECT_EQ(0, getrlimit(RLIMIT_NOFILE, &m_Before));
-        const rlimit few = {count, m_Before.rlim_max};
-        EXPECT_EQ(0, setrlimit(RLIMIT_NOFILE, &few));
-    }
-    ~FewDescriptors() { EXPECT_EQ(0, setrlimit(RLIMIT_NOFILE, &m_Before)); }
-
-private:
-    rlimit m_Before = {};
-};
-
-} // namespace
 
 // Very many files, deep down, that begin before a unit's end and end after it, with few descriptors: all are written,
 // one decoding is enough, and a run that fails leaves nothing behind.

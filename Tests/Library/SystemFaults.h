@@ -8,6 +8,8 @@
 #include "Runtime/Core/NonCopyable.h"
 
 #include <cerrno>
+#include <gtest/gtest.h>
+#include <sys/resource.h>
 
 // The sanitizers have some of the functions themselves, and a program must not replace those.
 #if defined(__has_feature)
@@ -33,4 +35,18 @@ public:
 
 private:
     int m_Index;
+};
+
+// While it is there, the process may have so many descriptors open.
+class FewDescriptors : private NonCopyable {
+public:
+    explicit FewDescriptors(rlim_t count) {
+        EXPECT_EQ(0, getrlimit(RLIMIT_NOFILE, &m_Before));
+        const rlimit few = {count, m_Before.rlim_max};
+        EXPECT_EQ(0, setrlimit(RLIMIT_NOFILE, &few));
+    }
+    ~FewDescriptors() { EXPECT_EQ(0, setrlimit(RLIMIT_NOFILE, &m_Before)); }
+
+private:
+    rlimit m_Before = {};
 };
