@@ -200,17 +200,18 @@ TEST_F(Creation, NamesAFileThatChangesMeanwhile) {
          },
          "the file has changed: it had 200000 bytes"},
     };
-    for (const auto& row : kCases) {
-        SCOPED_TRACE(row.name);
-        fs::remove_all(In());
-        Put("d/file", SampleText(200'000));
-        WriteFile(m_Folder / ".a.zarvo.zarvo-part", "");
-        const Made made =
-            Create(Archive(), In(), {.log = [&](std::string_view) { row.change(In() + "/d/file"); }}, {.threads = 2});
-        EXPECT_EQ(std::string("d/file failed: ") + row.text + "\n", made.reports);
-        EXPECT_EQ(row.text, made.text);
-        EXPECT_EQ(std::set<std::string>{}, Names());
-    }
+    for (const auto& row : kCases)
+        for (const int32_t layout : {ZARVO_LAYOUT_FS, ZARVO_LAYOUT_WEB}) {
+            SCOPED_TRACE(std::string(row.name) + ", layout " + std::to_string(layout));
+            fs::remove_all(In());
+            Put("d/file", SampleText(200'000));
+            WriteFile(m_Folder / ".a.zarvo.zarvo-part", "");
+            const auto change = [&](std::string_view) { row.change(In() + "/d/file"); };
+            const Made made = Create(Archive(), In(), {.layout = layout, .log = change}, {.threads = 2});
+            EXPECT_EQ(std::string("d/file failed: ") + row.text + "\n", made.reports);
+            EXPECT_EQ(row.text, made.text);
+            EXPECT_EQ(std::set<std::string>{}, Names());
+        }
 }
 
 TEST_F(Creation, NamesAnEmptyFileThatChangesMeanwhile) {
