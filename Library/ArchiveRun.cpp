@@ -7,8 +7,6 @@
 
 namespace {
 
-constexpr UInt32 kMaxThreads = 1'024;
-
 // How often results are told. Callers may hold something for each file until then, and small files are many.
 constexpr auto kReportInterval = std::chrono::milliseconds(10);
 
@@ -23,15 +21,14 @@ UInt32 CountThreads(zarvo_archive* archive, const zarvo_run_options& options, UI
                                  !BlockDecoder::IsReadInPieces(block, maxBlockBytes);
         if (isHeldWhole) largest = std::max(largest, archive->Blocks().BytesToHold(block));
     }
-    const UInt64 wanted = options.threads != 0 ? options.threads : ProcessorCount();
-    const UInt64 affordable = memory / (2 * largest);
-    return static_cast<UInt32>(std::clamp<UInt64>(std::min(wanted, affordable), 1, kMaxThreads));
+    return ChooseThreadCount(options.threads, memory / (2 * largest));
 }
 
 } // namespace
 
 ArchiveRun::ArchiveRun(zarvo_archive* archive, const zarvo_run_options& options)
-    : m_Archive(archive),
+    : WatchedRun(kReportInterval),
+      m_Archive(archive),
       m_Options(options),
       m_MaxBlockBytes(MaxBlockBytes(archive, MemoryBudget(options.memory))),
       m_ThreadCount(CountThreads(archive, options, MemoryBudget(options.memory), m_MaxBlockBytes)),
@@ -112,54 +109,28 @@ void ArchiveRun::SetFailed(size_t entry, const Failure& failure, State state) {
 
 zarvo_code ArchiveRun::Run(Failure* failure) {
     m_Data.Prepare();
-    RunOnThreads(m_ThreadCount, this);
+    RunOnThreads(m_ThreadCount, [this](UInt32 number) {
+        MessageScope scope(&m_Messages);
+        m_Data.Work(number);
+    });
     m_Data.DropUnended();
     TellReports(true);
     (void)TellProgress(); // too late to stop anything
     m_Messages.TellAll(m_Archive->Messages());
-    if (m_Data.FatalFailure().code != ZARVO_OK) {
+    if (m_Data.FatalFailure().code == ZARVO_OK) return ZARVO_OK;
+    *failure = m_Data.FatalFailure();
+    if (failure->code != ZARVO_ERROR_STOPPED)
         m_Summary.failures = m_Expected - m_Summary.files - m_Summary.folders - m_Summary.kept;
-        *failure = m_Data.FatalFailure();
-        return failure->code;
-    }
-    return m_IsStopped ? failure->Set(ZARVO_ERROR_STOPPED, "stopped") : ZARVO_OK;
+    return failure->code;
 }
 
-void ArchiveRun::Work(UInt32 number) {
-    {
-        MessageScope scope(&m_Messages);
-        m_Data.Work(number);
-    }
-    m_Workers.AddEnded();
-}
-
-void ArchiveRun::WorkAlone() {
-    m_IsAlone = true;
-    Work(0);
-}
-
-void ArchiveRun::BetweenFiles() {
-    if (!m_IsAlone) return;
-    const Clock::time_point now = Clock::now();
-    if (now - m_LastLook < kReportInterval) return;
-    m_LastLook = now;
-    Look();
-}
-
-// Tells what there is to tell meanwhile, on the calling thread.
+// Tells what there is to tell meanwhile.
 void ArchiveRun::Look() {
     TellReports(false);
-    const Clock::time_point now = Clock::now();
-    if (now - m_LastProgress < kProgressInterval) return;
-    m_LastProgress = now;
-    if (TellProgress()) return;
-    m_IsStopped = true;
-    m_Data.Stop();
-}
-
-void ArchiveRun::Watch(UInt32 count) {
-    const auto look = [this] { Look(); };
-    m_Workers.WaitFor(count, look, kReportInterval);
+    if (!m_ProgressClock.IsDue() || TellProgress()) return;
+    Failure stopped;
+    (void)stopped.SetStopped();
+    m_Data.StopFor(stopped);
 }
 
 // Tells the results that have no missing one before them.
@@ -198,12 +169,8 @@ void ArchiveRun::TellReports(bool areAllWorkersDone) {
 }
 
 bool ArchiveRun::TellProgress() {
-    if (m_Options.progress == nullptr) return true;
-    zarvo_progress progress = {};
-    progress.struct_size = sizeof(progress);
-    progress.bytes = m_Data.BytesTaken();
-    progress.bytes_total = m_Data.BytesTotal();
-    progress.files = m_Results.load(std::memory_order_relaxed); // a count, that nothing else goes by
-    progress.files_total = m_Expected;
-    return m_Options.progress(m_Options.context, &progress) == 0;
+    return ::TellProgress(m_Options, {.bytes = m_Data.BytesTaken(),
+                                      .bytesTotal = m_Data.BytesTotal(),
+                                      .files = m_Results.load(std::memory_order_relaxed), // nothing else goes by it
+                                      .filesTotal = m_Expected});
 }

@@ -11,9 +11,7 @@
 #include "Library/OutputPlan.h"
 #include "Library/Threads.h"
 
-#include <chrono>
-
-class ArchiveRun : protected DataRun::Sink, private ThreadedWork {
+class ArchiveRun : protected DataRun::Sink, private WatchedRun {
 public:
     // options: as the caller gave them; zeros stand for defaults.
     ArchiveRun(zarvo_archive* archive, const zarvo_run_options& options);
@@ -66,15 +64,11 @@ protected:
 
 private:
     enum State : UInt8 { kNoResult, kPending, kDone, kKept, kFailed, kBroken };
-    using Clock = std::chrono::steady_clock;
 
-    void Work(UInt32 number) override;
-    void Watch(UInt32 count) override;
-    void WorkAlone() override;
-    void BetweenFiles() final;
-    void Look();
+    void BetweenFiles() final { LookIfAlone(); }
+    void Look() override;
     void TellReports(bool areAllWorkersDone);
-    bool TellProgress(); // false: to be stopped
+    [[nodiscard]] bool TellProgress(); // false: to be stopped
     void SetState(size_t entry, State state);
     void SetFailed(size_t entry, const Failure& failure, State state);
     State GetState(size_t entry);
@@ -86,17 +80,12 @@ private:
     DataRun m_Data;
     MessageQueue m_Messages;
     zarvo_summary m_Summary = ZARVO_SUMMARY_INIT;
-    bool m_IsStopped = false; // by the caller
-    bool m_IsAlone = false;   // the calling thread does the work
-    Clock::time_point m_LastLook = Clock::now();
-    Clock::time_point m_LastProgress = m_LastLook;
+    ProgressClock m_ProgressClock{ProgressClock::Clock::now()};
 
     dynamic_array<UInt8> m_States{kMemLabelFileSystem}; // State; written and read by atomic references
     size_t m_Reported = 0;                              // entries whose results have been told
     UInt64 m_Expected = 0;
     std::atomic<UInt64> m_Results{0};
-
-    WorkerCount m_Workers;
 
     std::mutex m_Lock;
     FailureList m_Failures;

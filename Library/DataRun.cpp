@@ -52,19 +52,12 @@ void DataRun::Prepare() {
     if (m_TakesAllBlocks) m_BytesTotal = m_DataSize;
 }
 
-void DataRun::Stop() {
+void DataRun::StopFor(const Failure& failure) {
     std::lock_guard lock(m_Lock);
+    if (m_Fatal.code == ZARVO_OK) m_Fatal = failure;
     m_IsStopped.store(true, std::memory_order_relaxed);
     m_HasWork.notify_all();
     m_HasAdvanced.notify_all();
-}
-
-void DataRun::StopFor(const Failure& failure) {
-    {
-        std::lock_guard lock(m_Lock);
-        if (m_Fatal.code == ZARVO_OK) m_Fatal = failure;
-    }
-    Stop();
 }
 
 void DataRun::StopWithoutMemory() {

@@ -90,7 +90,6 @@ public:
 
     // Works until nothing is left to do, or the run is stopped.
     void Work(UInt32 worker);
-    void Stop();
     void StopFor(const Failure& failure); // which becomes the FatalFailure if there is none yet
     bool IsStopped() const { return m_IsStopped.load(std::memory_order_relaxed); } // a hint: data is under the lock
 

@@ -20,6 +20,7 @@ struct Failure {
     // null.
     zarvo_code SetSystem(int error, const char* what = nullptr);
     zarvo_code SetMemory() { return Set(ZARVO_ERROR_MEMORY, "out of memory"); }
+    zarvo_code SetStopped() { return Set(ZARVO_ERROR_STOPPED, "stopped"); }
     zarvo_code SetArgument(const char* what) { return Set(ZARVO_ERROR_ARGUMENT, "%s", what); }
 };
 

@@ -3,55 +3,70 @@
 #include "Runtime/Allocator/Allocator.h"
 #include "Runtime/Core/Containers/DynamicArray.h"
 
+#include <algorithm>
 #include <csignal>
 #include <pthread.h>
 #include <sched.h>
 #include <unistd.h>
 
-namespace {
-
-struct Job {
-    ThreadedWork* work;
-    UInt32 number;
-    pthread_t thread;
-};
-
-void* RunJob(void* given) {
-    const Job& job = *static_cast<Job*>(given);
-    job.work->Work(job.number);
-    return nullptr;
-}
-
-} // namespace
-
-UInt32 ProcessorCount() {
+static UInt32 ProcessorCount() {
     cpu_set_t processors;
     if (sched_getaffinity(0, sizeof(processors), &processors) == 0) return static_cast<UInt32>(CPU_COUNT(&processors));
     const long online = sysconf(_SC_NPROCESSORS_ONLN); // more processors than the set can name
     return online > 0 ? static_cast<UInt32>(online) : 1;
 }
 
-void RunOnThreads(UInt32 count, ThreadedWork* work) {
+UInt32 ChooseThreadCount(UInt32 wanted, UInt64 atMost) {
+    constexpr UInt64 kMaxThreads = 1'024;
+    const UInt32 count = wanted != 0 ? wanted : ProcessorCount();
+    return static_cast<UInt32>(std::clamp<UInt64>(std::min<UInt64>(count, atMost), 1, kMaxThreads));
+}
+
+struct WatchedRun::Job {
+    WatchedRun* run;
+    const std::function<void(UInt32 number)>* work;
+    UInt32 number;
+    pthread_t thread;
+};
+
+void* WatchedRun::RunJob(void* given) {
+    const Job& job = *static_cast<Job*>(given);
+    (*job.work)(job.number);
+    std::lock_guard lock(job.run->m_EndLock);
+    ++job.run->m_Ended;
+    job.run->m_HasEnded.notify_one();
+    return nullptr;
+}
+
+void WatchedRun::RunOnThreads(UInt32 count, const std::function<void(UInt32 number)>& work) {
     dynamic_array<Job> jobs(kMemLabelGeneral);
     if (!jobs.resize_uninitialized(count, kResizeExact)) count = 0;
+    m_IsAlone = false;
+    m_Ended = 0;
     sigset_t all;
     sigset_t before;
     sigfillset(&all);
     pthread_sigmask(SIG_SETMASK, &all, &before); // threads begin with the mask of their maker
     UInt32 started = 0;
     for (; started < count; ++started) {
-        jobs[started] = {work, started, {}};
+        jobs[started] = {this, &work, started, {}};
         if (pthread_create(&jobs[started].thread, nullptr, RunJob, &jobs[started]) != 0) break;
     }
     pthread_sigmask(SIG_SETMASK, &before, nullptr);
-    if (started == 0) return work->WorkAlone();
-    work->Watch(started);
+    if (started == 0) {
+        m_IsAlone = true;
+        return work(0);
+    }
+    WaitFor(started);
     for (UInt32 number = 0; number < started; ++number)
         pthread_join(jobs[number].thread, nullptr);
 }
 
-void WorkerCount::AddEnded() {
-    std::lock_guard lock(m_Lock);
-    ++m_Ended;
-    m_HasEnded.notify_one();
+void WatchedRun::WaitFor(UInt32 count) {
+    std::unique_lock lock(m_EndLock);
+    while (!m_HasEnded.wait_for(lock, m_Interval, [&] { return m_Ended == count; })) {
+        lock.unlock();
+        Look();
+        lock.lock();
+    }
 }

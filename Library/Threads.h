@@ -1,56 +1,49 @@
-// Threads that end before the call that starts them returns. They block all signals, so that the program's signal
-// handlers run on its own threads.
+// Threads that work while the calling thread watches. They end before the call that starts them returns. They block all
+// signals, so that the program's signal handlers run on its own threads.
 #pragma once
 
-#include "Runtime/Core/Types.h"
+#include "Library/Progress.h"
 
-#include <chrono>
 #include <condition_variable>
+#include <functional>
 #include <mutex>
 
-// How many threads the process may use at once, by the processors that it may run on.
-UInt32 ProcessorCount();
+// How many threads a run uses: as many as its caller wants (0: one per processor that the process may use), but no more
+// than there is memory, or work, for. At least 1.
+UInt32 ChooseThreadCount(UInt32 wanted, UInt64 atMost);
 
-// How often a run tells its progress.
-constexpr auto kProgressInterval = std::chrono::milliseconds(100);
-
-// Work that several threads do while the calling thread watches.
-class ThreadedWork {
+// A run that the calling thread watches. One thread makes and runs it.
+class WatchedRun {
 public:
-    virtual ~ThreadedWork() = default;
+    // interval: how often it is looked at.
+    explicit WatchedRun(std::chrono::milliseconds interval = kProgressInterval)
+        : m_Interval(interval), m_Clock(ProgressClock::Clock::now(), interval) {}
+    virtual ~WatchedRun() = default;
 
-    // Called in each thread, with its number, from 0 on.
-    virtual void Work(UInt32 number) = 0;
+protected:
+    // Calls work in count threads, with numbers from 0 on, and returns when all have ended. When the system refuses
+    // threads, fewer work; when it refuses all, the calling thread does.
+    void RunOnThreads(UInt32 count, const std::function<void(UInt32 number)>& work);
 
-    // Called in the calling thread; returns when count threads have ended their Work.
-    virtual void Watch(UInt32 count) = 0;
+    // Called in the calling thread at each interval while threads work, with no lock held.
+    virtual void Look() = 0;
 
-    // Called in the calling thread, instead of both, when the system refuses all threads.
-    virtual void WorkAlone() = 0;
-};
-
-// Returns when all threads have ended. When the system refuses threads, fewer than count work.
-void RunOnThreads(UInt32 count, ThreadedWork* work);
-
-// How the thread that watches learns that the workers have ended.
-class WorkerCount {
-public:
-    // Called by each worker when it ends.
-    void AddEnded();
-
-    // Returns when count workers have ended, and calls meanwhile() at each interval until then, with no lock held.
-    template <typename Meanwhile>
-    void WaitFor(UInt32 count, Meanwhile&& meanwhile, std::chrono::milliseconds interval = kProgressInterval) {
-        std::unique_lock lock(m_Lock);
-        while (!m_HasEnded.wait_for(lock, interval, [&] { return m_Ended == count; })) {
-            lock.unlock();
-            meanwhile();
-            lock.lock();
-        }
+    // The work calls this between its pieces. Looks if the calling thread works itself, and the interval is over.
+    void LookIfAlone() {
+        if (m_IsAlone && m_Clock.IsDue()) Look();
     }
 
 private:
-    std::mutex m_Lock;
+    struct Job;
+
+    static void* RunJob(void* given);
+    void WaitFor(UInt32 count);
+
+    const std::chrono::milliseconds m_Interval;
+    bool m_IsAlone = false; // not written while there are threads
+    ProgressClock m_Clock;
+
+    std::mutex m_EndLock;
     std::condition_variable m_HasEnded;
-    UInt32 m_Ended = 0;
+    UInt32 m_Ended = 0; // threads
 };

@@ -1,12 +1,11 @@
 #include "Library/Writer/FolderEntries.h"
 
 #include "Library/Patterns.h"
-#include "Library/Threads.h"
+#include "Library/Progress.h"
 #include "PlatformDependent/Linux/RepeatOnInterrupt.h"
 #include "Runtime/Allocator/Allocator.h"
 
 #include <cerrno>
-#include <chrono>
 #include <dirent.h>
 #include <fcntl.h>
 #include <sys/stat.h>
@@ -30,7 +29,8 @@ public:
           m_Options(options),
           m_Place(place),
           m_Findings(findings),
-          m_Path(findings->failed) {}
+          m_Path(findings->failed),
+          m_Clock({}) {}
 
     zarvo_code ListAll(Failure* failure) {
         const EntryList& files = *m_Findings->files;
@@ -74,7 +74,8 @@ private:
             return FailWith(true, failure);
         }
         while (true) {
-            if (!TellProgress()) return failure->Set(ZARVO_ERROR_STOPPED, "stopped");
+            if (m_Clock.IsDue() && !TellProgress(m_Options, {.filesTotal = m_Findings->files->size()}))
+                return failure->SetStopped();
             errno = 0;
             const dirent* const found = readdir(folder);
             if (found == nullptr && errno == 0) return ZARVO_OK;
@@ -116,17 +117,6 @@ private:
         return isKept ? ZARVO_OK : failure->SetMemory();
     }
 
-    // False: to be stopped.
-    bool TellProgress() {
-        const auto now = std::chrono::steady_clock::now();
-        if (m_Options.progress == nullptr || now - m_LastTold < kProgressInterval) return true;
-        m_LastTold = now;
-        zarvo_progress progress = {};
-        progress.struct_size = sizeof(progress);
-        progress.files_total = m_Findings->files->size();
-        return m_Options.progress(m_Options.context, &progress) == 0;
-    }
-
     zarvo_code FailWith(bool isFolder, Failure* failure) {
         m_Findings->isFailedFolder = isFolder;
         return failure->code;
@@ -136,9 +126,9 @@ private:
     const zarvo_run_options& m_Options;
     const NewArchive& m_Place;
     Findings* m_Findings;
-    core::string& m_Path;                             // of what is at hand, and so of what fails
-    size_t m_FolderPathSize = 0;                      // of the folder that is listed, with "/"
-    std::chrono::steady_clock::time_point m_LastTold; // in the distant past
+    core::string& m_Path;        // of what is at hand, and so of what fails
+    size_t m_FolderPathSize = 0; // of the folder that is listed, with "/"
+    ProgressClock m_Clock;       // begins in the distant past: the first name is told at once
 };
 
 FolderEntries::~FolderEntries() {

@@ -9,7 +9,6 @@
 
 namespace {
 
-constexpr UInt32 kMaxThreads = 1'024;
 constexpr UInt64 kSpareSlotBytes = 8'388'608; // of all threads together
 constexpr size_t kEmptyFilesAtOnce = 256;     // that a thread takes, so that others check those of other folders
 
@@ -30,11 +29,9 @@ zarvo_code WriteRun::ChooseThreads(UInt32* threads, Failure* failure) const {
     if (needed > memory)
         return failure->Set(ZARVO_ERROR_LIMIT, "to compress takes %llu bytes of memory, and the limit is %llu",
                             static_cast<unsigned long long>(needed), static_cast<unsigned long long>(memory));
-    UInt64 count = m_Options.threads != 0 ? m_Options.threads : ProcessorCount();
     const UInt64 pieces = std::max<UInt64>(m_Plan.BlockCount(), m_EmptyFiles.size() / kEmptyFilesAtOnce);
-    count = std::min({count, memory / needed, pieces, FreeDescriptors(kOtherDescriptors) / kDescriptorsOfThread,
-                      UInt64{kMaxThreads}});
-    *threads = static_cast<UInt32>(std::max<UInt64>(count, 1));
+    const UInt64 descriptors = FreeDescriptors(kOtherDescriptors) / kDescriptorsOfThread;
+    *threads = ChooseThreadCount(m_Options.threads, std::min({memory / needed, pieces, descriptors}));
     return ZARVO_OK;
 }
 
@@ -74,10 +71,9 @@ zarvo_code WriteRun::Write(NewArchive* file, Failure* failure) {
     const bool isStream = m_Plan.Layout() == ZARVO_LAYOUT_WEB;
     if (!isStream && !PrepareSlots(threads)) return failure->SetMemory();
     m_End = m_DataPlace = HeadSize();
-    m_IsStoppedByCaller = !TellProgress();
-    if (!m_IsStoppedByCaller) RunOnThreads(threads, this);
-    if (!m_IsStoppedByCaller) m_IsStoppedByCaller = !TellProgress();
-    if (m_Fatal.code == ZARVO_OK && m_IsStoppedByCaller) (void)m_Fatal.Set(ZARVO_ERROR_STOPPED, "stopped");
+    Look();
+    if (m_Fatal.code == ZARVO_OK) RunOnThreads(threads, [this](UInt32 thread) { Work(thread); });
+    if (m_Fatal.code != ZARVO_ERROR_STOPPED) Look();
     if (m_Fatal.code == ZARVO_OK) return WriteFrame(failure);
     *failure = m_Fatal;
     return failure->code;
@@ -89,31 +85,17 @@ void WriteRun::Work(UInt32 thread) {
         WorkOnBlocks(thread);
     else if (thread == 0)
         WorkOnStream();
-    m_Workers.AddEnded();
-}
-
-void WriteRun::Watch(UInt32 count) {
-    m_Workers.WaitFor(count, [&] { Look(); });
-}
-
-void WriteRun::WorkAlone() {
-    m_IsAlone = true;
-    Work(0);
-}
-
-void WriteRun::LookIfDue() {
-    const auto now = std::chrono::steady_clock::now();
-    if (now - m_LastLook < kProgressInterval) return;
-    m_LastLook = now;
-    Look();
 }
 
 void WriteRun::Look() {
-    if (TellProgress()) return;
-    std::lock_guard lock(m_Lock);
-    m_IsStoppedByCaller = true;
-    m_IsStopped.store(true, std::memory_order_relaxed);
-    m_HasFreeSlot.notify_all();
+    const UInt64 bytes = m_BytesDone.load(std::memory_order_relaxed); // nothing else goes by it
+    if (TellProgress(
+            m_Options,
+            {.bytes = bytes, .bytesTotal = m_Data.Size(), .files = CountDone(bytes), .filesTotal = m_List.size()}))
+        return;
+    Failure stopped;
+    (void)stopped.SetStopped();
+    Fail(stopped, kNoOrder);
 }
 
 // Of the entries before a position, and of the empty files wherever they are.
@@ -123,22 +105,11 @@ UInt64 WriteRun::CountDone(UInt64 position) const {
     return passed - static_cast<UInt64>(emptyPassed) + m_EmptyFilesDone.load(std::memory_order_relaxed);
 }
 
-bool WriteRun::TellProgress() {
-    if (m_Options.progress == nullptr) return true;
-    zarvo_progress progress = {};
-    progress.struct_size = sizeof(progress);
-    progress.bytes = m_BytesDone.load(std::memory_order_relaxed); // nothing else goes by it
-    progress.bytes_total = m_Data.Size();
-    progress.files = CountDone(progress.bytes);
-    progress.files_total = m_List.size();
-    return m_Options.progress(m_Options.context, &progress) == 0;
-}
-
 // A failure ends the run. What was taken before is still read, so of several failures the one that counts is that which
 // a single thread would have met.
 void WriteRun::Fail(const Failure& failure, UInt64 order, size_t entry) {
     std::lock_guard lock(m_Lock);
-    if (!m_IsStoppedByCaller && (m_Fatal.code == ZARVO_OK || order < m_FatalOrder)) {
+    if (m_Fatal.code == ZARVO_OK || (m_Fatal.code != ZARVO_ERROR_STOPPED && order < m_FatalOrder)) {
         m_Fatal = failure;
         m_FatalOrder = order;
         m_FailedEntry = entry;
@@ -160,7 +131,7 @@ void WriteRun::CheckEmptyFiles(UInt32 thread) {
                 return Fail(failure, at, index);
         }
         m_EmptyFilesDone.fetch_add(end - begin, std::memory_order_relaxed);
-        if (m_IsAlone) LookIfDue();
+        LookIfAlone();
     }
 }
 
@@ -173,7 +144,7 @@ void WriteRun::WorkOnBlocks(UInt32 thread) {
     }
     while (Slot* const slot = TakeSlot()) {
         if (!FillSlot(thread, &encoder, slot) || !Commit(slot)) return;
-        if (m_IsAlone) LookIfDue();
+        LookIfAlone();
     }
 }
 
@@ -268,7 +239,7 @@ public:
         if (m_Run->m_Data.Read(0, m_Position, buffer, *size, &m_FailedEntry, &m_Failure) != ZARVO_OK) return false;
         m_Position += *size;
         m_Run->m_BytesDone.store(m_Position, std::memory_order_relaxed);
-        if (m_Run->m_IsAlone) m_Run->LookIfDue();
+        m_Run->LookIfAlone();
         return true;
     }
 

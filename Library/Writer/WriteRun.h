@@ -22,7 +22,7 @@
 #include <condition_variable>
 #include <mutex>
 
-class WriteRun final : private ThreadedWork, private NonCopyable {
+class WriteRun final : private WatchedRun, private NonCopyable {
 public:
     // All must outlive the run.
     WriteRun(const WritePlan& plan, const EntryList& list, EntrySource* source, const zarvo_run_options& options)
@@ -48,11 +48,8 @@ private:
     };
     class StreamWriter;
 
-    void Work(UInt32 thread) override;
-    void Watch(UInt32 count) override;
-    void WorkAlone() override;
-    void LookIfDue();
-    void Look();
+    void Work(UInt32 thread);
+    void Look() override;
     zarvo_code ChooseThreads(UInt32* threads, Failure* failure) const;
     [[nodiscard]] bool FindEmptyFiles();
     [[nodiscard]] bool PrepareSlots(UInt32 threads);
@@ -77,7 +74,6 @@ private:
     UInt64 OrderOf(UInt64 block) const { return m_EmptyFiles.size() + block; }
 
     void Fail(const Failure& failure, UInt64 order, size_t entry = PlannedData::kNoEntry);
-    bool TellProgress(); // false: to be stopped
     UInt64 CountDone(UInt64 position) const;
 
     const WritePlan& m_Plan;
@@ -90,9 +86,6 @@ private:
     dynamic_array<UInt32> m_EmptyFiles{kMemLabelFileSystem}; // indices, in order
     BlockRecords m_Records{kMemLabelFileSystem};
     size_t m_FailedEntry = PlannedData::kNoEntry;
-    WorkerCount m_Workers;
-    bool m_IsAlone = false; // there is no thread but the caller's, which tells progress between blocks
-    std::chrono::steady_clock::time_point m_LastLook = std::chrono::steady_clock::now();
 
     // What follows is under m_Lock, which is held to take and hand over slots, and never to encode or to write.
     std::mutex m_Lock;
@@ -102,9 +95,8 @@ private:
     UInt64 m_NextNumber = 0; // to be taken
     UInt64 m_NextPlaced = 0; // to get a place
     UInt64 m_End = 0;        // of what has got a place
-    Failure m_Fatal;
+    Failure m_Fatal;         // ZARVO_ERROR_STOPPED: the caller wants no more
     UInt64 m_FatalOrder = kNoOrder;
-    bool m_IsStoppedByCaller = false;
 
     std::atomic<bool> m_IsStopped{false};
     std::atomic<size_t> m_NextEmptyFile{0};  // to be checked, of m_EmptyFiles
