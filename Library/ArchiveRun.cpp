@@ -10,10 +10,13 @@ namespace {
 // How often results are told. Callers may hold something for each file until then, and small files are many.
 constexpr auto kReportInterval = std::chrono::milliseconds(10);
 
-// A block takes its decoded bytes, and its stored ones, which are no more.
-UInt64 MaxBlockBytes(zarvo_archive* archive, UInt64 memory) { return std::min(archive->MaxBlockBytes(), memory / 2); }
+// What is free is another number each time, so it is looked at once.
+zarvo_run_options WithMemory(zarvo_run_options options) {
+    options.memory = MemoryBudget(options.memory);
+    return options;
+}
 
-UInt32 CountThreads(zarvo_archive* archive, const zarvo_run_options& options, UInt64 memory, UInt64 maxBlockBytes) {
+UInt32 CountThreads(zarvo_archive* archive, const zarvo_run_options& options, UInt64 maxBlockBytes) {
     UInt64 largest = 1;
     for (UInt32 index = 0; index < archive->Blocks().BlockCount(); ++index) {
         const BlockDecoder::Block block = archive->Blocks().GetBlock(index);
@@ -21,7 +24,7 @@ UInt32 CountThreads(zarvo_archive* archive, const zarvo_run_options& options, UI
                                  !BlockDecoder::IsReadInPieces(block, maxBlockBytes);
         if (isHeldWhole) largest = std::max(largest, archive->Blocks().BytesToHold(block));
     }
-    return ChooseThreadCount(options.threads, memory / (2 * largest));
+    return ChooseThreadCount(options.threads, options.memory / (2 * largest));
 }
 
 } // namespace
@@ -29,9 +32,10 @@ UInt32 CountThreads(zarvo_archive* archive, const zarvo_run_options& options, UI
 ArchiveRun::ArchiveRun(zarvo_archive* archive, const zarvo_run_options& options)
     : WatchedRun(kReportInterval),
       m_Archive(archive),
-      m_Options(options),
-      m_MaxBlockBytes(MaxBlockBytes(archive, MemoryBudget(options.memory))),
-      m_ThreadCount(CountThreads(archive, options, MemoryBudget(options.memory), m_MaxBlockBytes)),
+      m_Options(WithMemory(options)),
+      // A block takes its decoded bytes, and its stored ones, which are no more.
+      m_MaxBlockBytes(std::min<UInt64>(archive->MaxBlockBytes(), m_Options.memory / 2)),
+      m_ThreadCount(CountThreads(archive, m_Options, m_MaxBlockBytes)),
       m_Data(&archive->Blocks(), archive->Nodes(), m_MaxBlockBytes, m_ThreadCount, this) {}
 
 zarvo_code ArchiveRun::Plan(OutputPlan* plan, UInt64* bytes, Failure* failure) {

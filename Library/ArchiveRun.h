@@ -74,7 +74,7 @@ private:
     State GetState(size_t entry);
 
     zarvo_archive* m_Archive;
-    const zarvo_run_options m_Options;
+    const zarvo_run_options m_Options; // memory is never 0
     UInt64 m_MaxBlockBytes;
     UInt32 m_ThreadCount;
     DataRun m_Data;

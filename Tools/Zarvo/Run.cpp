@@ -8,10 +8,17 @@
 
 namespace {
 
-// What "--memory" is when it isn't given: half of the memory that programs may take without others being moved out.
+// What "--memory" says; 0 when it isn't given.
+uint64_t FindMemory(const Arguments& arguments) {
+    const std::string* const memory = arguments.Find(kMemory);
+    return memory != nullptr ? *ParseSize(*memory) : 0;
+}
+
+// What it then is: half of the memory that programs may take without others being moved out. The library finds that out
+// for runs, but an archive that is only read from is opened with the number.
 uint64_t GetDefaultMemory() {
     std::ifstream file("/proc/meminfo");
-    std::string name, unit;
+    std::string name;
     for (uint64_t kibibytes = 0; file >> name >> kibibytes;) {
         if (name == "MemAvailable:") return kibibytes * 1'024 / 2;
         file.ignore(std::numeric_limits<std::streamsize>::max(), '\n');
@@ -21,13 +28,11 @@ uint64_t GetDefaultMemory() {
 
 } // namespace
 
-uint64_t Run::GetMemory() const {
-    const std::string* const memory = arguments.Find(kMemory);
-    return memory != nullptr ? *ParseSize(*memory) : GetDefaultMemory();
-}
-
 // A block in memory is held twice: as it is stored and as it is decoded.
-uint64_t Run::GetMaxBlockBytes() const { return std::max<uint64_t>(GetMemory() / 2, 1); }
+uint64_t Run::GetMaxBlockBytes() const {
+    const uint64_t memory = FindMemory(arguments);
+    return std::max<uint64_t>((memory != 0 ? memory : GetDefaultMemory()) / 2, 1);
+}
 
 int RefuseUsage(Console& console, const Subcommand& subcommand, std::string_view complaint) {
     const std::string name(subcommand.name);
@@ -64,7 +69,7 @@ zarvo::run_options Run::MakeOptions(Progress& progress) const {
     zarvo::run_options options;
     if (const std::string* const threads = arguments.Find(kThreads))
         options.threads = static_cast<uint32_t>(std::stoul(*threads));
-    options.memory = GetMemory();
+    options.memory = FindMemory(arguments);
     options.progress = [this, &progress](const zarvo_progress& at) {
         output.Flush(); // a reader gets results while they come, and one that has gone is missed
         progress.Update({.bytes = at.bytes, .files = at.files}, {.bytes = at.bytes_total, .files = at.files_total});

@@ -47,9 +47,8 @@ struct Run {
     // A message on an entry of an archive, or on a pattern.
     void SayOfEntry(const std::string& archive, std::string_view entry, std::string_view text) const;
 
-    // How many bytes blocks may take, and how many the largest one may have. Where no option says so, it depends on
-    // what is free, and is another number each time.
-    uint64_t GetMemory() const;
+    // How many bytes the largest block may have that is decoded whole. Where no option says so, it depends on what is
+    // free, and is another number each time.
     uint64_t GetMaxBlockBytes() const;
 };
 
