@@ -119,11 +119,11 @@ void Extraction::Place(Worker* worker, UInt32 entry, NewFile* file, const Failur
     const int folder = FindFolder(worker, entry, &failure);
     const char* const name = worker->name.c_str();
     if (folder >= 0 && IsKept(entry, folder, name)) return;
-    if (folder >= 0 && file->Place(folder, name, false, &failure) != ZARVO_OK && failure.systemCode == EEXIST) {
+    if (folder >= 0 && file->Place(folder, name, &failure) != ZARVO_OK && failure.systemCode == EEXIST) {
         if (IsKept(entry, folder, name)) return; // it came meanwhile
         failure = {};
         if (CheckStanding(LookAt(folder, name), *Archive(), &failure) == ZARVO_OK)
-            (void)file->Place(folder, name, true, &failure);
+            (void)file->Replace(folder, name, &failure);
     }
     Settle(entry, failure, damage);
 }

@@ -2,6 +2,7 @@
 #pragma once
 
 #include "Library/ArchiveRun.h"
+#include "Library/NewFile.h"
 #include "Library/OutputFolder.h"
 #include "Runtime/Allocator/Owned.h"
 

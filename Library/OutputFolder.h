@@ -1,16 +1,10 @@
-// Makes files and folders below one folder, and nowhere else, even if another program changes the tree at the same
-// time: each folder is opened from the one above it, and no link is followed.
+// Opens folders below one folder, and nowhere else, even if another program changes the tree at the same time: each is
+// opened from the one above it, and no link is followed. Folders that are missing can be made.
 //
 //   OutputFolder output;
 //   output.Open("game_data", failure);
 //   FolderCache folders(&output, 8, FolderCache::kMake);   // one per thread
 //   int folder = folders.Get("road/of", failure);
-//   NewFile file;
-//   file.Create(folder, failure), file.Write(0, bytes, size, failure), file.Place(folder, "one.txt", overwrite,
-//   failure)
-//
-// A new file has no name until it is whole, or a temporary name in the same folder if the file system can't make files
-// without names. It then replaces what is there in one step.
 //
 // For dry runs, both kinds of folders can be looked at without being made: whatever would keep them from being made, as
 // far as can be known without writing, is a failure.
@@ -21,7 +15,6 @@
 #include "Runtime/Core/Containers/String.h"
 #include "Runtime/Core/NonCopyable.h"
 
-#include <atomic>
 #include <sys/types.h>
 
 // Any thread, once it is open.
@@ -97,15 +90,6 @@ private:
 // Whether the failure is that no descriptor is left.
 bool IsOutOfDescriptors(const Failure& failure);
 
-// Whether the disk is full or can't be written, so that other files would fail, too.
-bool IsDiskFailure(const Failure& failure);
-
-// Writes at a place of an open file.
-zarvo_code WriteAt(int descriptor, UInt64 offset, const UInt8* bytes, UInt64 size, Failure* failure);
-
-// Gives a file another name in its folder, unless something has it. Returns 0, or -1 with errno: EEXIST.
-int RenameToNew(int folder, const char* from, const char* to);
-
 // What stands in the place of a file.
 struct Standing {
     bool isThere = false;
@@ -119,42 +103,3 @@ Standing LookAt(int folder, const char* name);
 // Whether a name is one that the file system takes, and whether files can be made in a folder, without trying.
 zarvo_code CheckName(int folder, const char* name, Failure* failure);
 zarvo_code CheckCanMakeIn(int folder, Failure* failure);
-
-// One thread at a time.
-class NewFile : private NonCopyable {
-public:
-    ~NewFile(); // removes the file if it was not placed
-
-    zarvo_code Create(int folder, Failure* failure);
-    zarvo_code Write(UInt64 offset, const UInt8* bytes, UInt64 size, Failure* failure);
-
-    zarvo_code Cut(UInt64 size, Failure* failure);
-
-    // For a file that does not stay open: it is made with a temporary name, and opened again for each of the next two,
-    // which several threads may call at once. folder: the one that it was made in. Whoever made it calls Remove in the
-    // end, which does nothing after Place.
-    zarvo_code CreateClosed(int folder, Failure* failure);
-    zarvo_code WriteClosed(int folder, UInt64 offset, const UInt8* bytes, UInt64 size, Failure* failure) const;
-    zarvo_code CutClosed(int folder, UInt64 size, Failure* failure) const;
-    void Remove(int folder);
-    bool IsNamed() const { return m_Name[0] != '\0'; } // temporarily
-
-    // Gives the file its name in the folder that it was created in. A file, link, device, pipe or socket of that name
-    // is never opened. If replaces is true, it is replaced; otherwise it is left alone, the failure is EEXIST, and
-    // Place may be called again.
-    zarvo_code Place(int folder, const char* name, bool replaces, Failure* failure);
-
-private:
-    zarvo_code CreateNamed(int folder, Failure* failure);
-    int OpenAgain(int folder) const;
-    int Close();
-
-    int m_Descriptor = -1;
-    int m_Folder = -1;    // of the temporary name; a copy of the caller's
-    char m_Name[32] = ""; // the temporary one; empty where the file has none
-    dev_t m_Device = 0;   // these of a file that does not stay open
-    ino_t m_Inode = 0;
-};
-
-// Makes an empty file. The failure is EEXIST if the name is taken.
-zarvo_code PlaceEmptyFile(int folder, const char* name, Failure* failure);

@@ -1,11 +1,13 @@
 #include "Library/Writer/NewArchive.h"
 
+#include "Library/NewFile.h"
 #include "Library/OutputFolder.h"
 #include "PlatformDependent/Linux/FileDescriptor.h"
 #include "PlatformDependent/Linux/RepeatOnInterrupt.h"
 
 #include <cerrno>
 #include <climits>
+#include <cstdio>
 #include <fcntl.h>
 #include <sys/file.h>
 #include <unistd.h>
