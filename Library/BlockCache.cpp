@@ -53,13 +53,11 @@ zarvo_code BlockCache::Acquire(UInt32 blockIndex, Use* use, Failure* failure) {
         if (record == nullptr) {
             const UInt64 size = m_Decoder->GetBlock(blockIndex).size;
             FreeIdle(BytesLeftFor(size), kMaxRecords - 1, kMaxIdleCursors, nullptr);
-            const size_t index = m_Slots.size();
             record = New<Record>(kMemLabelFileSystem, blockIndex, size);
-            if (record == nullptr || !m_Slots.resize_uninitialized(index + 1)) {
+            if (record == nullptr || !m_Slots.try_push_back({blockIndex, record})) {
                 Delete(record, kMemLabelFileSystem);
                 return failure->SetMemory();
             }
-            m_Slots[index] = {blockIndex, record};
             m_Bytes += record->bytes;
             isFiller = true;
             record->filling.Lock(); // nobody else knows of it yet
@@ -162,11 +160,8 @@ void BlockCache::GiveCursorBack(StreamCursor* cursor) {
     Mutex::AutoLock lock(m_Lock);
     const UInt64 bytes = cursor->MemoryUsed();
     FreeIdle(BytesLeftFor(bytes), kMaxRecords, kMaxIdleCursors - 1, nullptr);
-    const size_t index = m_Cursors.size();
-    if (!m_Cursors.resize_uninitialized(index + 1)) {
+    if (m_Cursors.try_push_back({cursor, m_Uses++, bytes}))
+        m_Bytes += bytes;
+    else
         Delete(cursor, kMemLabelFileSystem);
-        return;
-    }
-    m_Cursors[index] = {cursor, m_Uses++, bytes};
-    m_Bytes += bytes;
 }

@@ -28,20 +28,12 @@ void DataRun::DropUnended() {
     m_Shared.clear();
 }
 
-template <typename T>
-static bool Append(dynamic_array<T>* array, const T& value) {
-    const size_t size = array->size();
-    if (!array->resize_uninitialized(size + 1)) return false;
-    (*array)[size] = value;
-    return true;
-}
-
 void DataRun::AddFile(UInt32 entry) {
     m_BytesTotal += EndOf(entry) - BeginOf(entry);
     m_Files.push_back(entry); // never grows
 }
 
-bool DataRun::AddOther(UInt32 entry) { return Append(&m_Others, entry); }
+bool DataRun::AddOther(UInt32 entry) { return m_Others.try_push_back(entry); }
 
 void DataRun::Prepare() {
     const auto isBefore = [this](UInt32 a, UInt32 b) {
@@ -70,7 +62,7 @@ SharedFile* DataRun::Share(UInt32 entry) {
     SharedFile* shared = m_Sink->ShareFile(entry, EndOf(entry) - BeginOf(entry));
     if (shared == nullptr) return nullptr;
     shared->liveIndex = m_Shared.size();
-    if (Append(&m_Shared, shared)) return shared;
+    if (m_Shared.try_push_back(shared)) return shared;
     m_Sink->DropFile(shared);
     return nullptr;
 }
@@ -121,7 +113,7 @@ bool DataRun::ListFiles(Unit* unit) {
     unit->leaving.clear();
     size_t kept = 0;
     for (const PieceFile& active : m_Active) {
-        if (!Append(&unit->carried, active)) return false;
+        if (!unit->carried.try_push_back(active)) return false;
         if (EndOf(active.entry) > unit->end) m_Active[kept++] = active;
     }
     m_Active.truncate(kept);
@@ -130,7 +122,8 @@ bool DataRun::ListFiles(Unit* unit) {
         const UInt32 entry = m_Files[m_NextFile];
         if (EndOf(entry) <= unit->end) continue;
         const PieceFile leaving = {entry, Share(entry)};
-        if (leaving.shared == nullptr || !Append(&unit->leaving, leaving) || !Append(&m_Active, leaving)) return false;
+        if (leaving.shared == nullptr || !unit->leaving.try_push_back(leaving) || !m_Active.try_push_back(leaving))
+            return false;
     }
     unit->endFile = m_NextFile;
     return true;
@@ -166,7 +159,7 @@ void DataRun::Work(UInt32 worker) {
             lock.unlock();
             Deliver(worker, *passed);
             lock.lock();
-            if (!Append(&m_Spare, passed)) Delete(passed, kMemLabelFileSystem);
+            if (!m_Spare.try_push_back(passed)) Delete(passed, kMemLabelFileSystem);
         } else if (const UnitAnswer answer = NextUnit(&unit); answer != kNoUnit) {
             if (answer == kNoMemoryForUnit) {
                 lock.unlock();
@@ -209,12 +202,12 @@ void DataRun::WorkOnUnit(UInt32 worker, const Unit& unit, Piece* piece) {
     piece->end = unit.end;
     piece->files.clear();
     for (const PieceFile& carried : unit.carried)
-        if (!Append(&piece->files, carried)) return StopWithoutMemory();
+        if (!piece->files.try_push_back(carried)) return StopWithoutMemory();
     size_t leaving = 0;
     for (size_t index = unit.firstFile; index < unit.endFile; ++index) {
         const UInt32 entry = m_Files[index];
         const PieceFile inPiece = EndOf(entry) <= unit.end ? PieceFile{entry, nullptr} : unit.leaving[leaving++];
-        if (!Append(&piece->files, inPiece)) return StopWithoutMemory();
+        if (!piece->files.try_push_back(inPiece)) return StopWithoutMemory();
     }
     Decode(unit, piece);
     Deliver(worker, *piece);
@@ -222,7 +215,7 @@ void DataRun::WorkOnUnit(UInt32 worker, const Unit& unit, Piece* piece) {
 
 void DataRun::AddHole(Piece* piece, UInt64 begin, UInt64 end, const Failure& failure) {
     if (failure.code == ZARVO_ERROR_MEMORY || failure.code == ZARVO_ERROR_CHANGED) return StopFor(failure);
-    if (!Append(&piece->holes, {begin, end, failure})) StopWithoutMemory();
+    if (!piece->holes.try_push_back({begin, end, failure})) StopWithoutMemory();
 }
 
 void DataRun::Decode(const Unit& unit, Piece* piece) {
@@ -269,7 +262,7 @@ void DataRun::WorkOnStream(UInt32 worker, const Unit& unit, Piece** piece) {
     UInt64 end = m_TakesAllBlocks ? unit.end : unit.begin;
     for (const PieceFile& carried : unit.carried) {
         end = std::max(end, std::min(unit.end, EndOf(carried.entry)));
-        if (!Append(&active, carried)) return StopWithoutMemory();
+        if (!active.try_push_back(carried)) return StopWithoutMemory();
     }
     for (size_t index = unit.firstFile; index < unit.endFile; ++index)
         end = std::max(end, std::min(unit.end, EndOf(m_Files[index])));
@@ -287,7 +280,7 @@ void DataRun::WorkOnStream(UInt32 worker, const Unit& unit, Piece** piece) {
 
         size_t kept = 0;
         for (const PieceFile& going : active) {
-            isOk = isOk && Append(&(*piece)->files, going);
+            isOk = isOk && (*piece)->files.try_push_back(going);
             if (EndOf(going.entry) > (*piece)->end) active[kept++] = going;
         }
         active.truncate(kept);
@@ -301,8 +294,8 @@ void DataRun::WorkOnStream(UInt32 worker, const Unit& unit, Piece** piece) {
                 inPiece.shared = Share(entry);
                 isOk = inPiece.shared != nullptr;
             }
-            isOk = isOk && Append(&(*piece)->files, inPiece);
-            if (EndOf(entry) > (*piece)->end) isOk = isOk && Append(&active, inPiece);
+            isOk = isOk && (*piece)->files.try_push_back(inPiece);
+            if (EndOf(entry) > (*piece)->end) isOk = isOk && active.try_push_back(inPiece);
         }
         if (!isOk) return StopWithoutMemory();
 
@@ -328,7 +321,7 @@ bool DataRun::PassOn(Piece** piece) {
         next = New<Piece>(kMemLabelFileSystem);
     }
     if (next == nullptr) return false;
-    if (!Append(&m_Passed, *piece)) {
+    if (!m_Passed.try_push_back(*piece)) {
         Delete(next, kMemLabelFileSystem);
         return false;
     }

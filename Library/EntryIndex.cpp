@@ -128,21 +128,20 @@ bool EntryIndex::LinkIntoFolders(UInt32 entry, PathHasher* hasher, dynamic_array
     return true;
 }
 
-// As resize_uninitialized, but by an eighth at a time: most archives imply few folders, or none.
+// By an eighth at a time: most archives imply few folders, or none.
 template <typename T>
-static bool AppendOne(dynamic_array<T>* array, T value) {
+static bool MakeRoomForOne(dynamic_array<T>* array) {
     const size_t size = array->size();
-    if (size == array->capacity() && !array->reserve(size + size / 8 + 16)) return false;
-    if (!array->resize_uninitialized(size + 1)) return false;
-    (*array)[size] = value;
-    return true;
+    return size < array->capacity() || array->reserve(size + size / 8 + 16);
 }
 
 bool EntryIndex::AddImpliedFolder(UInt32 entry, size_t length, size_t normalLength, UInt32* slot) {
     const UInt32 item = ItemCount();
     if (item >= kRoot - 1 || length > ~UInt32{0}) return false;
-    if (!AppendOne(&m_Implied, {entry, static_cast<UInt32>(length), static_cast<UInt32>(normalLength)})) return false;
-    if (!AppendOne(&m_FirstChild, UInt32{kNoItem}) || !AppendOne(&m_NextSibling, UInt32{kNoItem})) return false;
+    if (!MakeRoomForOne(&m_Implied) || !MakeRoomForOne(&m_FirstChild) || !MakeRoomForOne(&m_NextSibling)) return false;
+    m_Implied.push_back({entry, static_cast<UInt32>(length), static_cast<UInt32>(normalLength)});
+    m_FirstChild.push_back(kNoItem);
+    m_NextSibling.push_back(kNoItem);
     *slot = item;
     return true;
 }

@@ -16,9 +16,8 @@ public:
             const size_t begin = m_Texts.size();
             const size_t size = strlen(failure.text) + 1;
             if (count == ~UInt32{0} || !m_Texts.resize_uninitialized(begin + size)) return false;
-            if (!m_Items.resize_uninitialized(count + 1)) return false;
+            if (!m_Items.try_push_back({failure.code, failure.systemCode, begin})) return false;
             memcpy(m_Texts.data() + begin, failure.text, size);
-            m_Items[count] = {failure.code, failure.systemCode, begin};
         }
         *place = static_cast<UInt32>(m_Items.size() - 1);
         return true;

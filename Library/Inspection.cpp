@@ -66,11 +66,7 @@ UInt64 TestRun::ReadableBytes(const Node& node) const {
 void TestRun::TakeDamage(UInt32 blockIndex, UInt64 begin, UInt64 end, const Failure& damage) {
     UInt32 place = 0;
     Mutex::AutoLock lock(m_DamageLock);
-    const size_t index = m_Damages.size();
-    if (m_Failures.Add(damage, &place) && m_Damages.resize_uninitialized(index + 1)) {
-        m_Damages[index] = {blockIndex, place, begin, end};
-        return;
-    }
+    if (m_Failures.Add(damage, &place) && m_Damages.try_push_back({blockIndex, place, begin, end})) return;
     Failure noMemory;
     (void)noMemory.SetMemory();
     Data().StopFor(noMemory);

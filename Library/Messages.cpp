@@ -43,18 +43,13 @@ bool MessageLog::IsNew(const core::string& message) {
     Mutex::AutoLock lock(m_Lock);
     for (UInt64 told : m_Told)
         if (told == hash) return false;
-    const size_t index = m_Told.size();
-    if (index == kMaxMessages || !m_Told.resize_uninitialized(index + 1)) return false;
-    m_Told[index] = hash;
-    return true;
+    return m_Told.size() < kMaxMessages && m_Told.try_push_back(hash);
 }
 
 void MessageQueue::Add(dynamic_array<core::string>* messages) {
     Mutex::AutoLock lock(m_Lock);
-    for (core::string& message : *messages) {
-        const size_t index = m_Messages.size();
-        if (index < kMaxMessages && m_Messages.resize_initialized(index + 1)) m_Messages[index] = std::move(message);
-    }
+    for (core::string& message : *messages)
+        if (m_Messages.size() < kMaxMessages) (void)m_Messages.try_push_back(std::move(message)); // or it is lost
 }
 
 void MessageQueue::TellAll(MessageLog* log) {

@@ -104,8 +104,7 @@ bool OutputPlan::Settle(UInt32 entry, dynamic_array<UInt64>* hashes) {
         (void)at.Next();
         if (level < there) continue;
         const size_t index = m_Implied.size();
-        if (at.End() > ~UInt32{0} || !m_Implied.resize_uninitialized(index + 1)) return false;
-        m_Implied[index] = {entry, static_cast<UInt32>(at.End())};
+        if (at.End() > ~UInt32{0} || !m_Implied.try_push_back({entry, static_cast<UInt32>(at.End())})) return false;
         *Find((*hashes)[level], path.substr(0, at.End())) = static_cast<UInt32>(m_Nodes.size() + index);
     }
     return true;

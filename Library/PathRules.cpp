@@ -92,9 +92,7 @@ bool HashFolders(core::string_ref path, UInt64 seed, dynamic_array<UInt64>* hash
     hashes->clear();
     for (PathComponents at(path); at.Next();) {
         seed = HashComponent(seed, at.Name());
-        const size_t index = hashes->size();
-        if (!hashes->resize_uninitialized(index + 1)) return false;
-        (*hashes)[index] = seed;
+        if (!hashes->try_push_back(seed)) return false;
     }
     return true;
 }

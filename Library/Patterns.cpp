@@ -46,24 +46,21 @@ bool zarvo_patterns::MakeRoomForLiteral() {
 
 zarvo_code zarvo_patterns::Add(core::string_ref text, Failure* failure) {
     const size_t count = m_Patterns.size();
-    const size_t globCount = m_Globs.size();
     text = StripEnds(text);
     bool isOk = count < kNone && m_Patterns.resize_initialized(count + 1);
     if (isOk) {
         isOk = m_Patterns[count].text.grow(text.size()) != nullptr && MakeRoomForLiteral();
         if (isOk) m_Patterns[count].text = text;
-        if (isOk && IsGlob(text)) isOk = m_Globs.resize_uninitialized(globCount + 1);
+        if (isOk && IsGlob(text)) isOk = m_Globs.try_push_back(static_cast<UInt32>(count));
     }
     if (!isOk) {
         m_Patterns.truncate(count);
         return failure->SetMemory();
     }
-    const UInt32 index = static_cast<UInt32>(count);
-    if (m_Globs.size() != globCount) m_Globs[globCount] = index;
     const bool isEverything = LastComponent(text).empty();
     UInt32* const head = isEverything ? &m_Everything : FindSlot(HashPath(text, kHashSeed), text);
     m_Patterns[count].nextEqual = *head;
-    *head = index;
+    *head = static_cast<UInt32>(count);
     return ZARVO_OK;
 }
 

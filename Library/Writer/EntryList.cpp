@@ -5,12 +5,10 @@
 
 bool EntryList::Add(core::string_ref path, UInt32 flags, UInt64 size, UInt32 source) {
     const size_t begin = m_Paths.size();
-    const size_t index = m_Entries.size();
     if (path.size() >= ~UInt32{0} || !m_Paths.resize_uninitialized(begin + path.size() + 1)) return false;
-    if (!m_Entries.resize_uninitialized(index + 1)) return false;
+    if (!m_Entries.try_push_back({begin, 0, size, static_cast<UInt32>(path.size()), flags, source})) return false;
     memcpy(m_Paths.data() + begin, path.data(), path.size());
     m_Paths[begin + path.size()] = '\0';
-    m_Entries[index] = {begin, 0, size, static_cast<UInt32>(path.size()), flags, source};
     return true;
 }
 

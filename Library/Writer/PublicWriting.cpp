@@ -20,8 +20,7 @@ struct zarvo_writer final : public EntrySource {
     // Adds a file, and becomes the owner of its source. False when memory is refused.
     [[nodiscard]] bool AddFile(core::string_ref path, Source* source) {
         const size_t count = m_Sources.size();
-        if (!m_Sources.resize_uninitialized(count + 1)) return false;
-        m_Sources[count] = source;
+        if (!m_Sources.try_push_back(source)) return false;
         if (m_Entries.Add(path, 0, source->Size(), static_cast<UInt32>(count))) return true;
         m_Sources.truncate(count);
         return false;

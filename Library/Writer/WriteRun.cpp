@@ -40,9 +40,7 @@ bool WriteRun::FindEmptyFiles() {
     for (size_t index = 0; index < m_List.size(); ++index) {
         const EntryList::Entry& entry = m_List[index];
         if (entry.size != 0 || EntryList::IsFolder(entry)) continue;
-        const size_t count = m_EmptyFiles.size();
-        if (!m_EmptyFiles.resize_uninitialized(count + 1)) return false;
-        m_EmptyFiles[count] = static_cast<UInt32>(index);
+        if (!m_EmptyFiles.try_push_back(static_cast<UInt32>(index))) return false;
     }
     return true;
 }

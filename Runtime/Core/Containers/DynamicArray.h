@@ -8,8 +8,8 @@
 //
 // Growth moves elements byte by byte and calls none of their functions, so an element must hold no pointer to itself
 // (core::string holds none).
-// When memory is refused, the operations that take a size or a capacity answer false and leave the array as it was.
-// Copying and adding an element have no answer: they end the process.
+// When memory is refused, try_push_back and what takes a size or a capacity answer false and leave the array as it was.
+// Copying, push_back and emplace_back have no answer: they end the process.
 // An array belongs to one thread at a time.
 #pragma once
 
@@ -142,6 +142,13 @@ public:
         T* element = construct(data() + m_Array.size, std::forward<Arguments>(arguments)...);
         ++m_Array.size;
         return *element;
+    }
+
+    // As push_back, but false when memory is refused; nothing has changed then.
+    [[nodiscard]] bool try_push_back(T value) {
+        if (size() == capacity() && !grow()) return false;
+        emplace_back(std::move(value));
+        return true;
     }
 
     void pop_back() {

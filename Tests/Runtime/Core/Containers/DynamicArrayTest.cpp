@@ -115,6 +115,20 @@ TEST(DynamicArray, RefusedElementEndsTheProcess) {
     EXPECT_EXIT(array.push_back(1), testing::KilledBySignal(SIGABRT), "");
 }
 
+TEST(DynamicArray, TriedElementIsAddedOrRefused) {
+    dynamic_array<UInt64> numbers(kMemLabelGeneral);
+    for (UInt64 number = 0; number < 3; ++number)
+        EXPECT_TRUE(numbers.try_push_back(number));
+    EXPECT_EQ((Shape{.size = 3, .capacity = 4, .isOwner = true}), ShapeOf(numbers));
+    EXPECT_EQ(2, numbers[2]);
+
+    constexpr size_t kRefused = size_t{1} << 60;
+    UInt8 byte = 0;
+    auto array = dynamic_array<UInt8>::wrap(&byte, kRefused, kRefused, kMemLabelGeneral);
+    EXPECT_FALSE(array.try_push_back(1));
+    EXPECT_EQ((Shape{.size = kRefused, .capacity = kRefused, .isOwner = false}), ShapeOf(array));
+}
+
 TEST(DynamicArray, BehavesAsItsTwinUnderRandomEdits) {
     for (unsigned seed = 0; seed < 100; ++seed) {
         std::mt19937 random(seed);
