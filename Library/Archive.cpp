@@ -6,21 +6,15 @@
 
 using namespace ArchiveStorageHeader;
 
-zarvo_archive::zarvo_archive(Source* source, const zarvo_open_options& options)
+zarvo_archive::zarvo_archive(Owned<Source> source, const zarvo_open_options& options)
     : m_Options(options),
       m_Messages(options.log, options.log_context),
-      m_Source(source),
-      m_File(source),
+      m_Source(std::move(source)),
+      m_File(m_Source.get()),
       m_Reader(kMemLabelFileSystem),
-      m_Blocks(&m_Reader, source),
+      m_Blocks(&m_Reader, m_Source.get()),
       m_Cache(&m_Blocks, options.cache_bytes),
       m_Index(m_Reader.GetDirectoryInfo().nodes) {}
-
-zarvo_archive::~zarvo_archive() {
-    Delete(m_Data, kMemLabelFileSystem);
-    // The reader closes the file that stands on the source, but does not read any more.
-    Delete(m_Source, kMemLabelFileSystem);
-}
 
 zarvo_code zarvo_archive::Open(Failure* failure) {
     const UInt64 refusedBefore = CountRefusedRequests();
@@ -33,8 +27,9 @@ zarvo_code zarvo_archive::Open(Failure* failure) {
         return failure->Set(ZARVO_ERROR_LIMIT, "%llu entries; the limit (max_entries) is %llu",
                             static_cast<unsigned long long>(Nodes().size()),
                             static_cast<unsigned long long>(m_Options.max_entries));
-    m_Data = New<DataReader>(kMemLabelFileSystem, &m_Blocks, &m_Cache, m_Options.max_block_bytes);
-    if (m_Data == nullptr) return failure->SetMemory();
+    m_Data = {New<DataReader>(kMemLabelFileSystem, &m_Blocks, &m_Cache, m_Options.max_block_bytes),
+              kMemLabelFileSystem};
+    if (!m_Data) return failure->SetMemory();
     DescribeBlocks();
     DescribeEntries();
     return ZARVO_OK;

@@ -12,9 +12,8 @@
 struct zarvo_archive : private NonCopyable {
     using Node = ArchiveStorageHeader::Node;
 
-    // Becomes the owner of source. options: with all defaults filled in.
-    zarvo_archive(Source* source, const zarvo_open_options& options);
-    ~zarvo_archive();
+    // options: with all defaults filled in.
+    zarvo_archive(Owned<Source> source, const zarvo_open_options& options);
 
     zarvo_code Open(Failure* failure);
 
@@ -49,12 +48,12 @@ private:
 
     const zarvo_open_options m_Options;
     MessageLog m_Messages;
-    Source* const m_Source; // owned
+    const Owned<Source> m_Source;
     SourceFile m_File;
     ArchiveStorageReader m_Reader;
     BlockDecoder m_Blocks;
     BlockCache m_Cache;
-    DataReader* m_Data = nullptr; // owned; once the blocks are known
+    Owned<DataReader> m_Data; // once the blocks are known
     zarvo_info m_Info = ZARVO_INFO_INIT;
 
     Mutex m_IndexLock; // held while the index is built

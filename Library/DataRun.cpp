@@ -70,10 +70,10 @@ SharedFile* DataRun::Share(UInt32 entry) {
 // All parts of the file have been handed over.
 void DataRun::Unshare(SharedFile* shared) {
     std::lock_guard lock(m_Lock);
-    SharedFile* const last = m_Shared[m_Shared.size() - 1];
+    SharedFile* const last = m_Shared.back();
     m_Shared[shared->liveIndex] = last;
     last->liveIndex = shared->liveIndex;
-    m_Shared.truncate(m_Shared.size() - 1);
+    m_Shared.pop_back();
 }
 
 // Where the unit that begins at a place ends: after about m_UnitSize bytes, or before a block that no file needs.
@@ -150,41 +150,18 @@ void DataRun::Work(UInt32 worker) {
     Unit unit;
     Piece* piece = New<Piece>(kMemLabelFileSystem);
     if (piece == nullptr) return StopWithoutMemory();
-    std::unique_lock lock(m_Lock);
+    Lock lock(m_Lock);
     while (!IsStopped()) {
         if (!m_Passed.empty()) {
-            Piece* const passed = m_Passed[0];
-            std::move(m_Passed.begin() + 1, m_Passed.end(), m_Passed.begin()); // the oldest first
-            m_Passed.truncate(m_Passed.size() - 1);
+            DeliverPassed(worker, &lock);
+        } else if (const UnitAnswer answer = NextUnit(&unit); answer == kUnit) {
+            WorkOnUnit(worker, unit, &piece, &lock);
+        } else if (answer == kNoMemoryForUnit) {
             lock.unlock();
-            Deliver(worker, *passed);
+            StopWithoutMemory();
             lock.lock();
-            if (!m_Spare.try_push_back(passed)) Delete(passed, kMemLabelFileSystem);
-        } else if (const UnitAnswer answer = NextUnit(&unit); answer != kNoUnit) {
-            if (answer == kNoMemoryForUnit) {
-                lock.unlock();
-                StopWithoutMemory();
-                lock.lock();
-                continue;
-            }
-            if (unit.isStream) ++m_Streams;
-            lock.unlock();
-            if (unit.isStream)
-                WorkOnStream(worker, unit, &piece);
-            else
-                WorkOnUnit(worker, unit, piece);
-            lock.lock();
-            if (unit.isStream && --m_Streams == 0) m_HasWork.notify_all();
         } else if (m_NextOther < m_Others.size()) {
-            const size_t first = m_NextOther;
-            m_NextOther = std::min(m_Others.size(), first + kOthersAtOnce);
-            const size_t end = m_NextOther;
-            lock.unlock();
-            for (size_t index = first; index < end && !IsStopped(); ++index) {
-                m_Sink->TakeOther(worker, m_Others[index]);
-                m_Sink->BetweenFiles();
-            }
-            lock.lock();
+            TakeOthers(worker, &lock);
         } else if (m_Streams != 0) {
             ++m_Waiting;
             m_HasWork.wait(lock);
@@ -197,7 +174,41 @@ void DataRun::Work(UInt32 worker) {
     Delete(piece, kMemLabelFileSystem);
 }
 
-void DataRun::WorkOnUnit(UInt32 worker, const Unit& unit, Piece* piece) {
+// The oldest first.
+void DataRun::DeliverPassed(UInt32 worker, Lock* lock) {
+    Piece* const passed = m_Passed[0];
+    std::move(m_Passed.begin() + 1, m_Passed.end(), m_Passed.begin());
+    m_Passed.pop_back();
+    lock->unlock();
+    Deliver(worker, *passed);
+    lock->lock();
+    if (!m_Spare.try_push_back(passed)) Delete(passed, kMemLabelFileSystem);
+}
+
+void DataRun::WorkOnUnit(UInt32 worker, const Unit& unit, Piece** piece, Lock* lock) {
+    if (unit.isStream) ++m_Streams;
+    lock->unlock();
+    if (unit.isStream)
+        WorkOnStream(worker, unit, piece);
+    else
+        WorkOnBlocks(worker, unit, *piece);
+    lock->lock();
+    if (unit.isStream && --m_Streams == 0) m_HasWork.notify_all();
+}
+
+void DataRun::TakeOthers(UInt32 worker, Lock* lock) {
+    const size_t first = m_NextOther;
+    const size_t end = std::min(m_Others.size(), first + kOthersAtOnce);
+    m_NextOther = end;
+    lock->unlock();
+    for (size_t index = first; index < end && !IsStopped(); ++index) {
+        m_Sink->TakeOther(worker, m_Others[index]);
+        m_Sink->BetweenFiles();
+    }
+    lock->lock();
+}
+
+void DataRun::WorkOnBlocks(UInt32 worker, const Unit& unit, Piece* piece) {
     piece->begin = unit.begin;
     piece->end = unit.end;
     piece->files.clear();
@@ -315,8 +326,8 @@ bool DataRun::PassOn(Piece** piece) {
     if (m_Waiting <= m_Passed.size()) return false;
     Piece* next = nullptr;
     if (!m_Spare.empty()) {
-        next = m_Spare[m_Spare.size() - 1];
-        m_Spare.truncate(m_Spare.size() - 1);
+        next = m_Spare.back();
+        m_Spare.pop_back();
     } else {
         next = New<Piece>(kMemLabelFileSystem);
     }

@@ -151,7 +151,13 @@ private:
     bool ListFiles(Unit* unit);
     SharedFile* Share(UInt32 entry);
 
-    void WorkOnUnit(UInt32 worker, const Unit& unit, Piece* piece);
+    // The steps of Work. The lock is held before and after, and not while bytes are decoded or handed over.
+    using Lock = std::unique_lock<std::mutex>;
+    void DeliverPassed(UInt32 worker, Lock* lock);
+    void WorkOnUnit(UInt32 worker, const Unit& unit, Piece** piece, Lock* lock);
+    void TakeOthers(UInt32 worker, Lock* lock);
+
+    void WorkOnBlocks(UInt32 worker, const Unit& unit, Piece* piece);
     void WorkOnStream(UInt32 worker, const Unit& unit, Piece** piece);
     bool PassOn(Piece** piece);
     void Decode(const Unit& unit, Piece* piece);

@@ -39,27 +39,18 @@ zarvo_code OpenArchive(const zarvo_open_options* givenOptions, zarvo_archive** a
     if (!IsNullOrHasSize(givenOptions)) return RefuseArgument(kNoSize, error);
     Failure failure;
     const zarvo_open_options options = FillInDefaults(givenOptions);
-    Source* source = nullptr;
-    zarvo_code code = openSource(options.offset, &source, &failure);
-    if (code != ZARVO_OK) {
-        Delete(source, kMemLabelFileSystem);
+    Owned<Source> source;
+    if (const zarvo_code code = openSource(options.offset, &source, &failure); code != ZARVO_OK)
         return Deliver(code, failure, error);
-    }
-    zarvo_archive* opened = New<zarvo_archive>(kMemLabelFileSystem, source, options);
-    if (opened == nullptr) {
-        Delete(source, kMemLabelFileSystem);
-        return Deliver(failure.SetMemory(), failure, error);
-    }
+    Owned<zarvo_archive> opened(New<zarvo_archive>(kMemLabelFileSystem, std::move(source), options),
+                                kMemLabelFileSystem);
+    if (!opened) return Deliver(failure.SetMemory(), failure, error);
     {
         MessageScope scope(opened->Messages());
-        code = opened->Open(&failure);
+        if (const zarvo_code code = opened->Open(&failure); code != ZARVO_OK) return Deliver(code, failure, error);
     }
-    if (code != ZARVO_OK) {
-        Delete(opened, kMemLabelFileSystem);
-        return Deliver(code, failure, error);
-    }
-    AddHandle(opened);
-    *archive = opened;
+    *archive = opened.release();
+    AddHandle(*archive);
     return ZARVO_OK;
 }
 
@@ -100,7 +91,7 @@ const char* zarvo_version(void) { return ZARVO_VERSION_TEXT; }
 zarvo_code zarvo_open_path(const char* path, const zarvo_open_options* options, zarvo_archive** archive,
                            zarvo_error** error) {
     if (path == nullptr || archive == nullptr) return RefuseArgument("no path, or no place for the archive", error);
-    return OpenArchive(options, archive, error, [&](UInt64 offset, Source** source, Failure* failure) {
+    return OpenArchive(options, archive, error, [&](UInt64 offset, Owned<Source>* source, Failure* failure) {
         return OpenPath(path, offset, source, failure);
     });
 }
@@ -108,7 +99,7 @@ zarvo_code zarvo_open_path(const char* path, const zarvo_open_options* options, 
 zarvo_code zarvo_open_descriptor(int descriptor, const zarvo_open_options* options, zarvo_archive** archive,
                                  zarvo_error** error) {
     if (archive == nullptr) return RefuseArgument(kNoRoom, error);
-    return OpenArchive(options, archive, error, [&](UInt64 offset, Source** source, Failure* failure) {
+    return OpenArchive(options, archive, error, [&](UInt64 offset, Owned<Source>* source, Failure* failure) {
         return OpenDescriptor(descriptor, offset, source, failure);
     });
 }
@@ -117,7 +108,7 @@ zarvo_code zarvo_open_memory(const void* data, size_t size, const zarvo_open_opt
                              zarvo_error** error) {
     if ((data == nullptr && size != 0) || archive == nullptr)
         return RefuseArgument("no data, or no place for the archive", error);
-    return OpenArchive(options, archive, error, [&](UInt64 offset, Source** source, Failure* failure) {
+    return OpenArchive(options, archive, error, [&](UInt64 offset, Owned<Source>* source, Failure* failure) {
         return OpenMemory(data, size, offset, source, failure);
     });
 }
@@ -132,7 +123,7 @@ zarvo_code zarvo_open_source(const zarvo_source* source, const zarvo_open_option
         return RefuseArgument(
             isComplete ? kNoSize : "no source, a source without its callbacks, or no place for the archive", error);
     }
-    return OpenArchive(options, archive, error, [&](UInt64 offset, Source** opened, Failure* failure) {
+    return OpenArchive(options, archive, error, [&](UInt64 offset, Owned<Source>* opened, Failure* failure) {
         return OpenCallbacks(callbacks, offset, opened, failure);
     });
 }

@@ -140,7 +140,7 @@ private:
 };
 
 // Takes the descriptor over, also when it fails.
-zarvo_code OpenFile(int descriptor, UInt64 offset, Source** source, Failure* failure) {
+zarvo_code OpenFile(int descriptor, UInt64 offset, Owned<Source>* source, Failure* failure) {
     struct stat status;
     UInt64 size = 0;
     zarvo_code code = ZARVO_OK;
@@ -158,12 +158,12 @@ zarvo_code OpenFile(int descriptor, UInt64 offset, Source** source, Failure* fai
         close(descriptor);
         return code;
     }
-    FileSource* file = New<FileSource>(kMemLabelFileSystem, descriptor, status);
+    FileSource* const file = New<FileSource>(kMemLabelFileSystem, descriptor, status);
     if (file == nullptr) {
         close(descriptor);
         return failure->SetMemory();
     }
-    *source = file;
+    *source = {file, kMemLabelFileSystem};
     return file->Begin(size, offset, failure);
 }
 
@@ -216,7 +216,7 @@ private:
 
 } // namespace
 
-zarvo_code OpenPath(const char* path, UInt64 offset, Source** source, Failure* failure) {
+zarvo_code OpenPath(const char* path, UInt64 offset, Owned<Source>* source, Failure* failure) {
     // O_NONBLOCK: a pipe is refused, and not waited for. It means nothing to files.
     const int flags = O_RDONLY | O_CLOEXEC | O_NONBLOCK | O_NOCTTY;
     int descriptor = RepeatOnInterrupt([&] { return open(path, flags); });
@@ -231,25 +231,25 @@ zarvo_code OpenPath(const char* path, UInt64 offset, Source** source, Failure* f
     return OpenFile(descriptor, offset, source, failure);
 }
 
-zarvo_code OpenDescriptor(int descriptor, UInt64 offset, Source** source, Failure* failure) {
+zarvo_code OpenDescriptor(int descriptor, UInt64 offset, Owned<Source>* source, Failure* failure) {
     const int copy = fcntl(descriptor, F_DUPFD_CLOEXEC, kFirstOrdinaryDescriptor);
     if (copy < 0) return failure->SetSystem(errno);
     return OpenFile(copy, offset, source, failure);
 }
 
-zarvo_code OpenMemory(const void* data, size_t size, UInt64 offset, Source** source, Failure* failure) {
-    MemorySource* memory = New<MemorySource>(kMemLabelFileSystem, data);
+zarvo_code OpenMemory(const void* data, size_t size, UInt64 offset, Owned<Source>* source, Failure* failure) {
+    MemorySource* const memory = New<MemorySource>(kMemLabelFileSystem, data);
     if (memory == nullptr) return failure->SetMemory();
-    *source = memory;
+    *source = {memory, kMemLabelFileSystem};
     return memory->Begin(size, offset, failure);
 }
 
-zarvo_code OpenCallbacks(const zarvo_source& callbacks, UInt64 offset, Source** source, Failure* failure) {
-    CallbackSource* called = New<CallbackSource>(kMemLabelFileSystem, callbacks);
+zarvo_code OpenCallbacks(const zarvo_source& callbacks, UInt64 offset, Owned<Source>* source, Failure* failure) {
+    CallbackSource* const called = New<CallbackSource>(kMemLabelFileSystem, callbacks);
     if (called == nullptr) {
         if (callbacks.close != nullptr) callbacks.close(callbacks.context);
         return failure->SetMemory();
     }
-    *source = called;
+    *source = {called, kMemLabelFileSystem};
     return called->Begin(offset, failure);
 }

@@ -3,6 +3,7 @@
 #pragma once
 
 #include "Library/Failure.h"
+#include "Runtime/Allocator/Owned.h"
 #include "Runtime/Core/NonCopyable.h"
 #include "Runtime/Core/Types.h"
 
@@ -51,8 +52,8 @@ private:
     UInt64 m_Size = 0;
 };
 
-// Each opens a source, which the caller frees: Delete(source, kMemLabelFileSystem).
-zarvo_code OpenPath(const char* path, UInt64 offset, Source** source, Failure* failure);
-zarvo_code OpenDescriptor(int descriptor, UInt64 offset, Source** source, Failure* failure);
-zarvo_code OpenMemory(const void* data, size_t size, UInt64 offset, Source** source, Failure* failure);
-zarvo_code OpenCallbacks(const zarvo_source& callbacks, UInt64 offset, Source** source, Failure* failure);
+// Each opens a source. After a failure there may be one, too, which is of no use.
+zarvo_code OpenPath(const char* path, UInt64 offset, Owned<Source>* source, Failure* failure);
+zarvo_code OpenDescriptor(int descriptor, UInt64 offset, Owned<Source>* source, Failure* failure);
+zarvo_code OpenMemory(const void* data, size_t size, UInt64 offset, Owned<Source>* source, Failure* failure);
+zarvo_code OpenCallbacks(const zarvo_source& callbacks, UInt64 offset, Owned<Source>* source, Failure* failure);

@@ -17,13 +17,16 @@ struct zarvo_writer final : public EntrySource {
 
     EntryList& Entries() { return m_Entries; }
 
-    // Adds a file, and becomes the owner of its source. False when memory is refused.
-    [[nodiscard]] bool AddFile(core::string_ref path, Source* source) {
+    // Adds a file, and takes over its source. False when memory is refused.
+    [[nodiscard]] bool AddFile(core::string_ref path, Owned<Source> source) {
         const size_t count = m_Sources.size();
-        if (!m_Sources.try_push_back(source)) return false;
-        if (m_Entries.Add(path, 0, source->Size(), static_cast<UInt32>(count))) return true;
-        m_Sources.truncate(count);
-        return false;
+        if (!m_Sources.try_push_back(source.get())) return false;
+        if (!m_Entries.Add(path, 0, source->Size(), static_cast<UInt32>(count))) {
+            m_Sources.pop_back();
+            return false;
+        }
+        (void)source.release(); // it is in m_Sources
+        return true;
     }
 
     [[nodiscard]] bool PrepareToRead(UInt32) override { return true; }
@@ -88,11 +91,12 @@ core::string_ref PathOf(const char* path, size_t length) {
     return {path, length == ZARVO_WHOLE ? strlen(path) : length};
 }
 
-zarvo_code AddSource(zarvo_writer* writer, core::string_ref path, Source* source, zarvo_code code, Failure* failure) {
+// code: of opening the source.
+zarvo_code AddSource(zarvo_writer* writer, core::string_ref path, Owned<Source> source, zarvo_code code,
+                     Failure* failure) {
     if (code == ZARVO_OK) code = CheckPath(path, failure);
-    if (code == ZARVO_OK && writer->AddFile(path, source)) return ZARVO_OK;
-    Delete(source, kMemLabelFileSystem);
-    return code != ZARVO_OK ? code : failure->SetMemory();
+    if (code != ZARVO_OK) return code;
+    return writer->AddFile(path, std::move(source)) ? ZARVO_OK : failure->SetMemory();
 }
 
 constexpr char kNoWriter[] = "no writer, or no path";
@@ -126,9 +130,9 @@ zarvo_code zarvo_writer_add_memory(zarvo_writer* writer, const char* path, size_
     if (!IsLiveHandle(writer) || path == nullptr) return RefuseArgument(kNoWriter, error);
     if (data == nullptr && size != 0) return RefuseArgument("no data", error);
     Failure failure;
-    Source* source = nullptr;
+    Owned<Source> source;
     const zarvo_code code = OpenMemory(data, size, 0, &source, &failure);
-    return Deliver(AddSource(writer, PathOf(path, length), source, code, &failure), failure, error);
+    return Deliver(AddSource(writer, PathOf(path, length), std::move(source), code, &failure), failure, error);
 }
 
 zarvo_code zarvo_writer_add_source(zarvo_writer* writer, const char* path, size_t length, const zarvo_source* source,
@@ -140,9 +144,9 @@ zarvo_code zarvo_writer_add_source(zarvo_writer* writer, const char* path, size_
         return RefuseArgument("no writer, no path, or a source without its callbacks", error);
     }
     Failure failure;
-    Source* opened = nullptr;
+    Owned<Source> opened;
     const zarvo_code code = OpenCallbacks(callbacks, 0, &opened, &failure);
-    return Deliver(AddSource(writer, PathOf(path, length), opened, code, &failure), failure, error);
+    return Deliver(AddSource(writer, PathOf(path, length), std::move(opened), code, &failure), failure, error);
 }
 
 zarvo_code zarvo_writer_add_folder(zarvo_writer* writer, const char* path, size_t length, zarvo_error** error) {
