@@ -296,22 +296,37 @@ zarvo_code WriteRun::WriteFrame(Failure* failure) {
     }
 }
 
+// Encodes the section into coded, which stays empty if it does not become smaller. A large one takes a while: the
+// calling thread tells progress meanwhile, and may be told to stop.
+zarvo_code WriteRun::EncodeSection(const ByteSink& section, dynamic_array<UInt8>* coded, Failure* failure) {
+    BlockEncoder encoder;
+    if (!section.IsWhole() || !encoder.Prepare(m_Plan.SectionEncoding(section.Size())) ||
+        !coded->resize_uninitialized(section.Size(), kResizeExact))
+        return failure->SetMemory();
+    size_t size = 0;
+    EncodeResult result = EncodeResult::kNoRoom;
+    RunOnThreads(1, [&](UInt32) {
+        result =
+            encoder.Encode(section.Bytes(), section.Size(), coded->data(), section.Size() - 1, &size, &m_IsStopped);
+    });
+    if (m_Fatal.code != ZARVO_OK) {
+        *failure = m_Fatal;
+        return failure->code;
+    }
+    if (result == EncodeResult::kNoMemory) return failure->SetMemory();
+    coded->truncate(result == EncodeResult::kOk ? size : 0);
+    return ZARVO_OK;
+}
+
 // The header, and after the data the section: its size is known last.
 zarvo_code WriteRun::WriteBlockBasedFrame(Failure* failure) {
     using namespace ArchiveStorageHeader;
     ByteSink section;
     PutSection(section, m_Records, &m_List);
-    const EncoderSettings encoding = m_Plan.SectionEncoding(section.Size());
-    BlockEncoder encoder;
     dynamic_array<UInt8> coded(kMemLabelFileSystem);
-    if (!section.IsWhole() || !encoder.Prepare(encoding) || !coded.resize_uninitialized(section.Size(), kResizeExact))
-        return failure->SetMemory();
-    size_t codedSize = 0;
-    const EncodeResult result =
-        encoder.Encode(section.Bytes(), section.Size(), coded.data(), section.Size() - 1, &codedSize, nullptr);
-    if (result == EncodeResult::kNoMemory) return failure->SetMemory();
-    const bool isCoded = result == EncodeResult::kOk;
-    const UInt64 size = isCoded ? codedSize : section.Size();
+    if (const zarvo_code code = EncodeSection(section, &coded, failure); code != ZARVO_OK) return code;
+    const bool isCoded = !coded.empty();
+    const UInt64 size = isCoded ? coded.size() : section.Size();
     const UInt64 place = m_End;
     m_End += size;
 
@@ -321,7 +336,7 @@ zarvo_code WriteRun::WriteBlockBasedFrame(Failure* failure) {
                          .compressedSection = size,
                          .uncompressedSection = section.Size(),
                          .flags = UInt32{kArchiveDirectoryInBlocksInfo} | kArchiveBlocksInfoAtEnd |
-                                  (isCoded ? UInt32{encoding.type} : kCompressionNone)});
+                                  (isCoded ? UInt32{m_Plan.BlockEncoding().type} : kCompressionNone)});
     head.PutZeros(m_DataPlace - head.Size());
     const zarvo_code code = m_File->Write(place, isCoded ? coded.data() : section.Bytes(), size, failure);
     return code == ZARVO_OK ? WritePart(head, 0, failure) : code;

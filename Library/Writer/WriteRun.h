@@ -64,6 +64,7 @@ private:
 
     UInt64 HeadSize() const;
     zarvo_code WriteFrame(Failure* failure); // all but the data
+    zarvo_code EncodeSection(const ByteSink& section, dynamic_array<UInt8>* coded, Failure* failure);
     zarvo_code WriteBlockBasedFrame(Failure* failure);
     zarvo_code WriteLegacyFrame(Failure* failure);
     zarvo_code WriteArchiveFrame(Failure* failure);

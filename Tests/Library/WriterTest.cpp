@@ -71,6 +71,38 @@ TEST_F(Writer, NamesTheSourceThatFails) {
     }
 }
 
+// Higher levels take many times as long for it, while no other thread has anything to do.
+TEST_F(Writer, EncodesTheDirectoryAtLevelFourAtMost) {
+    zarvo::writer writer;
+    for (int file = 0; file < 2'000; ++file)
+        ASSERT_FALSE(writer.add("folder/file" + std::to_string(file), BytesOf("")));
+    for (const auto& [kind, highest] : {std::pair{ZARVO_KIND_LZ4HC, 12}, {ZARVO_KIND_LZMA, 9}}) {
+        std::string archives[2];
+        for (const bool isHighest : {false, true}) {
+            EXPECT_EQ(2'000u, WriteAll(writer, {.compression = kind, .level = isHighest ? highest : 4}).files);
+            archives[isHighest] = ReadFile(Archive());
+        }
+        EXPECT_EQ(true, archives[0] == archives[1]) << kind;
+    }
+}
+
+// The directory is encoded after all else, and takes seconds where paths have nothing in common.
+TEST_F(Writer, IsStoppedWhileItEncodesTheDirectory) {
+    constexpr size_t kPathSize = 3'000;
+    std::string letters = NoiseText(4'000 * kPathSize);
+    for (char& letter : letters)
+        letter = static_cast<char>('a' + static_cast<unsigned char>(letter) % 26);
+    zarvo::writer writer;
+    for (size_t at = 0; at < letters.size(); at += kPathSize)
+        ASSERT_FALSE(writer.add(std::string_view(letters).substr(at, kPathSize), BytesOf("")));
+    int looks = 0; // with all files done
+    zarvo::run_options run;
+    run.progress = [&](const zarvo_progress& at) { return at.files < at.files_total || ++looks < 3; };
+    EXPECT_EQ(ZARVO_ERROR_STOPPED, writer.write(Archive(), run, {.compression = ZARVO_KIND_LZMA}).error.code());
+    EXPECT_GT(10, looks);
+    EXPECT_EQ(std::set<std::string>{}, Names());
+}
+
 TEST_F(Writer, ThrowsWhatASourceThrows) {
     for (const uint32_t threads : {1u, 2u}) {
         zarvo::writer writer;
