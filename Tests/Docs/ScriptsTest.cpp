@@ -48,6 +48,15 @@ TEST_F(Scripts, AskForAllTheirPackagesAtOnce) {
             << row.script;
 }
 
+TEST_F(Scripts, SetupSaysWhatToRunWithoutSudo) {
+    Replace("dpkg-query", "exit 1");
+    Replace("id", "echo 1000");
+    const std::string setup = m_Folder / "scripts/setup";
+    EXPECT_EQ(Transcript(1, setup + ": packages are missing, and there is no sudo to install them with. As root, run:\n"
+                                    "apt-get update && apt-get install --no-install-recommends python3\n"),
+              Run("/usr/bin/env", {"PATH=" + (m_Folder / "bin"), "/bin/bash", setup, "python"}));
+}
+
 TEST_F(Scripts, ExtractHelps) {
     const auto [status, said] = RunScript("extract", {"--help"});
     EXPECT_EQ(0, status);
