@@ -74,6 +74,17 @@ TEST_F(Scripts, ExtractSaysHowFarItsBuildIs) {
     EXPECT_NE(std::string::npos, said.find("\n[3/9] broken\n")) << said;
 }
 
+TEST_F(Scripts, SayWhereTheyCanNotBuild) {
+    Replace("dpkg-query", "echo installed");
+    Replace("id", "echo somebody");
+    WriteFile(m_Folder / "build", "in the way");
+    for (const std::string script : {"extract", "zarvo"}) {
+        const std::string said = m_Folder / ("scripts/" + script) + ": can't build in " + (m_Folder / "build/release") +
+                                 ", which somebody may not write to; copy the source to a folder of your own\n";
+        EXPECT_EQ(Transcript(1, said), RunScript(script, {}));
+    }
+}
+
 TEST_F(Scripts, TestSaysWhyATestWasSkipped) {
     Replace("dpkg-query", "echo installed");
     Replace("cmake", "");
