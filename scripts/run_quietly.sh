@@ -4,7 +4,7 @@
 # standard error. While ninja builds, it prints the progress there. Returns the command's status.
 run_quietly() {
     local log out in status=0
-    log="$(mktemp)"
+    log="$(mktemp)" || return
     exec {out}>"$log" {in}<"$log"
     rm "$log" # the descriptors keep it
     "$@" 2>&1 | show_progress >&"$out" || status=$?

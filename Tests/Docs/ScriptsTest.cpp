@@ -85,6 +85,13 @@ TEST_F(Scripts, SayWhereTheyCanNotBuild) {
     }
 }
 
+TEST_F(Scripts, ExtractStopsWithoutAFileForItsLog) {
+    Replace("dpkg-query", "echo installed");
+    Replace("cmake", "echo built");
+    Replace("mktemp", "echo 'no room' >&2; exit 1");
+    EXPECT_EQ(Transcript(1, "no room\n"), RunScript("extract", {"a.zarvo"}));
+}
+
 TEST_F(Scripts, TestSaysWhyATestWasSkipped) {
     Replace("dpkg-query", "echo installed");
     Replace("cmake", "");
