@@ -92,6 +92,14 @@ TEST_F(Scripts, ExtractStopsWithoutAFileForItsLog) {
     EXPECT_EQ(Transcript(1, "no room\n"), RunScript("extract", {"a.zarvo"}));
 }
 
+TEST_F(Scripts, FormatFailsWithoutTheListOfSources) {
+    WriteFile(m_Folder / ".git", "");
+    Replace("dpkg-query", "echo installed");
+    Replace("git", "exit 128");
+    Replace("clang-format-14", "exit 0");
+    EXPECT_EQ(Transcript(128, ""), RunScript("format", {"--check"}));
+}
+
 TEST_F(Scripts, TestSaysWhyATestWasSkipped) {
     Replace("dpkg-query", "echo installed");
     Replace("cmake", "");
