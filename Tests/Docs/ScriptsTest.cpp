@@ -25,12 +25,13 @@ TEST_F(Scripts, AskForAllTheirPackagesAtOnce) {
     Replace("dpkg-query", "exit 1");
     Replace("sudo", "exit 1");
     Replace("id", "echo 1000");
-    const std::string build = "g++ cmake ninja-build liblz4-dev lzma-dev nlohmann-json3-dev libssl-dev "
-                              "libfuse3-dev ",
-                      test = build + "libgtest-dev clang libclang-rt-14-dev llvm jq fuse3 python3-dev python3-fsspec",
-                      lint = build +
-                             "libgtest-dev libbenchmark-dev liblzma-dev clang clang-tidy-14 gcovr mandoc git python3 "
-                             "python3-dev";
+    const std::string
+        build = "g++ cmake ninja-build liblz4-dev lzma-dev nlohmann-json3-dev libssl-dev "
+                "libfuse3-dev ",
+        test = build + "libgtest-dev libgmock-dev clang libclang-rt-14-dev llvm jq fuse3 python3-dev python3-fsspec",
+        lint = build +
+               "libgtest-dev libgmock-dev libbenchmark-dev liblzma-dev clang clang-tidy-14 gcovr mandoc git python3 "
+               "python3-dev";
     struct Row {
         std::string script;
         std::vector<std::string> arguments;
