@@ -24,21 +24,21 @@ UInt32 ChooseThreadCount(UInt32 wanted, UInt64 atMost) {
 
 struct WatchedRun::Job {
     WatchedRun* run;
-    const std::function<void(UInt32 number)>* work;
+    Call call;
     UInt32 number;
     pthread_t thread;
 };
 
 void* WatchedRun::RunJob(void* given) {
     const Job& job = *static_cast<Job*>(given);
-    (*job.work)(job.number);
+    job.call.make(job.call.called, job.number);
     std::lock_guard lock(job.run->m_EndLock);
     ++job.run->m_Ended;
     job.run->m_HasEnded.notify_one();
     return nullptr;
 }
 
-void WatchedRun::RunOnThreads(UInt32 count, const std::function<void(UInt32 number)>& work) {
+void WatchedRun::RunCalls(UInt32 count, Call call) {
     dynamic_array<Job> jobs(kMemLabelGeneral);
     if (!jobs.resize_uninitialized(count, kResizeExact)) count = 0;
     m_IsAlone = false;
@@ -49,13 +49,13 @@ void WatchedRun::RunOnThreads(UInt32 count, const std::function<void(UInt32 numb
     pthread_sigmask(SIG_SETMASK, &all, &before); // threads begin with the mask of their maker
     UInt32 started = 0;
     for (; started < count; ++started) {
-        jobs[started] = {this, &work, started, {}};
+        jobs[started] = {this, call, started, {}};
         if (pthread_create(&jobs[started].thread, nullptr, RunJob, &jobs[started]) != 0) break;
     }
     pthread_sigmask(SIG_SETMASK, &before, nullptr);
     if (started == 0) {
         m_IsAlone = true;
-        return work(0);
+        return call.make(call.called, 0);
     }
     WaitFor(started);
     for (UInt32 number = 0; number < started; ++number)

@@ -5,8 +5,8 @@
 #include "Library/Progress.h"
 
 #include <condition_variable>
-#include <functional>
 #include <mutex>
+#include <type_traits>
 
 // How many threads a run uses: as many as its caller wants (0: one per processor that the process may use), but no more
 // than there is memory, or work, for. At least 1.
@@ -23,7 +23,11 @@ public:
 protected:
     // Calls work in count threads, with numbers from 0 on, and returns when all have ended. When the system refuses
     // threads, fewer work; when it refuses all, the calling thread does.
-    void RunOnThreads(UInt32 count, const std::function<void(UInt32 number)>& work);
+    template <typename Work>
+    void RunOnThreads(UInt32 count, Work&& work) {
+        using Called = std::remove_reference_t<Work>;
+        RunCalls(count, {[](void* called, UInt32 number) { (*static_cast<Called*>(called))(number); }, &work});
+    }
 
     // Called in the calling thread at each interval while threads work, with no lock held.
     virtual void Look() = 0;
@@ -36,6 +40,13 @@ protected:
 private:
     struct Job;
 
+    // The work, without its type: std::function would copy it, and may need the program's operator new for that.
+    struct Call {
+        void (*make)(void* called, UInt32 number);
+        void* called;
+    };
+
+    void RunCalls(UInt32 count, Call call);
     static void* RunJob(void* given);
     void WaitFor(UInt32 count);
 

@@ -1,7 +1,11 @@
 /* What each of these programs has the library do, linked or loaded: read a sample whole, and damaged copies of it as
- * far as they go. C and C++; a failed check ends the program with its text. */
+ * far as they go, and make an archive. C and C++; a failed check ends the program with its text. */
 #ifndef EXERCISE_H
 #define EXERCISE_H
+
+#ifndef _GNU_SOURCE
+#define _GNU_SOURCE
+#endif
 
 #include <zarvo.h>
 
@@ -10,6 +14,7 @@
 #include <stdio.h>
 #include <stdlib.h>
 #include <string.h>
+#include <unistd.h>
 
 #define CHECK(condition)                                                                                               \
     do {                                                                                                               \
@@ -26,6 +31,10 @@
     EACH(entry_count)                                                                                                  \
     EACH(find)                                                                                                         \
     EACH(read)                                                                                                         \
+    EACH(writer_new)                                                                                                   \
+    EACH(writer_add_memory)                                                                                            \
+    EACH(writer_write)                                                                                                 \
+    EACH(writer_free)                                                                                                  \
     EACH(error_text)                                                                                                   \
     EACH(error_free)
 
@@ -140,11 +149,34 @@ static inline void Exercise(const struct Library* library, const char* samples, 
     free(path);
 }
 
+/* Makes an archive of one file, and looks at it. */
+static inline void ExerciseWriter(const struct Library* library) {
+    static const char kText[] = "The same, the same, the same, the same, the same.";
+    char path[] = "/tmp/zarvo-exercise-XXXXXX";
+    const int made = mkstemp(path);
+    CHECK(made >= 0);
+    close(made);
+    zarvo_writer* writer = NULL;
+    zarvo_create_options options = ZARVO_CREATE_OPTIONS_INIT;
+    options.force = 1;
+    CHECK(library->writer_new(&writer, NULL) == ZARVO_OK);
+    CHECK(library->writer_add_memory(writer, "text", ZARVO_WHOLE, kText, sizeof(kText), NULL) == ZARVO_OK);
+    CHECK(library->writer_write(writer, path, NULL, &options, NULL, NULL) == ZARVO_OK);
+    library->writer_free(writer);
+    zarvo_archive* archive = NULL;
+    CHECK(library->open_path(path, NULL, &archive, NULL) == ZARVO_OK);
+    CHECK(library->entry_count(archive) == 1);
+    CHECK(ReadAll(library, archive) == 0);
+    library->close(archive);
+    unlink(path);
+}
+
 static inline void ExerciseAll(const struct Library* library, const char* samples) {
     int messages = 0;
     for (int number = 0; number < 4; ++number)
         Exercise(library, samples, number, 2 * kHeader, &messages);
     CHECK(messages > 0);
+    ExerciseWriter(library);
 }
 
 #endif

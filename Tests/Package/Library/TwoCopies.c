@@ -1,6 +1,5 @@
 /* Reads with two private copies of the library at once, a thread each: one copy is loaded from a file of its own, then
  * one into a name space of its own: TwoCopies SAMPLES LIBRARY OTHER_LIBRARY */
-#define _GNU_SOURCE
 #include "Exercise.h"
 
 #include <pthread.h>

@@ -1,5 +1,4 @@
 /* The process is the same after the library as before it, and has printed nothing: Untouched SAMPLES LIBRARY */
-#define _GNU_SOURCE
 #include "Exercise.h"
 
 #include <fcntl.h>
