@@ -27,6 +27,7 @@ zarvo_code zarvo_archive::Open(Failure* failure) {
         return failure->Set(ZARVO_ERROR_LIMIT, "%llu entries; the limit (max_entries) is %llu",
                             static_cast<unsigned long long>(Nodes().size()),
                             static_cast<unsigned long long>(m_Options.max_entries));
+    if (DirectoryBytes() > m_Options.max_directory_bytes) return RefuseDirectory(DirectoryBytes(), failure);
     m_Data = {New<DataReader>(kMemLabelFileSystem, &m_Blocks, &m_Cache, m_Options.max_block_bytes),
               kMemLabelFileSystem};
     if (!m_Data) return failure->SetMemory();
@@ -64,9 +65,25 @@ zarvo_code zarvo_archive::CheckDirectorySize(Failure* failure) {
                               ReadHeaderSignature(file, header) == kHeaderOk && header.signature == kSignature &&
                               ReadHeader(file, header) == kHeaderOk;
     if (!isBlockBased || header.uncompressedBlocksInfoSize <= m_Options.max_directory_bytes) return ZARVO_OK;
-    return failure->Set(ZARVO_ERROR_LIMIT, "a directory of %u bytes; the limit (max_directory_bytes) is %llu",
-                        header.uncompressedBlocksInfoSize,
+    return RefuseDirectory(header.uncompressedBlocksInfoSize, failure);
+}
+
+zarvo_code zarvo_archive::RefuseDirectory(UInt64 bytes, Failure* failure) const {
+    return failure->Set(ZARVO_ERROR_LIMIT, "a directory of %llu bytes; the limit (max_directory_bytes) is %llu",
+                        static_cast<unsigned long long>(bytes),
                         static_cast<unsigned long long>(m_Options.max_directory_bytes));
+}
+
+// As the layouts store it that don't say so in their header: 0 for the others.
+UInt64 zarvo_archive::DirectoryBytes() const {
+    const core::string& signature = m_Reader.GetHeader().signature;
+    const bool hasLongNodes = signature == kSignatureArchive;
+    if (!hasLongNodes && signature != kSignatureWeb && signature != kSignatureRaw) return 0;
+    const UInt64 bytesOfNode = 1 + (hasLongNodes ? 20 : 8); // beside the path
+    UInt64 bytes = 0;
+    for (const Node& node : Nodes())
+        bytes += node.path.size() + bytesOfNode;
+    return bytes;
 }
 
 // A ZarvoWeb archive keeps its directory at the start of its data.

@@ -41,6 +41,8 @@ struct zarvo_archive : private NonCopyable {
 private:
     zarvo_code SetUp(Failure* failure);
     zarvo_code CheckDirectorySize(Failure* failure);
+    zarvo_code RefuseDirectory(UInt64 bytes, Failure* failure) const;
+    UInt64 DirectoryBytes() const;
     zarvo_code FindDirectory(Failure* failure);
     void DescribeBlocks();
     void DescribeEntries();

@@ -118,6 +118,17 @@ TEST(Opening, LimitsAreNamedWhenTheyAreReached) {
     EXPECT_EQ((Refusal{ZARVO_ERROR_LIMIT,
                        "the directory does not end in 1000 bytes, which is the limit (max_directory_bytes)"}),
               Refuse(BytesOf(web), {.max_directory_bytes = 1'000}));
+    description.entries.resize(100);
+    for (const auto& [layout, size] :
+         {std::pair(ArchiveLayout::kWeb, 1'400u), {ArchiveLayout::kRaw, 1'400u}, {ArchiveLayout::kArchive, 2'600u}}) {
+        description.layout = layout;
+        const std::string archive = BuildArchive(description).bytes;
+        EXPECT_EQ(Refusal{}, Refuse(BytesOf(archive), {.max_directory_bytes = size})) << size;
+        EXPECT_EQ(
+            (Refusal{ZARVO_ERROR_LIMIT, "a directory of " + std::to_string(size) +
+                                            " bytes; the limit (max_directory_bytes) is " + std::to_string(size - 1)}),
+            Refuse(BytesOf(archive), {.max_directory_bytes = size - 1}));
+    }
 }
 
 TEST(Opening, ChangedFileIsAnErrorFromThenOn) {
