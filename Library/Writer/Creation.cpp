@@ -98,11 +98,19 @@ void Creation::TellLeftOut() {
 // Finds the failures that WriteFile would meet in the order in which it would meet them.
 zarvo_code Creation::CheckCanWrite(EntrySource* source, Failure* failure) {
     if (const zarvo_code code = m_File.CheckCanOpen(failure); code != ZARVO_OK) return code;
+    UInt64 threads = 0;
+    if (const zarvo_code code = WriteRun::CheckMemory(m_Plan, m_Options, &threads, failure); code != ZARVO_OK)
+        return code;
+    ProgressClock clock(ProgressClock::Clock::now());
+    UInt64 looked = 0;
     for (const bool areEmpty : {true, false})
         for (size_t index = 0; index < m_Entries.size(); ++index) {
+            const Progress now = {.files = looked, .filesTotal = m_Entries.size()};
+            if (clock.IsDue() && !TellProgress(m_Options, now)) return failure->SetStopped();
             const EntryList::Entry& entry = m_Entries[index];
             if (EntryList::IsFolder(entry) || (entry.size == 0) != areEmpty) continue;
             if (source->CheckCanRead(m_Entries, entry, failure) != ZARVO_OK) return FailEntry(index, *failure);
+            ++looked;
         }
     return ZARVO_OK;
 }

@@ -19,19 +19,26 @@ UInt64 SlotBytes(const WritePlan& plan) {
 
 } // namespace
 
+zarvo_code WriteRun::CheckMemory(const WritePlan& plan, const zarvo_run_options& options, UInt64* threads,
+                                 Failure* failure) {
+    const UInt64 memory = MemoryBudget(options.memory);
+    const bool isStream = plan.Layout() == ZARVO_LAYOUT_WEB;
+    const EncoderSettings encoding = plan.BlockEncoding();
+    const UInt64 needed = isStream ? StreamEncoderMemory(encoding) : SlotBytes(plan) + BlockEncoderMemory(encoding);
+    *threads = memory / needed;
+    if (*threads != 0) return ZARVO_OK;
+    return failure->Set(ZARVO_ERROR_LIMIT, "to compress takes %llu bytes of memory, and the limit is %llu",
+                        static_cast<unsigned long long>(needed), static_cast<unsigned long long>(memory));
+}
+
 zarvo_code WriteRun::ChooseThreads(UInt32* threads, Failure* failure) const {
     constexpr UInt64 kOtherDescriptors = 16;   // the program's, and the archive
     constexpr UInt64 kDescriptorsOfThread = 3; // a file, its folder, and one more on the way to it
-    const UInt64 memory = MemoryBudget(m_Options.memory);
-    const bool isStream = m_Plan.Layout() == ZARVO_LAYOUT_WEB;
-    const EncoderSettings encoding = m_Plan.BlockEncoding();
-    const UInt64 needed = isStream ? StreamEncoderMemory(encoding) : SlotBytes(m_Plan) + BlockEncoderMemory(encoding);
-    if (needed > memory)
-        return failure->Set(ZARVO_ERROR_LIMIT, "to compress takes %llu bytes of memory, and the limit is %llu",
-                            static_cast<unsigned long long>(needed), static_cast<unsigned long long>(memory));
+    UInt64 affordable = 0;
+    if (const zarvo_code code = CheckMemory(m_Plan, m_Options, &affordable, failure); code != ZARVO_OK) return code;
     const UInt64 pieces = std::max<UInt64>(m_Plan.BlockCount(), m_EmptyFiles.size() / kEmptyFilesAtOnce);
     const UInt64 descriptors = FreeDescriptors(kOtherDescriptors) / kDescriptorsOfThread;
-    *threads = ChooseThreadCount(m_Options.threads, std::min({memory / needed, pieces, descriptors}));
+    *threads = ChooseThreadCount(m_Options.threads, std::min({affordable, pieces, descriptors}));
     return ZARVO_OK;
 }
 
@@ -297,7 +304,7 @@ zarvo_code WriteRun::WriteFrame(Failure* failure) {
 }
 
 // Encodes the section into coded, which stays empty if it does not become smaller. A large one takes a while: the
-// calling thread tells progress meanwhile, and may be told to stop.
+// calling thread tells progress meanwhile, and may be told to stop: LZMA stops at once, LZ4 ends what it does.
 zarvo_code WriteRun::EncodeSection(const ByteSink& section, dynamic_array<UInt8>* coded, Failure* failure) {
     BlockEncoder encoder;
     if (!section.IsWhole() || !encoder.Prepare(m_Plan.SectionEncoding(section.Size())) ||

@@ -28,6 +28,10 @@ public:
     WriteRun(const WritePlan& plan, const EntryList& list, EntrySource* source, const zarvo_run_options& options)
         : m_Plan(plan), m_List(list), m_Source(source), m_Data(plan, list, source), m_Options(options) {}
 
+    // Finds how many threads there is memory for; a failure if there are none.
+    static zarvo_code CheckMemory(const WritePlan& plan, const zarvo_run_options& options, UInt64* threads,
+                                  Failure* failure);
+
     // Writes the whole archive, and does not finish the file.
     zarvo_code Write(NewArchive* file, Failure* failure);
 

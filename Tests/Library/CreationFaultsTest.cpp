@@ -62,6 +62,9 @@ TEST_F(Creation, FailsInADryRunAsItWouldWithoutOne) {
         EXPECT_EQ(dry, Create(m_Folder / name, In())) << name;
         fs::remove(Archive());
     }
+    const Made narrow = Create(Archive(), In(), {.dry_run = true}, {.memory = 1});
+    EXPECT_EQ("to compress takes ", narrow.text.substr(0, 18));
+    EXPECT_EQ(narrow, Create(Archive(), In(), {}, {.memory = 1}));
 }
 
 TEST_F(Creation, NamesAFileThatCannotBeReadInADryRun) {
