@@ -7,7 +7,7 @@ import os
 from collections.abc import Mapping
 
 from . import _native
-from ._errors import CreationFailed, ExtractionFailed
+from ._errors import ArchiveChanged, CreationFailed, ExtractionFailed
 
 TYPE_CHECKING = False  # that of typing, which takes long to import
 if TYPE_CHECKING:
@@ -179,7 +179,7 @@ class Entry:
         return f"<zarvo.Entry {self.path!r} ({self.kind}, {self.size} bytes)>"
 
     def __reduce__(self) -> tuple[Any, ...]:
-        return (_get_entry, (self.archive, self.index))
+        return (_find_again, (self.archive, self.index, self.path))
 
 
 def _count_to_read(start: int, end: int, data_end: int) -> int:
@@ -198,12 +198,21 @@ def _get_entry(archive: Archive, index: int) -> Entry:
     return Entry(archive, archive._native.entry(index))
 
 
+def _find_again(archive: Archive, index: int, path: str) -> Entry:
+    """Return the entry of an archive that has been opened anew, and may be another one by now."""
+    if index < archive._native.entry_count():
+        entry = _get_entry(archive, index)
+        if entry.path == path:
+            return entry
+    raise ArchiveChanged(f"{archive.name}: {path}: the archive has changed since the entry was pickled")
+
+
 class Archive(Mapping[str, Entry]):
     """An open archive: a mapping of the paths of its entries to the entries, in the archive's order.
 
     The keys are paths as the archive stores them. A look-up takes any form of a path: "\\" is "/", and empty and "."
-    components don't count. Of entries with the same path, the last is in the mapping, as after extraction. Entries that
-    extraction refuses are not in it; entries() has all.
+    components don't count. Of entries with the same path, the last is in the mapping, as after extraction. Entries whose
+    paths extraction refuses are not in it; entries() has all.
 
     Use it in a with statement, or close it. Any number of threads may use it. It can be pickled, and is then opened
     again where it is unpickled.

@@ -395,6 +395,13 @@ class Pickles(ArchiveTest):
             )
             self.assertEqual(f"{use()}\n".encode(), shown.stdout)
 
+    def test_notice_that_the_entry_is_another_one(self):
+        kept = [pickle.dumps(entry) for entry in self.open([("a", b"1"), ("b", b"2")]).entries()]
+        self.write([("c", b"3")])
+        for number, copy in enumerate(kept):
+            with self.subTest(number), self.assertRaisesRegex(zarvo.ArchiveChanged, "changed since the entry was"):
+                pickle.loads(copy)
+
 
 if __name__ == "__main__":
     unittest.main()
