@@ -64,7 +64,10 @@ Arguments::Arguments(const std::vector<std::string>& arguments) : Arguments(kNoS
         *this = std::move(read);
         if (m_AreKnown) break;
     }
-    if (m_Subcommand != &kNoSubcommand) m_Operands.erase(m_Operands.begin());
+    if (m_Subcommand != &kNoSubcommand)
+        m_Operands.erase(m_Operands.begin());
+    else if (m_AreKnown && !m_Operands.empty())
+        m_Complaint.clear(); // of options that another subcommand may have: that there is none of this name comes first
     if (!Has(kHelp) && !Has(kVersion)) {
         CheckValues();
         CheckOperands();
@@ -92,9 +95,9 @@ bool Arguments::ReadOptions(std::string_view argument, const std::string* next) 
         Complain(MakeMessage("no such option: '%'", {form}));
         if (m_Operands.empty()) m_AreKnown = false;
     };
-    const auto takeNext = [&](const Option* option) {
+    const auto takeNext = [&](const Option* option, std::string_view form) {
         if (next == nullptr)
-            Complain(MakeMessage("% needs a value", {argument}));
+            Complain(MakeMessage("% needs a value", {form}));
         else
             m_Options.emplace_back(option, *next);
         return true;
@@ -109,7 +112,7 @@ bool Arguments::ReadOptions(std::string_view argument, const std::string* next) 
         else if (option->value.empty() && hasValue)
             Complain(MakeMessage("% takes no value", {argument.substr(0, mark)}));
         else if (!option->value.empty() && !hasValue)
-            return takeNext(option);
+            return takeNext(option, argument);
         else
             m_Options.emplace_back(option, hasValue ? argument.substr(mark + 1) : "");
         return false;
@@ -117,9 +120,10 @@ bool Arguments::ReadOptions(std::string_view argument, const std::string* next) 
     for (size_t place = 1; place < argument.size(); ++place) {
         const Option* const option = FindOption(*m_Subcommand, argument[place]);
         const bool takesValue = option != nullptr && !option->value.empty();
-        if (takesValue && place + 1 == argument.size()) return takeNext(option);
+        const std::string form = {'-', argument[place]};
+        if (takesValue && place + 1 == argument.size()) return takeNext(option, form);
         if (option == nullptr)
-            refuse(std::string{'-', argument[place]});
+            refuse(form);
         else
             m_Options.emplace_back(option, takesValue ? argument.substr(place + 1) : "");
         if (takesValue) break;
