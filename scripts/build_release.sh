@@ -5,7 +5,7 @@ source "$root/scripts/run_quietly.sh"
 build_release() {
     local folder="$root/build/release"
     if ! mkdir -p "$folder" 2>/dev/null || [[ ! -w "$folder" ]]; then
-        echo "$0: can't build in $folder, which $(id -un) may not write to; copy the source to a folder of your own" >&2
+        echo "$0: can't build in $folder, which must be a folder that $(id -un) may write to; copy the source to one of your own" >&2
         exit 1
     fi
     run_quietly configure_and_build "$1" || exit 1

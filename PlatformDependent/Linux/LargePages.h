@@ -7,7 +7,8 @@
 #include <unistd.h>
 
 // Asks the system for large pages under a block that is not used yet; null is allowed. Blocks smaller than a large page
-// stay as they are, and so does any block where the system has none to give.
+// stay as they are, and so does any block where the system has none to give. The heap keeps the advice for its pages:
+// what it puts there later may take more memory, but no more than a large page per block.
 inline void PreferLargePages(void* block, size_t size) {
     constexpr size_t kLargePage = 2'097'152;
     if (block == nullptr || size < kLargePage) return;

@@ -80,8 +80,9 @@ TEST_F(Scripts, SayWhereTheyCanNotBuild) {
     Replace("id", "echo somebody");
     WriteFile(m_Folder / "build", "in the way");
     for (const std::string script : {"extract", "zarvo"}) {
-        const std::string said = m_Folder / ("scripts/" + script) + ": can't build in " + (m_Folder / "build/release") +
-                                 ", which somebody may not write to; copy the source to a folder of your own\n";
+        const std::string said =
+            m_Folder / ("scripts/" + script) + ": can't build in " + (m_Folder / "build/release") +
+            ", which must be a folder that somebody may write to; copy the source to one of your own\n";
         EXPECT_EQ(Transcript(1, said), RunScript(script, {}));
     }
 }

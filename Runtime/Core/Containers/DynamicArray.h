@@ -144,7 +144,7 @@ public:
         return *element;
     }
 
-    // As push_back, but false when memory is refused; nothing has changed then.
+    // As push_back, but false when memory is refused: the array is as it was, and a value that was moved here is gone.
     [[nodiscard]] bool try_push_back(T value) {
         if (size() == capacity() && !grow()) return false;
         emplace_back(std::move(value));
