@@ -5,6 +5,8 @@ namespace {
 
 class Writer : public Creation {
 protected:
+    const std::string m_Text = "x"; // outlives the writers, which do not copy it
+
     Made WriteAll(zarvo::writer& writer, zarvo::create_options how = {}) {
         how.force = true;
         return Report([&](const zarvo::run_options& run,
@@ -64,7 +66,7 @@ TEST_F(Writer, NamesTheSourceThatFails) {
         else
             source->failingRead = 2;
         EXPECT_FALSE(writer.add("d/bad", std::move(source)));
-        EXPECT_FALSE(writer.add("good", BytesOf("x")));
+        EXPECT_FALSE(writer.add("good", BytesOf(m_Text)));
         EXPECT_EQ(isShort ? "d/bad failed: the source ends too early\n" : "d/bad failed: Connection timed out\n",
                   WriteAll(writer).reports);
         EXPECT_EQ(std::set<std::string>{}, Names());
@@ -109,7 +111,7 @@ TEST_F(Writer, ThrowsWhatASourceThrows) {
         auto source = std::make_unique<CountingSource>(SampleText(300'000));
         source->beforeRead = [] { throw std::runtime_error("from the source"); };
         EXPECT_FALSE(writer.add("bad", std::move(source)));
-        EXPECT_FALSE(writer.add("good", BytesOf("x")));
+        EXPECT_FALSE(writer.add("good", BytesOf(m_Text)));
         EXPECT_THROW((void)writer.write(Archive(), {.threads = threads}), std::runtime_error) << threads;
         EXPECT_EQ(std::set<std::string>{}, Names());
     }
