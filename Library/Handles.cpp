@@ -11,29 +11,44 @@ void RemoveHandle(const void*) {}
 #include "Runtime/Core/Containers/DynamicArray.h"
 #include "Runtime/Threads/Mutex.h"
 
-static Mutex s_Lock;
-static dynamic_array<const void*> s_Handles VARNEX_GUARDED_BY(s_Lock);
+#include <algorithm>
+#include <new>
+
+namespace {
+
+struct HandleList {
+    Mutex lock;
+    dynamic_array<const void*> handles VARNEX_GUARDED_BY(lock);
+};
+
+// It is never destroyed: other threads may go on with calls while the process ends.
+HandleList& GetLiveHandles() {
+    alignas(HandleList) static UInt8 s_Storage[sizeof(HandleList)];
+    static HandleList* const s_List = new (s_Storage) HandleList;
+    return *s_List;
+}
+
+} // namespace
 
 bool IsLiveHandle(const void* handle) {
-    Mutex::AutoLock lock(s_Lock);
-    for (const void* live : s_Handles)
-        if (live == handle) return true;
-    return false;
+    HandleList& live = GetLiveHandles();
+    Mutex::AutoLock lock(live.lock);
+    return std::find(live.handles.begin(), live.handles.end(), handle) != live.handles.end();
 }
 
 void AddHandle(const void* handle) {
-    Mutex::AutoLock lock(s_Lock);
-    s_Handles.push_back(handle);
+    HandleList& live = GetLiveHandles();
+    Mutex::AutoLock lock(live.lock);
+    live.handles.push_back(handle);
 }
 
 void RemoveHandle(const void* handle) {
-    Mutex::AutoLock lock(s_Lock);
-    for (const void*& live : s_Handles) {
-        if (live != handle) continue;
-        live = s_Handles[s_Handles.size() - 1];
-        s_Handles.truncate(s_Handles.size() - 1);
-        return;
-    }
+    HandleList& live = GetLiveHandles();
+    Mutex::AutoLock lock(live.lock);
+    const void** const found = std::find(live.handles.begin(), live.handles.end(), handle);
+    if (found == live.handles.end()) return;
+    *found = live.handles[live.handles.size() - 1];
+    live.handles.truncate(live.handles.size() - 1);
 }
 
 #endif
