@@ -14,7 +14,6 @@ static std::set<ArchiveObject*> s_Archives; // all that live
 static PyObject* s_ArchiveType = nullptr;
 
 LibraryCall::~LibraryCall() {
-    if (!m_HasInterpreter) return; // the process is ending
     zarvo_error_free(m_Error);
     if (--m_Archive->calls == 0 && m_Archive->source != nullptr) m_Archive->source->DropExceptions();
 }
@@ -72,7 +71,7 @@ PyObject* OpenWith(PyObject* name, std::unique_ptr<PythonSource> source, Open op
 
     LibraryCall call(self);
     zarvo_archive* archive = nullptr;
-    const zarvo_code code = call.Unlocked([&] { return open(&archive, call.Error()); });
+    const zarvo_code code = WithoutInterpreter([&] { return open(&archive, call.Error()); });
     if (code != ZARVO_OK) return call.Raise(code, *self->name);
     self->archive = archive;
     return owner.release();
@@ -141,11 +140,11 @@ void Deallocate(PyObject* object) {
     PyObject_GC_UnTrack(object);
     ArchiveObject* const self = AsArchive(object);
     s_Archives.erase(self);
-    if (self->archive != nullptr && !self->isLost) {
-        PyThreadState* const state = PyEval_SaveThread();
-        zarvo_close(self->archive);
-        PyEval_RestoreThread(state);
-    }
+    if (self->archive != nullptr && !self->isLost)
+        (void)WithoutInterpreter([&] {
+            zarvo_close(self->archive);
+            return 0;
+        });
     Py_XDECREF(self->foundPath);
     delete self->source;
     delete self->name;

@@ -37,7 +37,7 @@ std::string DescribeEntry(const ArchiveObject* self, uint64_t index);
 //
 //     LibraryCall call(self);
 //     if (!call.IsAllowed()) return nullptr;
-//     const zarvo_code code = call.Unlocked([&] { return zarvo_read(..., call.Error()); });
+//     const zarvo_code code = WithoutInterpreter([&] { return zarvo_read(..., call.Error()); });
 //     if (code != ZARVO_OK) return call.Raise(code, subject);
 class LibraryCall {
 public:
@@ -49,15 +49,6 @@ public:
     // False, with an exception set, when a fork has left the archive unusable.
     bool IsAllowed() const;
 
-    // As WithoutInterpreter.
-    template <typename Function>
-    auto Unlocked(Function function) {
-        m_HasInterpreter = false;
-        const auto result = WithoutInterpreter(function);
-        m_HasInterpreter = true;
-        return result;
-    }
-
     zarvo_error** Error() { return &m_Error; }
 
     // Sets the exception for a failed call, and returns null.
@@ -66,5 +57,4 @@ public:
 private:
     ArchiveObject* m_Archive;
     zarvo_error* m_Error = nullptr;
-    bool m_HasInterpreter = true;
 };

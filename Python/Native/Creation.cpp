@@ -25,10 +25,7 @@ struct Creation {
 };
 
 int TellProgress(void* context, const zarvo_progress* progress) {
-    const PyGILState_STATE state = PyGILState_Ensure();
-    const bool isToGoOn = static_cast<Creation*>(context)->progress.Tell(*progress);
-    PyGILState_Release(state);
-    return isToGoOn ? 0 : 1;
+    return WithInterpreter([&] { return static_cast<Creation*>(context)->progress.Tell(*progress) ? 0 : 1; });
 }
 
 // Called without the interpreter's lock; must not throw.

@@ -34,7 +34,7 @@ bool HasTree(ArchiveObject* self, LibraryCall* call) {
     if (self->hasTree) return true;
     zarvo_item root = ZARVO_ITEM_INIT;
     const zarvo_code code =
-        call->Unlocked([&] { return zarvo_get_item(self->archive, ZARVO_ROOT, &root, call->Error()); });
+        WithoutInterpreter([&] { return zarvo_get_item(self->archive, ZARVO_ROOT, &root, call->Error()); });
     if (code != ZARVO_OK) call->Raise(code, *self->name);
     self->hasTree = code == ZARVO_OK;
     return self->hasTree;
@@ -120,7 +120,7 @@ PyObject* CountFound(PyObject* object, PyObject*) {
     ArchiveObject* const self = AsArchive(object);
     LibraryCall call(self);
     if (!HasTree(self, &call)) return nullptr;
-    const uint64_t count = call.Unlocked([&] {
+    const uint64_t count = WithoutInterpreter([&] {
         uint64_t found = 0;
         for (uint64_t index = 0; index < zarvo_entry_count(self->archive); ++index)
             if (IsFound(self, index)) ++found;
@@ -191,7 +191,7 @@ PyObject* MatchEntries(PyObject* object, PyObject* patterns) {
     Patterns matcher;
     if (!matcher.Add(patterns)) return nullptr;
     std::vector<uint64_t> matched;
-    const bool hasMemory = call.Unlocked([&] {
+    const bool hasMemory = WithoutInterpreter([&] {
         for (uint64_t index = 0; index < zarvo_entry_count(self->archive); ++index) {
             zarvo_entry entry = ZARVO_ENTRY_INIT;
             (void)zarvo_get_entry(self->archive, index, &entry); // there is such an entry
@@ -225,7 +225,7 @@ PyObject* ReadEntry(PyObject* object, PyObject* const* arguments, Py_ssize_t arg
     LibraryCall call(self);
     if (!call.IsAllowed()) return nullptr;
     size_t count = 0;
-    const zarvo_code code = call.Unlocked([&] {
+    const zarvo_code code = WithoutInterpreter([&] {
         return zarvo_read(self->archive, index, offset, buffer, static_cast<size_t>(size), &count, call.Error());
     });
     if (code != ZARVO_OK) return call.Raise(code, DescribeEntry(self, index));

@@ -1,5 +1,7 @@
 #include "Interpreter.h"
 
+#include <unistd.h>
+
 PyObject* DecodePath(std::string_view path) {
     return PyUnicode_DecodeUTF8(path.data(), static_cast<Py_ssize_t>(path.size()), "surrogateescape");
 }
@@ -22,6 +24,11 @@ int ConvertCount(PyObject* number, void* count) {
     else if (PyErr_ExceptionMatches(PyExc_TypeError) != 0)
         PyErr_Format(PyExc_TypeError, "expected an int, not %R", number);
     return 0;
+}
+
+void WaitForProcessToEnd() {
+    while (true)
+        pause();
 }
 
 bool AppendTo(const Reference& list, PyObject* item) {

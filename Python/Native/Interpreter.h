@@ -7,6 +7,7 @@
 #include <Python.h>
 
 #include <cstdint>
+#include <cxxabi.h>
 #include <memory>
 #include <string_view>
 
@@ -29,14 +30,35 @@ std::string_view GetBytes(const Reference& bytes);
 // A converter of PyArg_ParseTuple ("O&"): stores a number from 0 on in a uint64_t.
 int ConvertCount(PyObject* number, void* count);
 
+// When the interpreter is ending, Python up to 3.13 ends a thread that asks for the lock, by unwinding its stack: the
+// references on it would be dropped without the lock. The thread waits here for the process to end instead, as later
+// versions of Python let it do.
+[[noreturn]] void WaitForProcessToEnd();
+
 // Runs a function without the interpreter's lock. The function must not throw.
 template <typename Function>
 auto WithoutInterpreter(Function function) {
     PyThreadState* const state = PyEval_SaveThread();
-    const auto result = function();
-    // Not in a destructor: when the interpreter is ending, Python ends this thread here by unwinding its stack.
-    PyEval_RestoreThread(state);
-    return result;
+    try {
+        const auto result = function();
+        PyEval_RestoreThread(state);
+        return result;
+    } catch (const abi::__forced_unwind&) {
+        WaitForProcessToEnd();
+    }
+}
+
+// Runs a function with the interpreter's lock, in any thread. The function must not throw.
+template <typename Function>
+auto WithInterpreter(Function function) {
+    try {
+        const PyGILState_STATE state = PyGILState_Ensure();
+        const auto result = function();
+        PyGILState_Release(state);
+        return result;
+    } catch (const abi::__forced_unwind&) {
+        WaitForProcessToEnd();
+    }
 }
 
 // Appends to a list. False with an exception set; null is one that is set already.

@@ -19,10 +19,7 @@ zarvo_source PythonSource::MakeCallbacks() {
 }
 
 int64_t PythonSource::ReadAt(void* context, void* buffer, size_t size, uint64_t offset) {
-    const PyGILState_STATE state = PyGILState_Ensure();
-    const int64_t answer = static_cast<PythonSource*>(context)->CallReadAt(buffer, size, offset);
-    PyGILState_Release(state);
-    return answer;
+    return WithInterpreter([&] { return static_cast<PythonSource*>(context)->CallReadAt(buffer, size, offset); });
 }
 
 int PythonSource::GetSize(void* context, uint64_t* size) {

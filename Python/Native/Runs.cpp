@@ -89,10 +89,7 @@ Run* AsRun(void* context) { return static_cast<Run*>(context); }
 // Stops the run for an interrupt of the user, an exception of the progress function, or a failed source.
 int TellProgress(void* context, const zarvo_progress* progress) {
     Run* const run = AsRun(context);
-    const PyGILState_STATE state = PyGILState_Ensure();
-    const bool isToGoOn = !run->HasSourceFailed() && run->progress.Tell(*progress);
-    PyGILState_Release(state);
-    return isToGoOn ? 0 : 1;
+    return WithInterpreter([&] { return !run->HasSourceFailed() && run->progress.Tell(*progress) ? 0 : 1; });
 }
 
 void TakeReport(void* context, const zarvo_report* report) {
@@ -166,7 +163,7 @@ PyObject* ExtractArchive(PyObject* self, PyObject* arguments) {
     zarvo_summary summary = ZARVO_SUMMARY_INIT;
     LibraryCall call(run.self);
     if (!call.IsAllowed()) return nullptr;
-    const zarvo_code code = call.Unlocked(
+    const zarvo_code code = WithoutInterpreter(
         [&] { return zarvo_extract(run.self->archive, folderText, &options, &how, &summary, call.Error()); });
     const std::string subject = code == ZARVO_ERROR_SYSTEM ? folderText : *run.self->name;
     if (!HasEndedWell(&run, &call, code, subject)) return nullptr;
@@ -193,7 +190,7 @@ PyObject* TestArchive(PyObject* self, PyObject* arguments) {
     LibraryCall call(run.self);
     if (!call.IsAllowed()) return nullptr;
     const zarvo_code code =
-        call.Unlocked([&] { return zarvo_test(run.self->archive, &options, &what, &summary, call.Error()); });
+        WithoutInterpreter([&] { return zarvo_test(run.self->archive, &options, &what, &summary, call.Error()); });
     if (!HasEndedWell(&run, &call, code, *run.self->name)) return nullptr;
 
     const Reference entries(PyList_New(0)), blocks(PyList_New(0));

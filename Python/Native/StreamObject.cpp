@@ -26,7 +26,7 @@ constexpr size_t kPieceSize = 1 << 24;
 bool ReadPiece(StreamObject* self, char* buffer, size_t size, size_t* count) {
     LibraryCall call(self->archive);
     if (!call.IsAllowed()) return false;
-    const zarvo_code code = call.Unlocked([&] {
+    const zarvo_code code = WithoutInterpreter([&] {
         const std::lock_guard lock(*self->lock);
         return zarvo_stream_read(self->stream, buffer, size, count, call.Error());
     });
@@ -69,7 +69,7 @@ PyObject* Seek(PyObject* object, PyObject* number) {
     if (PyErr_Occurred() != nullptr) return nullptr;
     LibraryCall call(self->archive);
     if (!call.IsAllowed()) return nullptr;
-    (void)call.Unlocked([&] {
+    (void)WithoutInterpreter([&] {
         const std::lock_guard lock(*self->lock);
         return zarvo_stream_seek(self->stream, position); // takes any position
     });
@@ -87,7 +87,7 @@ void Deallocate(PyObject* object) {
     StreamObject* const self = AsStream(object);
     if (!self->archive->isLost) {
         LibraryCall call(self->archive);
-        call.Unlocked([&] {
+        (void)WithoutInterpreter([&] {
             zarvo_stream_free(self->stream);
             return 0;
         });
@@ -131,7 +131,7 @@ PyObject* OpenStream(PyObject* archive, PyObject* number) {
     if (!call.IsAllowed()) return nullptr;
     zarvo_stream* stream = nullptr;
     const zarvo_code code =
-        call.Unlocked([&] { return zarvo_stream_open(owner->archive, index, &stream, call.Error()); });
+        WithoutInterpreter([&] { return zarvo_stream_open(owner->archive, index, &stream, call.Error()); });
     if (code != ZARVO_OK) return call.Raise(code, DescribeEntry(owner, index));
     auto* const self = PyObject_GC_New(StreamObject, reinterpret_cast<PyTypeObject*>(s_StreamType));
     if (self == nullptr) {
