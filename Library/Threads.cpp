@@ -22,6 +22,15 @@ UInt32 ChooseThreadCount(UInt32 wanted, UInt64 atMost) {
     return static_cast<UInt32>(std::clamp<UInt64>(std::min<UInt64>(count, atMost), 1, kMaxThreads));
 }
 
+// What threads block. A fault is its own thread's: the system ends the process if it can't have the signal.
+static sigset_t AllButFaults() {
+    sigset_t signals;
+    sigfillset(&signals);
+    for (const int fault : {SIGSEGV, SIGBUS, SIGFPE, SIGILL, SIGTRAP, SIGSYS})
+        sigdelset(&signals, fault);
+    return signals;
+}
+
 struct WatchedRun::Job {
     WatchedRun* run;
     Call call;
@@ -43,10 +52,9 @@ void WatchedRun::RunCalls(UInt32 count, Call call) {
     if (!jobs.resize_uninitialized(count, kResizeExact)) count = 0;
     m_IsAlone = false;
     m_Ended = 0;
-    sigset_t all;
+    const sigset_t blocked = AllButFaults();
     sigset_t before;
-    sigfillset(&all);
-    pthread_sigmask(SIG_SETMASK, &all, &before); // threads begin with the mask of their maker
+    pthread_sigmask(SIG_SETMASK, &blocked, &before); // threads begin with the mask of their maker
     UInt32 started = 0;
     for (; started < count; ++started) {
         jobs[started] = {this, call, started, {}};

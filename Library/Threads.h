@@ -1,5 +1,5 @@
 // Threads that work while the calling thread watches. They end before the call that starts them returns. They block all
-// signals, so that the program's signal handlers run on its own threads.
+// signals but those of faults, so that the program's signal handlers run on its own threads.
 #pragma once
 
 #include "Library/Progress.h"

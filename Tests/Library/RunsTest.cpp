@@ -4,8 +4,10 @@
 
 #include <chrono>
 #include <condition_variable>
+#include <csignal>
 #include <map>
 #include <mutex>
+#include <sys/mman.h>
 #include <sys/resource.h>
 
 // Random damage: what is told, and what is on the disk, is the same for any number of threads, and agrees with what
@@ -179,4 +181,46 @@ TEST(Runs, ManyThreadsShareTheMemoryOfEight) {
     };
     ASSERT_EQ(ZARVO_OK, archive.visit({.threads = 64}, visit).error.code());
     EXPECT_EQ(131'072u, largest);
+}
+
+// Memory that a program makes readable when it is read.
+class LazyMemory : private NonCopyable {
+public:
+    explicit LazyMemory(const std::string& bytes) {
+        s_Size = bytes.size();
+        s_Begin = mmap(nullptr, s_Size, PROT_READ | PROT_WRITE, MAP_PRIVATE | MAP_ANONYMOUS, -1, 0);
+        memcpy(s_Begin, bytes.data(), s_Size);
+        struct sigaction action = {};
+        action.sa_handler = [](int) {
+            mprotect(s_Begin, s_Size, PROT_READ);
+            s_IsRead = true;
+        };
+        sigaction(SIGSEGV, &action, &m_Before);
+        Hide();
+    }
+    ~LazyMemory() {
+        sigaction(SIGSEGV, &m_Before, nullptr);
+        munmap(s_Begin, s_Size);
+    }
+
+    void Hide() {
+        mprotect(s_Begin, s_Size, PROT_NONE);
+        s_IsRead = false;
+    }
+    std::span<const std::byte> Bytes() const { return {static_cast<const std::byte*>(s_Begin), s_Size}; }
+    static bool IsRead() { return s_IsRead; }
+
+private:
+    static inline void* s_Begin = nullptr;
+    static inline size_t s_Size = 0;
+    static inline std::atomic<bool> s_IsRead = false;
+    struct sigaction m_Before = {};
+};
+
+TEST(Runs, LeaveFaultsOfThreadsToTheProgram) {
+    LazyMemory memory(BuildArchive({.entries = ManyFiles(3)}).bytes);
+    zarvo::archive archive = *zarvo::archive::open(memory.Bytes());
+    memory.Hide();
+    EXPECT_EQ(ZARVO_OK, archive.test({.threads = 2}).error.code());
+    EXPECT_TRUE(memory.IsRead());
 }
