@@ -1,7 +1,7 @@
 // Keeps what was decoded lately: whole blocks, and cursors, from which decoding of a large stream can go on. Files that
 // are read in turns, in small pieces, then decode each block once. Any thread.
 //
-//   BlockUse use(cache);
+//   BlockCache::Use use(cache);
 //   if (cache->Acquire(index, &use, failure) == ZARVO_OK) copy out of use.Data()
 //
 // The states of a block's record, and what operations do in each:

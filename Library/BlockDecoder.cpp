@@ -1,8 +1,8 @@
 #include "Library/BlockDecoder.h"
 
 #include "Library/Lz4Coder.h"
-#include "Runtime/Allocator/Allocator.h"
 #include "Runtime/Utilities/Compression/Lz4Decompressor.h"
+#include "Runtime/Utilities/LogAssert.h"
 
 #include <algorithm>
 #include <cstdio>
@@ -111,7 +111,10 @@ zarvo_code BlockDecoder::DecodeWhole(UInt32 index, UInt8* out, size_t* count, Fa
     const Block block = GetBlock(index);
     if (IsStoredAsIs(block)) return ReadStoredAsIs(index, 0, out, block.size, count, failure);
     if (block.type != kCompressionLzma && !HasLz4(block)) {
-        Delete(CreateDecompressor(block.type, kMemLabelGeneral), kMemLabelGeneral); // null: reports the kind
+        // Not ReportError, which takes a lock: another thread may have held it when this process was forked, and a
+        // process that ends destroys it while threads still read.
+        printf_console("Decompressing this format (%u) is not supported on this platform.\n",
+                       static_cast<UInt32>(block.type));
         return failure->Set(ZARVO_ERROR_UNSUPPORTED, "block %u has compression kind %u, which is not supported", index,
                             static_cast<UInt32>(block.type));
     }
