@@ -9,7 +9,8 @@
 #include <set>
 #include <utility>
 
-static std::set<ArchiveObject*> s_Archives; // all that live
+// All that live. Never destroyed: programs that embed Python may drop archives after the static objects.
+static std::set<ArchiveObject*>& s_Archives = *new std::set<ArchiveObject*>;
 
 static PyObject* s_ArchiveType = nullptr;
 

@@ -228,6 +228,21 @@ class Threads(LifeTest):
             self.assertEqual((0, ""), (ended.returncode, ended.stderr))
 
 
+    def test_of_a_process_that_ends_may_still_drop_archives(self):
+        script = """if True:
+            import ctypes, sys
+            c = ctypes.CDLL(None)
+            # Called after the static objects of all that is loaded later are destroyed.
+            drop = ctypes.CFUNCTYPE(None, ctypes.c_void_p)(lambda _: archives.clear())
+            c.__cxa_atexit(drop, None, None)
+            import zarvo
+            archives = [zarvo.open(sys.argv[1]) for _ in range(3)]
+            c.exit(len(archives))
+            """
+        ended = run_python(script, str(self.path))
+        self.assertEqual((3, ""), (ended.returncode, ended.stderr))
+
+
 class Signals(LifeTest):
     def test_interrupt_a_run(self):
         blocks = 32
