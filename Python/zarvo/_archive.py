@@ -88,7 +88,12 @@ class _EntryFile(io.RawIOBase):
         return count
 
     def readall(self) -> bytes:
-        data = self._open_stream().read(_count_to_read(self._position, self._size, self._data_end))
+        stream = self._open_stream()
+        try:
+            data = stream.read(_count_to_read(self._position, self._size, self._data_end))
+        except BaseException:
+            stream.seek(self._position)  # it may have read pieces before
+            raise
         self._position += len(data)
         return data
 

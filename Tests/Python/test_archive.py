@@ -15,7 +15,7 @@ import unittest
 import zipfile
 
 import zarvo
-from archives import FOLDER, LZMA, ROAD, TEXT, TREE, UNKNOWN, ArchiveTest, build
+from archives import FOLDER, LZMA, ROAD, TEXT, TREE, UNKNOWN, ArchiveTest, build, make_text
 
 
 class Mapping(ArchiveTest):
@@ -131,6 +131,13 @@ class Files(ArchiveTest):
         for read in (file.read, archive["text"].read):
             with self.assertRaisesRegex(zarvo.DamagedData, "a.zarvo: text: "):
                 read()
+
+    def test_stay_where_they_are_when_a_read_fails(self):
+        data = make_text(20 << 20)  # more than is read at a time
+        file = self.open([("text", data)], kind=LZMA, block_size=1 << 20, damage=[19])["text"].open()
+        with self.assertRaises(zarvo.DamagedData):
+            file.read()
+        self.assertEqual((0, data[:20]), (file.tell(), file.read(20)))
 
     def test_of_impossible_sizes_are_damaged(self):
         for size in (1 << 40, (1 << 63) + 1, (1 << 64) - 1):
