@@ -74,13 +74,13 @@ zarvo_code zarvo_archive::RefuseDirectory(UInt64 bytes, Failure* failure) const 
                         static_cast<unsigned long long>(m_Options.max_directory_bytes));
 }
 
-// As the layouts store it that don't say so in their header: 0 for the others.
+// The directory and the list of blocks, as they are stored; 0 for the block-based layout, whose header has told.
 UInt64 zarvo_archive::DirectoryBytes() const {
     const core::string& signature = m_Reader.GetHeader().signature;
     const bool hasLongNodes = signature == kSignatureArchive;
     if (!hasLongNodes && signature != kSignatureWeb && signature != kSignatureRaw) return 0;
     const UInt64 bytesOfNode = 1 + (hasLongNodes ? 20 : 8); // beside the path
-    UInt64 bytes = 0;
+    UInt64 bytes = hasLongNodes ? UInt64{24} * m_Blocks.BlockCount() : 0;
     for (const Node& node : Nodes())
         bytes += node.path.size() + bytesOfNode;
     return bytes;

@@ -106,8 +106,9 @@ zarvo_code WritePlan::Place(EntryList* list, size_t* failed, Failure* failure) {
         entry.offset = position; // of a folder, nobody reads it
         position += entry.size;
         directorySize += (HasLegacyDirectory() ? 9 : 21) + entry.pathSize;
-        const UInt64 blocks = HasLegacyDirectory() ? 0 : 10 * (position / m_BlockSize + 1);
-        if (m_Layout != ZARVO_LAYOUT_ARCHIVE && directorySize + blocks > kMaxDirectorySize)
+        const UInt64 bytesOfBlock = HasLegacyDirectory() ? 0 : m_Layout == ZARVO_LAYOUT_ARCHIVE ? 24 : 10;
+        const UInt64 blocks = bytesOfBlock * (position / m_BlockSize + 1);
+        if (directorySize + blocks > kMaxDirectorySize)
             return failure->Set(ZARVO_ERROR_LIMIT, "up to here, the directory has %llu bytes, and the limit is %llu",
                                 static_cast<unsigned long long>(directorySize + blocks),
                                 static_cast<unsigned long long>(kMaxDirectorySize));

@@ -119,8 +119,10 @@ TEST(Opening, LimitsAreNamedWhenTheyAreReached) {
                        "the directory does not end in 1000 bytes, which is the limit (max_directory_bytes)"}),
               Refuse(BytesOf(web), {.max_directory_bytes = 1'000}));
     description.entries.resize(100);
+    description.entries[0].bytes = "xxx";
+    description.chunkSize = 1; // blocks, of 24 bytes in their list
     for (const auto& [layout, size] :
-         {std::pair(ArchiveLayout::kWeb, 1'400u), {ArchiveLayout::kRaw, 1'400u}, {ArchiveLayout::kArchive, 2'600u}}) {
+         {std::pair(ArchiveLayout::kWeb, 1'400u), {ArchiveLayout::kRaw, 1'400u}, {ArchiveLayout::kArchive, 2'672u}}) {
         description.layout = layout;
         const std::string archive = BuildArchive(description).bytes;
         EXPECT_EQ(Refusal{}, Refuse(BytesOf(archive), {.max_directory_bytes = size})) << size;
