@@ -103,16 +103,17 @@ zarvo_code Creation::CheckCanWrite(EntrySource* source, Failure* failure) {
         return code;
     ProgressClock clock(ProgressClock::Clock::now());
     UInt64 looked = 0;
-    for (const bool areEmpty : {true, false})
+    const auto tell = [&] { return TellProgress(m_Options, {.files = looked, .filesTotal = m_Entries.size()}); };
+    for (const bool areEmpty : {true, false}) // folders are with those that are
         for (size_t index = 0; index < m_Entries.size(); ++index) {
-            const Progress now = {.files = looked, .filesTotal = m_Entries.size()};
-            if (clock.IsDue() && !TellProgress(m_Options, now)) return failure->SetStopped();
+            if (clock.IsDue() && !tell()) return failure->SetStopped();
             const EntryList::Entry& entry = m_Entries[index];
-            if (EntryList::IsFolder(entry) || (entry.size == 0) != areEmpty) continue;
-            if (source->CheckCanRead(m_Entries, entry, failure) != ZARVO_OK) return FailEntry(index, *failure);
+            if ((entry.size == 0) != areEmpty) continue;
+            if (!EntryList::IsFolder(entry) && source->CheckCanRead(m_Entries, entry, failure) != ZARVO_OK)
+                return FailEntry(index, *failure);
             ++looked;
         }
-    return ZARVO_OK;
+    return tell() ? ZARVO_OK : failure->SetStopped();
 }
 
 zarvo_code Creation::WriteFile(EntrySource* source, Failure* failure) {

@@ -225,19 +225,31 @@ TEST_F(Creation, CountsEmptyFilesWhenTheyAreChecked) {
     EXPECT_EQ(2u, files.back());
 }
 
+// The last progress that is told.
+zarvo_progress TellLast(const std::string& archive, const std::string& folder, const zarvo::create_options& how) {
+    zarvo_progress last = {};
+    const auto keep = [&](const zarvo_progress& progress) {
+        last = progress;
+        return true;
+    };
+    EXPECT_EQ(ZARVO_OK, Create(archive, folder, how, {.progress = keep}).code);
+    return last;
+}
+
 TEST_F(Creation, TellsAllProgressInTheEnd) {
     PutManyFiles();
-    zarvo_progress last = {};
-    ASSERT_EQ(ZARVO_OK, Create(Archive(), In(), {},
-                               {.progress =
-                                    [&](const zarvo_progress& progress) {
-                                        last = progress;
-                                        return true;
-                                    }})
-                            .code);
+    const zarvo_progress last = TellLast(Archive(), In(), {});
     EXPECT_EQ(zarvo::archive::open(Archive())->info().data_size, last.bytes);
     EXPECT_EQ(last.bytes_total, last.bytes);
     EXPECT_EQ(last.files_total, last.files);
+}
+
+TEST_F(Creation, TellsInTheEndThatADryRunHasLookedAtAll) {
+    Put("folder/a", "");
+    Put("folder/b", "x");
+    const zarvo_progress last = TellLast(Archive(), In(), {.dry_run = true});
+    EXPECT_EQ(3u, last.files_total);
+    EXPECT_EQ(3u, last.files);
 }
 
 } // namespace
