@@ -52,10 +52,8 @@ PyObject* CreateArchive(PyObject*, PyObject* arguments) {
     if (!PyArg_ParseTuple(arguments, "O&O&OO&O&iiipO&zzppO", PyUnicode_FSConverter, &path, PyUnicode_FSConverter,
                           &folder, &excluded, ConvertCount, &threads, ConvertCount, &memory, &how.layout,
                           &how.compression, &how.level, &how.is_streamed, ConvertCount, &how.block_size,
-                          &how.engine_version, &how.engine_revision, &how.force, &how.dry_run, &progress)) {
-        Py_XDECREF(folder);
+                          &how.engine_version, &how.engine_revision, &how.force, &how.dry_run, &progress))
         return nullptr;
-    }
     const Reference ownedPath(path), ownedFolder(folder);
     const char* const pathText = PyBytes_AsString(path);
     const char* const folderText = PyBytes_AsString(folder);
