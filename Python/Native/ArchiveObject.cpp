@@ -61,12 +61,13 @@ PyObject* OpenWith(PyObject* name, std::unique_ptr<PythonSource> source, Open op
     Reference owner(reinterpret_cast<PyObject*>(self));
     self->archive = nullptr;
     self->source = source.release();
-    self->name = new std::string(GetBytes(nameBytes));
+    self->name = nullptr;
     self->calls = 0;
     self->hasTree = false;
     self->foundPath = nullptr;
     self->foundIndex = 0;
     self->isLost = false;
+    self->name = new std::string(GetBytes(nameBytes)); // now that the object can be dropped
     s_Archives.insert(self);
     PyObject_GC_Track(self);
 
@@ -155,21 +156,22 @@ void Deallocate(PyObject* object) {
 }
 
 PyMethodDef s_Methods[] = {
-    {"info", GetInfo, METH_NOARGS, nullptr},
-    {"data_size", GetDataSize, METH_NOARGS, nullptr},
-    {"entry_count", GetEntryCount, METH_NOARGS, nullptr},
-    {"entry", GetEntry, METH_O, nullptr},
-    {"find", FindItem, METH_O, nullptr},
-    {"find_entry", FindEntry, METH_O, nullptr},
-    {"count_found", CountFound, METH_NOARGS, nullptr},
-    {"next_found", NextFound, METH_O, nullptr},
-    {"kind", GetKind, METH_O, nullptr},
-    {"children", GetChildren, METH_O, nullptr},
-    {"match", MatchEntries, METH_O, nullptr},
-    {"read", reinterpret_cast<PyCFunction>(reinterpret_cast<void (*)()>(ReadEntry)), METH_FASTCALL, nullptr},
-    {"open_stream", OpenStream, METH_O, nullptr},
-    {"extract", ExtractArchive, METH_VARARGS, nullptr},
-    {"test", TestArchive, METH_VARARGS, nullptr},
+    {"info", Guarded<GetInfo>::Call, METH_NOARGS, nullptr},
+    {"data_size", Guarded<GetDataSize>::Call, METH_NOARGS, nullptr},
+    {"entry_count", Guarded<GetEntryCount>::Call, METH_NOARGS, nullptr},
+    {"entry", Guarded<GetEntry>::Call, METH_O, nullptr},
+    {"find", Guarded<FindItem>::Call, METH_O, nullptr},
+    {"find_entry", Guarded<FindEntry>::Call, METH_O, nullptr},
+    {"count_found", Guarded<CountFound>::Call, METH_NOARGS, nullptr},
+    {"next_found", Guarded<NextFound>::Call, METH_O, nullptr},
+    {"kind", Guarded<GetKind>::Call, METH_O, nullptr},
+    {"children", Guarded<GetChildren>::Call, METH_O, nullptr},
+    {"match", Guarded<MatchEntries>::Call, METH_O, nullptr},
+    {"read", reinterpret_cast<PyCFunction>(reinterpret_cast<void (*)()>(Guarded<ReadEntry>::Call)), METH_FASTCALL,
+     nullptr},
+    {"open_stream", Guarded<OpenStream>::Call, METH_O, nullptr},
+    {"extract", Guarded<ExtractArchive>::Call, METH_VARARGS, nullptr},
+    {"test", Guarded<TestArchive>::Call, METH_VARARGS, nullptr},
     {nullptr, nullptr, 0, nullptr},
 };
 
@@ -185,10 +187,10 @@ PyType_Spec s_Spec = {"zarvo._native.Archive", sizeof(ArchiveObject), 0,
                       Py_TPFLAGS_DEFAULT | Py_TPFLAGS_HAVE_GC | Py_TPFLAGS_DISALLOW_INSTANTIATION, s_Slots};
 
 PyMethodDef s_Functions[] = {
-    {"open_path", OpenPath, METH_VARARGS, nullptr},
-    {"open_descriptor", OpenDescriptor, METH_VARARGS, nullptr},
-    {"open_source", OpenSource, METH_VARARGS, nullptr},
-    {"create", CreateArchive, METH_VARARGS, nullptr},
+    {"open_path", Guarded<OpenPath>::Call, METH_VARARGS, nullptr},
+    {"open_descriptor", Guarded<OpenDescriptor>::Call, METH_VARARGS, nullptr},
+    {"open_source", Guarded<OpenSource>::Call, METH_VARARGS, nullptr},
+    {"create", Guarded<CreateArchive>::Call, METH_VARARGS, nullptr},
     {nullptr, nullptr, 0, nullptr},
 };
 

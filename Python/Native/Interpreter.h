@@ -9,6 +9,7 @@
 #include <cstdint>
 #include <cxxabi.h>
 #include <memory>
+#include <new>
 #include <string_view>
 
 struct ReferenceDrop {
@@ -60,6 +61,23 @@ auto WithInterpreter(Function function) {
         WaitForProcessToEnd();
     }
 }
+
+// A function that Python calls. Memory that is refused to it becomes a MemoryError: Python's C code can't be unwound.
+//
+//     {"find", Guarded<FindItem>::Call, METH_O, nullptr},
+template <auto kFunction>
+struct Guarded;
+
+template <typename... Parameters, PyObject* (*kFunction)(Parameters...)>
+struct Guarded<kFunction> {
+    static PyObject* Call(Parameters... parameters) {
+        try {
+            return kFunction(parameters...);
+        } catch (const std::bad_alloc&) {
+            return PyErr_NoMemory();
+        }
+    }
+};
 
 // Appends to a list. False with an exception set; null is one that is set already.
 bool AppendTo(const Reference& list, PyObject* item);

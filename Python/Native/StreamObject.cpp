@@ -39,9 +39,9 @@ bool ReadPiece(StreamObject* self, char* buffer, size_t size, size_t* count) {
 PyObject* ReadInto(PyObject* self, PyObject* buffer) {
     Py_buffer view;
     if (PyObject_GetBuffer(buffer, &view, PyBUF_WRITABLE) != 0) return nullptr;
+    const std::unique_ptr<Py_buffer, decltype(&PyBuffer_Release)> owned(&view, PyBuffer_Release);
     size_t count = 0;
     const bool isRead = ReadPiece(AsStream(self), static_cast<char*>(view.buf), static_cast<size_t>(view.len), &count);
-    PyBuffer_Release(&view);
     return isRead ? PyLong_FromSize_t(count) : nullptr;
 }
 
@@ -100,9 +100,9 @@ void Deallocate(PyObject* object) {
 }
 
 PyMethodDef s_Methods[] = {
-    {"readinto", ReadInto, METH_O, nullptr},
-    {"read", Read, METH_O, nullptr},
-    {"seek", Seek, METH_O, nullptr},
+    {"readinto", Guarded<ReadInto>::Call, METH_O, nullptr},
+    {"read", Guarded<Read>::Call, METH_O, nullptr},
+    {"seek", Guarded<Seek>::Call, METH_O, nullptr},
     {nullptr, nullptr, 0, nullptr},
 };
 

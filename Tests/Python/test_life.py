@@ -14,7 +14,7 @@ import unittest
 from concurrent.futures import ThreadPoolExecutor
 
 import zarvo
-from archives import LZMA, ArchiveTest, build, make_text
+from archives import LZMA, UNKNOWN, ArchiveTest, build, make_text
 
 TEXTS = {f"{number}.txt": make_text(40_000, number) for number in range(20)}
 
@@ -241,6 +241,29 @@ class Threads(LifeTest):
             """
         ended = run_python(script, str(self.path))
         self.assertEqual((3, ""), (ended.returncode, ended.stderr))
+
+
+class Memory(LifeTest):
+    @unittest.skipIf("Sanitized" in sys.executable, "the sanitizers need more memory than the limit leaves")
+    def test_that_is_refused_for_a_message_is_an_error(self):
+        path = self.write([("p" * (20 << 20), b"text")], kind=UNKNOWN)
+        script = """if True:
+            import resource, sys, zarvo
+            archive = zarvo.open(sys.argv[1])
+            entry = next(archive.entries())
+            with open("/proc/self/statm") as file:
+                used = int(file.read().split()[0]) * resource.getpagesize()
+            met = set()
+            for more in range(0, 300 << 20, 10 << 20):
+                resource.setrlimit(resource.RLIMIT_AS, (used + more, resource.RLIM_INFINITY))
+                try:
+                    entry.read()
+                except (MemoryError, zarvo.UnsupportedData) as error:
+                    met.add(type(error).__name__)
+            print(sorted(met))
+            """
+        ended = run_python(script, str(path))
+        self.assertEqual(("['MemoryError', 'UnsupportedData']\n", ""), (ended.stdout, ended.stderr))
 
 
 class Signals(LifeTest):
