@@ -87,6 +87,8 @@ private:
             const core::string_ref name(found->d_name);
             if (name == "." || name == ".." || m_Place.IsPlace(status, name)) continue;
             m_Path.truncate(m_FolderPathSize);
+            // On some file systems, names are longer than NAME_MAX.
+            if (m_Path.grow(m_FolderPathSize + name.size()) == nullptr) return failure->SetMemory();
             m_Path += name;
             if (const zarvo_code code = AddFound(dirfd(folder), found->d_name, failure); code != ZARVO_OK) return code;
         }

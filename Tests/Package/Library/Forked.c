@@ -7,7 +7,6 @@
 
 enum { kBlocks = 64, kBlockSize = 4096, kUnknownKind = 7 };
 
-/* An archive whose blocks are of an unknown kind: one that is made, and then changed. */
 static zarvo_archive* OpenUnknown(const unsigned char* bytes, size_t size) {
     zarvo_archive* archive = NULL;
     CHECK(zarvo_open_memory(bytes, size, NULL, &archive, NULL) == ZARVO_OK);
@@ -15,6 +14,7 @@ static zarvo_archive* OpenUnknown(const unsigned char* bytes, size_t size) {
     return archive;
 }
 
+/* Makes an archive, and then changes the kind of its blocks. Returns its size. */
 static size_t MakeUnknown(unsigned char* bytes, size_t room) {
     static char data[kBlocks * kBlockSize];
     char path[] = "/tmp/zarvo-forked-XXXXXX";
