@@ -82,13 +82,6 @@ void PutSection(FieldSink& sink, const BlockRecords& blocks, const EntryList* di
     if (directory != nullptr) PutNodes(sink, *directory);
 }
 
-UInt64 SectionSize(UInt64 blockCount, const EntryList& directory) {
-    UInt64 size = 20 + 10 * blockCount + 4;
-    for (size_t index = 0; index < directory.size(); ++index)
-        size += 21 + directory[index].pathSize;
-    return size;
-}
-
 // 20   from version 4 on: unused[0].high, unused[0].low, unused[0].word
 // 4    unused[1].word
 // 4    headerSize, where the data starts

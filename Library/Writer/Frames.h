@@ -81,7 +81,6 @@ void PutBlockBasedHeader(FieldSink& sink, const ArchiveForm& form, const BlockBa
 
 // The blocks-info section. directory may be null: the section then has none.
 void PutSection(FieldSink& sink, const BlockRecords& blocks, const EntryList* directory);
-UInt64 SectionSize(UInt64 blockCount, const EntryList& directory);
 
 struct LegacySizes {
     UInt64 header; // with all its fields
