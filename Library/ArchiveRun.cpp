@@ -101,12 +101,7 @@ void ArchiveRun::SetFailed(size_t entry, const Failure& failure, State state) {
         isKept = (!m_FailureOf.empty() || m_FailureOf.resize_uninitialized(m_States.size(), kResizeExact)) &&
                  m_Failures.Add(failure, &m_FailureOf[entry]);
     }
-    if (!isKept) {
-        Failure noMemory;
-        (void)noMemory.SetMemory();
-        m_Data.StopFor(noMemory);
-        return;
-    }
+    if (!isKept) return m_Data.StopWithoutMemory();
     SetState(entry, state);
     Count(1);
 }

@@ -91,6 +91,7 @@ public:
     // Works until nothing is left to do, or the run is stopped.
     void Work(UInt32 worker);
     void StopFor(const Failure& failure); // which becomes the FatalFailure if there is none yet
+    void StopWithoutMemory();             // as StopFor
     bool IsStopped() const { return m_IsStopped.load(std::memory_order_relaxed); } // a hint: data is under the lock
 
     // After all workers have ended: drops the files that a stopped run left unfinished.
@@ -166,7 +167,6 @@ private:
     void DeliverPart(UInt32 worker, const PieceFile& part, UInt64 offset, const UInt8* bytes, UInt64 size,
                      const Hole* hole);
     void Unshare(SharedFile* shared);
-    void StopWithoutMemory();
     void CountBytes(UInt64 count) { m_BytesTaken.fetch_add(count, std::memory_order_relaxed); } // for progress only
 
     const BlockDecoder* m_Decoder;

@@ -66,10 +66,8 @@ UInt64 TestRun::ReadableBytes(const Node& node) const {
 void TestRun::TakeDamage(UInt32 blockIndex, UInt64 begin, UInt64 end, const Failure& damage) {
     UInt32 place = 0;
     Mutex::AutoLock lock(m_DamageLock);
-    if (m_Failures.Add(damage, &place) && m_Damages.try_push_back({blockIndex, place, begin, end})) return;
-    Failure noMemory;
-    (void)noMemory.SetMemory();
-    Data().StopFor(noMemory);
+    if (!m_Failures.Add(damage, &place) || !m_Damages.try_push_back({blockIndex, place, begin, end}))
+        Data().StopWithoutMemory();
 }
 
 zarvo_code VisitRun::Visit(Failure* failure) {

@@ -44,7 +44,7 @@ namespace {
 // A run, as its callbacks see it. They are called without the interpreter's lock.
 struct Run {
     Run(PyObject* object, PyObject* progressFunction)
-        : self(reinterpret_cast<ArchiveObject*>(object)),
+        : self(AsArchive(object)),
           progress(progressFunction),
           exceptionsBefore(self->source == nullptr ? 0 : self->source->ExceptionCount()) {}
 

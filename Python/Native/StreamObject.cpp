@@ -124,7 +124,7 @@ bool AddStreamType(PyObject* module) {
 }
 
 PyObject* OpenStream(PyObject* archive, PyObject* number) {
-    auto* const owner = reinterpret_cast<ArchiveObject*>(archive);
+    ArchiveObject* const owner = AsArchive(archive);
     const uint64_t index = PyLong_AsUnsignedLongLong(number);
     if (PyErr_Occurred() != nullptr) return nullptr;
     LibraryCall call(owner);
