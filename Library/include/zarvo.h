@@ -469,7 +469,7 @@ typedef struct zarvo_test_options {
     { sizeof(zarvo_test_options), NULL, NULL }
 
 /* Decodes every block once, and writes nothing. The formats hold no checksums, so damage that still decodes is not
- * found. Patterns are not used. Otherwise as zarvo_extract. */
+ * found. Patterns are not used. After a failure, *summary is empty. Otherwise as zarvo_extract. */
 ZARVO_API zarvo_code zarvo_test(zarvo_archive* archive, const zarvo_run_options* options,
                                 const zarvo_test_options* what, zarvo_summary* summary, zarvo_error** error);
 
