@@ -35,6 +35,9 @@ bool Fails(const char* call) {
     return false;
 }
 
+// Whoever started this program may have left descriptors open to it, which would count against FewDescriptors.
+[[maybe_unused]] const int s_Closed = close_range(STDERR_FILENO + 1, ~0U, 0);
+
 } // namespace
 
 SystemFault::SystemFault(const FaultDescription& fault) : m_Index(0) {
