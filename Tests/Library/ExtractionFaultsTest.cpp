@@ -3,6 +3,7 @@
 #include "Tests/Library/SystemFaults.h"
 #include "Tests/Support/FolderTree.h"
 
+#include <algorithm>
 #include <deque>
 #include <unistd.h>
 
@@ -91,6 +92,16 @@ TEST(ExtractionFaults, FullDiskFailsAllThatIsNotDone) {
                        .files = 1,
                        .failures = 3}),
               outcome);
+}
+
+// Of several folders that are missing, the first one can't be made; the others then fail because it is missing.
+TEST(ExtractionFaults, RefusedFolderIsTheReason) {
+    const TemporaryFolder folder;
+    const auto slashes = static_cast<int>(std::ranges::count(folder.Path(), '/'));
+    const SystemFault fault({.call = "mkdir", .number = slashes + 1, .error = EACCES});
+    const std::string bytes = Archive({{.path = "a"}});
+    zarvo::archive archive = OpenBytes(bytes);
+    EXPECT_EQ(EACCES, archive.extract(folder / "new/deep/out", {}, {}).error.system_code());
 }
 
 class FailingCalls : public testing::Test {

@@ -65,6 +65,10 @@ int openat(int folder, const char* path, int flags, ...) {
     return static_cast<int>(syscall(SYS_openat, folder, path, flags, mode));
 }
 
+int mkdir(const char* path, mode_t mode) {
+    return Fails("mkdir") ? -1 : static_cast<int>(syscall(SYS_mkdirat, AT_FDCWD, path, mode));
+}
+
 int mkdirat(int folder, const char* path, mode_t mode) {
     return Fails("mkdirat") ? -1 : static_cast<int>(syscall(SYS_mkdirat, folder, path, mode));
 }

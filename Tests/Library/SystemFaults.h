@@ -19,9 +19,10 @@
 #endif
 
 struct FaultDescription {
-    const char* call = ""; // openat, fstatat, mkdirat, linkat, renameat2, pread, pwrite, fsync, flock, pthread_create
-                           // (not under sanitizers); or a kind of one: O_TMPFILE, AT_EMPTY_PATH, RENAME_NOREPLACE,
-                           // "link of a name", "/proc", "fsync of a folder"; or "end of a file", which a pread meets
+    const char* call = ""; // openat, fstatat, mkdir, mkdirat, linkat, renameat2, pread, pwrite, fsync, flock,
+                           // pthread_create (not under sanitizers); or a kind of one: O_TMPFILE, AT_EMPTY_PATH,
+                           // RENAME_NOREPLACE, "link of a name", "/proc", "fsync of a folder"; or "end of a file",
+                           // which a pread meets
     int number = 0;        // which call from now on, from 1; 0: every one
     int error = EIO;
 };
