@@ -4,6 +4,7 @@
 
 #include <algorithm>
 #include <iterator>
+#include <map>
 #include <regex>
 #include <set>
 
@@ -49,6 +50,30 @@ TEST(ZarvoManual, HasTheOptionsOfTheHelp) {
             known.insert(DescribeOption(*option));
     EXPECT_EQ(known, listed);
     EXPECT_LT(8u, known.size());
+}
+
+// In parentheses, the manual says which subcommands have an option; without them, it means all.
+TEST(ZarvoManual, NamesTheSubcommandsOfEachOption) {
+    std::map<std::string, std::string> owners, told;
+    const auto collect = [&](const Subcommand& subcommand, const std::string& name) {
+        for (const Option* const option : subcommand.options) {
+            std::string& names = owners[DescribeOption(*option)];
+            names += (names.empty() ? "" : ", ") + name;
+        }
+    };
+    for (const Subcommand* const subcommand : GetSubcommands())
+        collect(*subcommand, std::string(subcommand->name));
+    const std::string all = owners[DescribeOption(kHelp)];
+    collect(kNoSubcommand, "without a subcommand");
+    const std::string options = ReadManualSection("OPTIONS");
+    const std::regex row("\n\\.TP\n\\.BI? ([^\n]*)\n(?:\\.RB \\( ([^)]*) \\)|\\(([^)]*)\\)\n)?");
+    for (std::sregex_iterator at(options.begin(), options.end(), row), end; at != end; ++at) {
+        const std::string names = ReadManualLine((*at)[2]) + (*at)[3].str();
+        told[ReadManualLine((*at)[1])] = names.empty() ? all : names;
+    }
+    for (auto& [option, names] : owners)
+        names = std::regex_replace(names, std::regex("^" + all + ".*"), all);
+    EXPECT_EQ(owners, told);
 }
 
 TEST(ZarvoManual, HasEverySubcommand) {
