@@ -4,6 +4,7 @@
 
 #include <algorithm>
 #include <charconv>
+#include <climits>
 #include <limits>
 
 namespace {
@@ -30,7 +31,8 @@ std::string CheckValue(const Option& option, const std::string& value) {
         unsigned count = 0;
         const auto [end, error] = std::from_chars(value.data(), value.data() + value.size(), count);
         if (error != std::errc() || end != value.data() + value.size() || count < least)
-            return MakeMessage("%: '%' is no number from % on", {name, value, std::to_string(least)});
+            return MakeMessage("%: '%' is no number from % to %",
+                               {name, value, std::to_string(least), std::to_string(UINT_MAX)});
     }
     const std::string choices = '|' + std::string(option.choices) + '|';
     if (option.kind == ValueKind::kChoice &&
