@@ -122,7 +122,7 @@ bool Arguments::ReadOptions(std::string_view argument, const std::string* next) 
     for (size_t place = 1; place < argument.size(); ++place) {
         const Option* const option = FindOption(*m_Subcommand, argument[place]);
         const bool takesValue = option != nullptr && !option->value.empty();
-        const std::string form = {'-', argument[place]};
+        const std::string form = '-' + std::string(FirstCharacter(argument.substr(place)));
         if (takesValue && place + 1 == argument.size()) return takeNext(option, form);
         if (option == nullptr)
             refuse(form);

@@ -103,6 +103,10 @@ bool IsUtf8(std::string_view text) {
     return isUtf8;
 }
 
+std::string_view FirstCharacter(std::string_view text) {
+    return text.substr(0, std::max<size_t>(MeasureCharacter(text), 1));
+}
+
 std::string ReplaceBrokenUtf8(std::string_view text) {
     std::string replaced;
     ForEachCharacter(

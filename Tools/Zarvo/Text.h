@@ -15,6 +15,9 @@ std::string EscapeControlsInJson(std::string_view json);
 
 bool IsUtf8(std::string_view text);
 
+// The character that a text, which isn't empty, begins with: of broken UTF-8, its first byte.
+std::string_view FirstCharacter(std::string_view text);
+
 // U+FFFD in place of each byte of broken UTF-8.
 std::string ReplaceBrokenUtf8(std::string_view text);
 

@@ -60,6 +60,8 @@ TEST_F(ZarvoArguments, ThatMakeNoSenseAreRefusedInALine) {
         {{"list", "-lz", "a"}, "zarvo: no such option: '-z'; see 'zarvo list --help'"},
         {{"list", "-q-", "a"}, "zarvo: no such option: '--'; see 'zarvo list --help'"},
         {{"list", "-!", "a"}, "zarvo: no such option: '-!'; see 'zarvo list --help'"},
+        {{"list", "-qé", "a"}, "zarvo: no such option: '-é'; see 'zarvo list --help'"},
+        {{"list", "-\xC3", "a"}, "zarvo: no such option: '-\\xc3'; see 'zarvo list --help'"},
         {{"list", "---", "a"}, "zarvo: no such option: '---'; see 'zarvo list --help'"},
         {{"list", "--js", "a"}, "zarvo: no such option: '--js'; see 'zarvo list --help'"},
         {{"list", "--\n", "a"}, "zarvo: no such option: '--\\n'; see 'zarvo list --help'"},
