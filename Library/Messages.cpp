@@ -3,6 +3,7 @@
 #include "Runtime/Utilities/LogAssert.h"
 #include "Runtime/Utilities/SpookyHash.h"
 
+#include <algorithm>
 #include <cstdio>
 #include <pthread.h>
 
@@ -58,6 +59,7 @@ void MessageQueue::TellAll(MessageLog* log) {
         Mutex::AutoLock lock(m_Lock);
         messages = std::move(m_Messages);
     }
+    std::sort(messages.begin(), messages.end());
     for (const core::string& message : messages)
         log->Tell(message);
 }

@@ -34,6 +34,8 @@ private:
 class MessageQueue : private NonCopyable {
 public:
     void Add(dynamic_array<core::string>* messages);
+
+    // Sorted, because the order of their coming depends on the threads.
     void TellAll(MessageLog* log);
 
 private:

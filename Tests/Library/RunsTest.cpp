@@ -57,6 +57,24 @@ TEST(Runs, TellDamageAlikeForAnyThreads) {
     }
 }
 
+// Several threads come upon them in any order.
+TEST(Runs, TellRemarksInOneOrder) {
+    ArchiveDescription description = {.entries = {{.path = "a", .bytes = "0123456789"}}};
+    for (const int kind : {9, 7, 8, 7, 9})
+        description.blocks.push_back({.size = 2, .type = static_cast<CompressionType>(kind), .stored = "01"});
+    const std::string bytes = BuildArchive(description).bytes;
+    for (const uint32_t threads : {1u, 3u}) {
+        std::string remarks;
+        zarvo::archive archive = OpenBytes(bytes, {.log = [&](std::string_view remark) { remarks += remark; }});
+        EXPECT_EQ(ZARVO_OK, archive.test({.threads = threads}).error.code());
+        EXPECT_EQ("Decompressing this format (7) is not supported on this platform."
+                  "Decompressing this format (8) is not supported on this platform."
+                  "Decompressing this format (9) is not supported on this platform.",
+                  remarks)
+            << threads << " threads";
+    }
+}
+
 TEST(Runs, HandOverEachFileInOrder) {
     const std::vector<ArchiveEntry> entries = ManyFiles(9);
     for (const bool isStreamed : {false, true}) {
