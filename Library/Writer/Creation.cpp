@@ -2,9 +2,8 @@
 
 #include "Library/Writer/WriteRun.h"
 
-zarvo_code Creation::Begin(const char* path, Failure* failure) {
-    if (const zarvo_code code = m_Plan.ReadOptions(m_How, failure); code != ZARVO_OK) return code;
-    const zarvo_code code = m_File.FindPlace(path, failure);
+zarvo_code Creation::FindPlace(Failure* failure) {
+    const zarvo_code code = m_File.FindPlace(m_Path, failure);
     return code == ZARVO_OK ? m_File.CheckPlace(m_How.force != 0, failure) : code;
 }
 
@@ -13,6 +12,7 @@ zarvo_code Creation::AddFolder(FolderEntries* folder, const char* path, Failure*
         TellFailed({"", 0}, true, *failure);
         return failure->code;
     }
+    if (const zarvo_code code = FindPlace(failure); code != ZARVO_OK) return code;
     FolderEntries::Findings findings = {.files = &m_Entries, .leftOut = &m_LeftOut};
     const zarvo_code code = folder->List(m_Options, m_File, &findings, failure);
     const bool isOfRun = code == ZARVO_OK || code == ZARVO_ERROR_MEMORY || code == ZARVO_ERROR_STOPPED;
@@ -22,6 +22,7 @@ zarvo_code Creation::AddFolder(FolderEntries* folder, const char* path, Failure*
 }
 
 zarvo_code Creation::AddEntries(const EntryList& entries, Failure* failure) {
+    if (const zarvo_code code = FindPlace(failure); code != ZARVO_OK) return code;
     if (!m_Entries.CopyFrom(entries)) return failure->SetMemory();
     m_Entries.Sort();
     const size_t clash = m_Entries.FindClash();

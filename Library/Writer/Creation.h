@@ -12,12 +12,15 @@
 class Creation : private NonCopyable {
 public:
     // options and how: as the caller gave them. Both must outlive the object.
-    Creation(const zarvo_run_options& options, const zarvo_create_options& how) : m_Options(options), m_How(how) {}
+    // path: of the archive. It outlives the creation, as the options do.
+    Creation(const char* path, const zarvo_run_options& options, const zarvo_create_options& how)
+        : m_Path(path), m_Options(options), m_How(how) {}
 
-    // Checks the options, and finds the place for the archive.
-    zarvo_code Begin(const char* path, Failure* failure);
+    // Call this first, and then one of the next two, which find the place for the archive.
+    zarvo_code ReadOptions(Failure* failure) { return m_Plan.ReadOptions(m_How, failure); }
 
-    // Adds what is in a folder. A failure of the folder itself is told as one of the entry "".
+    // Adds what is in a folder. A failure of the folder itself is told as one of the entry "", before the archive's
+    // place is looked at.
     zarvo_code AddFolder(FolderEntries* folder, const char* path, Failure* failure);
 
     // Takes a copy of entries from elsewhere, and refuses those that can't be together.
@@ -31,6 +34,7 @@ private:
     // Why an entry is left out, beside the reasons of FolderEntries.
     static constexpr UInt32 kNoFolders = FolderEntries::kReasonCount;
 
+    zarvo_code FindPlace(Failure* failure);
     zarvo_code Settle(Failure* failure);
     [[nodiscard]] bool LeaveOutFolders();
     void MarkFoldersOfFiles();
@@ -42,6 +46,7 @@ private:
     zarvo_code FailEntry(size_t index, const Failure& failure);
     void Tell(core::string_ref path, bool isFolder, SInt32 outcome, const Failure& failure);
 
+    const char* const m_Path;
     const zarvo_run_options& m_Options;
     const zarvo_create_options& m_How;
     WritePlan m_Plan;

@@ -65,8 +65,8 @@ zarvo_code Create(const char* path, const zarvo_run_options* options, const zarv
     if (run.excluded != nullptr && !IsLiveHandle(run.excluded))
         return RefuseArgument("patterns that have been freed", error);
     Failure failure;
-    Creation creation(run, given);
-    zarvo_code code = creation.Begin(path, &failure);
+    Creation creation(path, run, given);
+    zarvo_code code = creation.ReadOptions(&failure);
     if (code == ZARVO_OK) code = fill(&creation, &failure);
     if (summary != nullptr) CopyOut(creation.Summary(), summary);
     return Deliver(code, failure, error);

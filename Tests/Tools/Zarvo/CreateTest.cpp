@@ -96,6 +96,7 @@ TEST_F(ZarvoCreate, NamesWhatGoesWrong) {
     WriteFile("there", "old");
     EXPECT_EQ((Heard{1, "", "zarvo: there: File exists\n"}), Create({"there", "in"}));
     EXPECT_EQ((Heard{2, "", "zarvo: none: No such file or directory\n"}), Create({"a.zarvo", "none"}));
+    EXPECT_EQ((Heard{2, "", "zarvo: none: No such file or directory\n"}), Create({"there", "none"}));
     EXPECT_EQ((Heard{2, "", "zarvo: there: Not a directory\n"}), Create({"a.zarvo", "there"}));
     EXPECT_EQ((Heard{1, "", "zarvo: none/a.zarvo: No such file or directory\n"}), Create({"none/a.zarvo", "in"}));
     EXPECT_EQ(2, Create({"-", "in"}).status);
