@@ -80,12 +80,14 @@ zarvo_code EntryIndex::Build(Failure* failure) {
     std::fill(m_FirstChild.begin(), m_FirstChild.end(), kNoItem);
 
     PathHasher hasher(m_Seed);
-    // From the last to the first: the first that is met of equal paths is the one that counts.
+    // From the last to the first: the first that is met of equal paths is the one that counts, but for folders, which
+    // give way to files.
     for (UInt32 item = count; item-- > 0;) {
         const core::string_ref path = m_Nodes[item].path;
         if (GetPathProblem(path, !IsFolder(m_Nodes[item])) != ZARVO_PROBLEM_NONE) continue;
         UInt32* const slot = FindSlot(hasher.Hash(path), path);
-        if (*slot == kNoItem) *slot = item;
+        const bool isFree = *slot == kNoItem || (IsFolder(m_Nodes[*slot]) && !IsFolder(m_Nodes[item]));
+        if (isFree) *slot = item;
     }
     // In the same order, so that putting each in front of its folder's list leaves the list in the archive's order.
     dynamic_array<UInt64> hashes(kMemLabelGeneral);
@@ -100,7 +102,7 @@ zarvo_code EntryIndex::Build(Failure* failure) {
 // Puts an entry into its folder, and implied folders that are met for the first time into theirs.
 bool EntryIndex::LinkIntoFolders(UInt32 entry, PathHasher* hasher, dynamic_array<UInt64>* hashes) {
     const core::string_ref path = m_Nodes[entry].path;
-    if (*FindSlot(hasher->Hash(path), path) != entry) return true; // a later one counts
+    if (*FindSlot(hasher->Hash(path), path) != entry) return true; // another one counts
     const UInt32 above = *FindSlot(hasher->FolderHash(), hasher->Folder());
     if (above != kNoItem) {
         PutInFront(entry, &m_FirstChild[above]);

@@ -2,8 +2,8 @@
 // thread.
 //
 // An item is an entry (its number in the directory), or a folder that only paths imply (a number after the entries').
-// Of several entries with the same normal form, the last is found; the others, and entries with a problem, are in no
-// folder.
+// Of several entries with the same normal form, the last is found, or the last file if there are files and folders; the
+// others, and entries with a problem, are in no folder.
 //
 // Takes 18 bytes per entry: a slot of 8 bytes in a hash table that is at most six sevenths full, and two links of 4.
 #pragma once

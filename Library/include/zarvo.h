@@ -232,8 +232,9 @@ ZARVO_API uint64_t zarvo_entry_count(const zarvo_archive* archive);
 ZARVO_API zarvo_code zarvo_get_entry(const zarvo_archive* archive, uint64_t index, zarvo_entry* entry);
 
 /* A path has one normal form: "\" becomes "/", and empty and "." components are dropped. Paths with the same normal
- * form are the same file on disk; of several entries with the same one, the last counts. Writes the normal form to out,
- * with a NUL after it, and returns its length. out has room for length + 1 bytes, and may be path itself. */
+ * form are the same file on disk; of several entries with the same one, the last counts (see zarvo_find). Writes the
+ * normal form to out, with a NUL after it, and returns its length. out has room for length + 1 bytes, and may be path
+ * itself. */
 ZARVO_API size_t zarvo_normalize_path(const char* path, size_t length, char* out);
 
 /* Items are what a folder can hold: the entries, and folders that have no entry but are implied by a path, such as
@@ -256,8 +257,10 @@ typedef struct zarvo_item {
 #define ZARVO_ITEM_INIT                                                                                                \
     { sizeof(zarvo_item), NULL, 0, 0, 0, 0, 0, 0 }
 
-/* Finds the item with the same normal form as path: the last such entry, an implied folder, or ZARVO_ROOT for a path
- * whose normal form is empty. ZARVO_ERROR_NOT_FOUND when there is no such item. */
+/* Finds the item with the same normal form as path: the last such entry (of files and folders, the last file), an
+ * implied folder, or ZARVO_ROOT for a path whose normal form is empty. ZARVO_ERROR_NOT_FOUND when there is no such
+ * item.
+ */
 ZARVO_API zarvo_code zarvo_find(const zarvo_archive* archive, const char* path, size_t length, uint64_t* item,
                                 zarvo_error** error);
 

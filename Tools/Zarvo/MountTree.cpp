@@ -43,13 +43,13 @@ zarvo::error MountTree::Build() {
             (folder != ZARVO_ROOT && kinds[folder] == kFile) || (kinds[item] != kNothing && kinds[item] != kind);
         if (isClash || HasLongName(entry)) ++m_Hidden;
 
-        // The item is the last entry of its path.
-        const bool isLast = item == entry.index();
+        // The item is one of the entries of its path.
+        const bool isItem = item == entry.index();
         if (isClash) {
-            if (isLast) m_Replaced.try_emplace(item, ZARVO_NO_ITEM);
+            if (isItem) m_Replaced.try_emplace(item, ZARVO_NO_ITEM);
             continue;
         }
-        if (isLast)
+        if (isItem)
             m_Replaced.erase(item);
         else
             m_Replaced[item] = entry.index();

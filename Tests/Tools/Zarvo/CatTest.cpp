@@ -38,6 +38,15 @@ TEST_F(ZarvoCat, TakesTheLastOfEqualNames) {
     EXPECT_EQ((Heard{0, "3", ""}), Zarvo({"cat", "a.zarvo", "?\\\\a//*"})) << "matched as it is stored";
 }
 
+// As extraction does when the file comes first.
+TEST_F(ZarvoCat, TakesTheFileWhereAFolderHasItsName) {
+    MakeArchive("a.zarvo", Archive("h:1 h|"));
+    MakeArchive("b.zarvo", Archive("h| h:1"));
+    for (const char* const archive : {"a.zarvo", "b.zarvo"})
+        for (const char* const pattern : {"h", "?"})
+            EXPECT_EQ((Heard{0, "1", ""}), Zarvo({"cat", archive, pattern})) << archive << pattern;
+}
+
 // Each is looked up: a walk over all entries for each of them takes minutes.
 TEST_F(ZarvoCat, LooksUpManyPaths) {
     const struct {
