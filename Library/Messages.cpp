@@ -11,6 +11,10 @@ static constinit thread_local MessageScope* t_Innermost = nullptr;
 
 constexpr size_t kMaxMessages = 1000; // that are told apart: an archive full of damage has no more to say than that
 
+static bool Holds(const dynamic_array<core::string>& messages, core::string_ref message) {
+    return std::find(messages.begin(), messages.end(), message) != messages.end();
+}
+
 struct MessageHook {
     // Handed every text that the runtime is about to print; the answer is that it is not to be printed.
     static bool Collect(LogType, const char* format, va_list arguments) {
@@ -22,6 +26,8 @@ struct MessageHook {
         size_t end = std::min(static_cast<size_t>(length), sizeof(text) - 1);
         while (end != 0 && text[end - 1] == '\n')
             --end;
+        // The same is said of many blocks, and must not fill the list.
+        if (Holds(scope->m_Collected, core::string_ref(text, end))) return false;
         const size_t index = scope->m_Collected.size();
         if (scope->m_Collected.resize_initialized(index + 1)) scope->m_Collected[index].assign(text, end);
         return false;
@@ -50,7 +56,8 @@ bool MessageLog::IsNew(const core::string& message) {
 void MessageQueue::Add(dynamic_array<core::string>* messages) {
     Mutex::AutoLock lock(m_Lock);
     for (core::string& message : *messages)
-        if (m_Messages.size() < kMaxMessages) (void)m_Messages.try_push_back(std::move(message)); // or it is lost
+        if (m_Messages.size() < kMaxMessages && !Holds(m_Messages, message))
+            (void)m_Messages.try_push_back(std::move(message)); // or it is lost
 }
 
 void MessageQueue::TellAll(MessageLog* log) {

@@ -35,7 +35,7 @@ class MessageQueue : private NonCopyable {
 public:
     void Add(dynamic_array<core::string>* messages);
 
-    // Sorted, because the order of their coming depends on the threads.
+    // Tells them sorted: the order in which they came depends on the threads.
     void TellAll(MessageLog* log);
 
 private:

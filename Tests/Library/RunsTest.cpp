@@ -60,8 +60,14 @@ TEST(Runs, TellDamageAlikeForAnyThreads) {
 // Several threads come upon them in any order.
 TEST(Runs, TellRemarksInOneOrder) {
     ArchiveDescription description = {.entries = {{.path = "a", .bytes = "0123456789"}}};
-    for (const int kind : {9, 7, 8, 7, 9})
+    const auto add = [&](int kind) {
         description.blocks.push_back({.size = 2, .type = static_cast<CompressionType>(kind), .stored = "01"});
+    };
+    description.entries[0].bytes.resize(2'406);
+    for (int block = 0; block < 1'200; ++block)
+        add(9); // more than are kept of different remarks
+    for (const int kind : {7, 8, 7})
+        add(kind);
     const std::string bytes = BuildArchive(description).bytes;
     for (const uint32_t threads : {1u, 3u}) {
         std::string remarks;
@@ -209,7 +215,11 @@ public:
         s_Begin = mmap(nullptr, s_Size, PROT_READ | PROT_WRITE, MAP_PRIVATE | MAP_ANONYMOUS, -1, 0);
         memcpy(s_Begin, bytes.data(), s_Size);
         struct sigaction action = {};
-        action.sa_handler = [](int) {
+        action.sa_flags = SA_SIGINFO;
+        action.sa_sigaction = [](int, siginfo_t* fault, void*) {
+            const auto* const at = static_cast<const char*>(fault->si_addr);
+            const auto* const begin = static_cast<const char*>(s_Begin);
+            if (at < begin || at >= begin + s_Size) (void)signal(SIGSEGV, SIG_DFL); // a fault of its own
             mprotect(s_Begin, s_Size, PROT_READ);
             s_IsRead = true;
         };
