@@ -30,7 +30,8 @@ PyObject* NextFound(PyObject* self, PyObject* number);
 PyObject* GetKind(PyObject* self, PyObject* item);
 PyObject* GetChildren(PyObject* self, PyObject* item);
 
-// match(patterns): the numbers of the entries that patterns choose, of those with equal paths only the last.
+// match(patterns): the numbers of the entries that patterns choose, of those with equal paths only the one that find
+// finds.
 PyObject* MatchEntries(PyObject* self, PyObject* patterns);
 
 // read(number, offset, size): up to size bytes of an entry.

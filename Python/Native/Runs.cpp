@@ -73,10 +73,10 @@ struct Run {
     std::vector<Damage> damages;
 
     // Callbacks must not throw.
-    template <typename Item>
-    void Keep(std::vector<Item>* items, Item item) {
+    template <typename Item, typename... Fields>
+    void Keep(std::vector<Item>* items, const Fields&... fields) {
         try {
-            items->push_back(std::move(item));
+            items->push_back({fields...}); // a text takes memory, too
         } catch (const std::bad_alloc&) {
             isOutOfMemory = true;
         }
@@ -95,17 +95,17 @@ int TellProgress(void* context, const zarvo_progress* progress) {
 void TakeReport(void* context, const zarvo_report* report) {
     if (report->code == ZARVO_OK) return;
     Run* const run = AsRun(context);
-    run->Keep(&run->failures, {report->index, report->code, report->system_code, report->text});
+    run->Keep(&run->failures, report->index, report->code, report->system_code, report->text);
 }
 
 void TakeDamagedBlock(void* context, uint64_t block, const char* text) {
     Run* const run = AsRun(context);
-    run->Keep(&run->failures, {block, ZARVO_ERROR_DAMAGED, 0, text});
+    run->Keep(&run->failures, block, ZARVO_ERROR_DAMAGED, 0, text);
 }
 
 void TakeDamagedEntry(void* context, uint64_t entry, uint64_t readable) {
     Run* const run = AsRun(context);
-    run->Keep(&run->damages, {entry, readable});
+    run->Keep(&run->damages, entry, readable);
 }
 
 // False with an exception set when the run has ended early.

@@ -129,6 +129,7 @@ PyObject* OpenStream(PyObject* archive, PyObject* number) {
     if (PyErr_Occurred() != nullptr) return nullptr;
     LibraryCall call(owner);
     if (!call.IsAllowed()) return nullptr;
+    auto lock = std::make_unique<std::mutex>();
     zarvo_stream* stream = nullptr;
     const zarvo_code code =
         WithoutInterpreter([&] { return zarvo_stream_open(owner->archive, index, &stream, call.Error()); });
@@ -142,7 +143,7 @@ PyObject* OpenStream(PyObject* archive, PyObject* number) {
     self->archive = owner;
     self->stream = stream;
     self->index = index;
-    self->lock = new std::mutex;
+    self->lock = lock.release();
     PyObject_GC_Track(self);
     return reinterpret_cast<PyObject*>(self);
 }
