@@ -114,7 +114,8 @@ TEST_F(ZarvoProcess, EndsByTheSignalThatEndsIt) {
     };
     for (const auto& run : kRuns)
         EXPECT_EQ(Transcript(kStatusOfSignal + run.signal, run.message),
-                  RunProgram(VARNEX_BINARY, run.command, ".", [&] { return SignalWhenThePipeIsFull(run.signal); }));
+                  RunProgram(VARNEX_BINARY, run.command, ".", [&] { return SignalWhenThePipeIsFull(run.signal); }))
+            << run.command[0];
 }
 
 TEST_F(ZarvoProcess, PutsOutAfterASignalWhatNeedNotWait) {
