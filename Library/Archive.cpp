@@ -74,7 +74,8 @@ zarvo_code zarvo_archive::RefuseDirectory(UInt64 bytes, Failure* failure) const 
                         static_cast<unsigned long long>(m_Options.max_directory_bytes));
 }
 
-// The directory and the list of blocks, as they are stored; 0 for the block-based layout, whose header has told.
+// The directory and the list of blocks, as they are stored; 0 for the block-based layout: CheckDirectorySize has looked
+// at its header.
 UInt64 zarvo_archive::DirectoryBytes() const {
     const core::string& signature = m_Reader.GetHeader().signature;
     const bool hasLongNodes = signature == kSignatureArchive;

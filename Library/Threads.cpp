@@ -22,7 +22,8 @@ UInt32 ChooseThreadCount(UInt32 wanted, UInt64 atMost) {
     return static_cast<UInt32>(std::clamp<UInt64>(std::min<UInt64>(count, atMost), 1, kMaxThreads));
 }
 
-// What threads block. A fault is its own thread's: the system ends the process if it can't have the signal.
+// What threads block. The signal of a fault goes to the thread that caused it: if that blocks it, the system ends the
+// process, whatever handler it has.
 static sigset_t AllButFaults() {
     sigset_t signals;
     sigfillset(&signals);

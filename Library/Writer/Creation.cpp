@@ -105,7 +105,7 @@ zarvo_code Creation::CheckCanWrite(EntrySource* source, Failure* failure) {
     ProgressClock clock(ProgressClock::Clock::now());
     UInt64 looked = 0;
     const auto tell = [&] { return TellProgress(m_Options, {.files = looked, .filesTotal = m_Entries.size()}); };
-    for (const bool areEmpty : {true, false}) // folders are with those that are
+    for (const bool areEmpty : {true, false}) // folders count as empty
         for (size_t index = 0; index < m_Entries.size(); ++index) {
             if (clock.IsDue() && !tell()) return failure->SetStopped();
             const EntryList::Entry& entry = m_Entries[index];

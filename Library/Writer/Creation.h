@@ -11,8 +11,7 @@
 
 class Creation : private NonCopyable {
 public:
-    // options and how: as the caller gave them. Both must outlive the object.
-    // path: of the archive. It outlives the creation, as the options do.
+    // path: of the archive. options and how: as the caller gave them. All three must outlive the object.
     Creation(const char* path, const zarvo_run_options& options, const zarvo_create_options& how)
         : m_Path(path), m_Options(options), m_How(how) {}
 

@@ -239,8 +239,9 @@ ZARVO_API size_t zarvo_normalize_path(const char* path, size_t length, char* out
 
 /* Items are what a folder can hold: the entries, and folders that have no entry but are implied by a path, such as
  * "road" by "road/of/one.txt". Entries keep their indices; implied folders have the numbers from zarvo_entry_count on.
- * Items are linked into a tree by their normal forms. An entry that a later one replaces, or that has a problem, is in
- * no folder. A file has children when entries lie below its path. The first call that needs the tree builds it. */
+ * Items are linked into a tree by their normal forms. An entry that zarvo_find does not find, because another one has
+ * its path or it has a problem, is in no folder. A file has children when entries lie below its path. The first call
+ * that needs the tree builds it. */
 #define ZARVO_ROOT UINT64_MAX
 #define ZARVO_NO_ITEM (UINT64_MAX - 1)
 
@@ -259,8 +260,7 @@ typedef struct zarvo_item {
 
 /* Finds the item with the same normal form as path: the last such entry (of files and folders, the last file), an
  * implied folder, or ZARVO_ROOT for a path whose normal form is empty. ZARVO_ERROR_NOT_FOUND when there is no such
- * item.
- */
+ * item. */
 ZARVO_API zarvo_code zarvo_find(const zarvo_archive* archive, const char* path, size_t length, uint64_t* item,
                                 zarvo_error** error);
 

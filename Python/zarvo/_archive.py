@@ -216,8 +216,8 @@ class Archive(Mapping[str, Entry]):
     """An open archive: a mapping of the paths of its entries to the entries, in the archive's order.
 
     The keys are paths as the archive stores them. A look-up takes any form of a path: "\\" is "/", and empty and "."
-    components don't count. Of entries with the same path, the last is in the mapping, as after extraction. Entries whose
-    paths extraction refuses are not in it; entries() has all.
+    components don't count. Of entries with the same path, the last is in the mapping (of files and folders, the last
+    file). Entries whose paths extraction refuses are not in it; entries() has all.
 
     Use it in a with statement, or close it. Any number of threads may use it. It can be pickled, and is then opened
     again where it is unpickled.
@@ -320,7 +320,7 @@ class Archive(Mapping[str, Entry]):
         return id(self)
 
     def entries(self) -> Iterator[Entry]:
-        """Yield every entry of the directory, also those that a later one replaces or that extraction refuses."""
+        """Yield every entry of the directory, also those that are not in the mapping."""
         for index in range(self._native.entry_count()):
             yield _get_entry(self, index)
 

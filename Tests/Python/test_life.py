@@ -227,7 +227,6 @@ class Threads(LifeTest):
             ended = run_python(script, str(self.path))
             self.assertEqual((0, ""), (ended.returncode, ended.stderr))
 
-
     def test_of_a_process_that_ends_may_still_drop_archives(self):
         script = """if True:
             import ctypes, sys

@@ -4,7 +4,6 @@
 
 #include <algorithm>
 #include <charconv>
-#include <climits>
 #include <limits>
 
 namespace {
@@ -31,8 +30,9 @@ std::string CheckValue(const Option& option, const std::string& value) {
         unsigned count = 0;
         const auto [end, error] = std::from_chars(value.data(), value.data() + value.size(), count);
         if (error != std::errc() || end != value.data() + value.size() || count < least)
-            return MakeMessage("%: '%' is no number from % to %",
-                               {name, value, std::to_string(least), std::to_string(UINT_MAX)});
+            return MakeMessage(
+                "%: '%' is no number from % to %",
+                {name, value, std::to_string(least), std::to_string(std::numeric_limits<unsigned>::max())});
     }
     const std::string choices = '|' + std::string(option.choices) + '|';
     if (option.kind == ValueKind::kChoice &&

@@ -38,7 +38,7 @@ TEST_F(ZarvoCat, TakesTheLastOfEqualNames) {
     EXPECT_EQ((Heard{0, "3", ""}), Zarvo({"cat", "a.zarvo", "?\\\\a//*"})) << "matched as it is stored";
 }
 
-// As extraction does when the file comes first.
+// Whichever comes first: only files can be printed.
 TEST_F(ZarvoCat, TakesTheFileWhereAFolderHasItsName) {
     MakeArchive("a.zarvo", Archive("h:1 h|"));
     MakeArchive("b.zarvo", Archive("h| h:1"));
