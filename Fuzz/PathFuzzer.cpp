@@ -41,14 +41,20 @@ int32_t ProblemOf(const ArchiveEntry& entry) {
     return entry.flags != kFolderEntry && endsInSeparator ? ZARVO_PROBLEM_SEPARATOR : ZARVO_PROBLEM_NONE;
 }
 
-// By normal form: the entry that counts, or none for an implied folder.
+// By normal form: the entry that counts, which is the last file or, where there is none, the last folder; or none for
+// an implied folder.
 constexpr UInt64 kImplied = ~UInt64{0};
 using Items = std::map<std::string, UInt64>;
 
 Items ItemsOf(const std::vector<ArchiveEntry>& entries) {
     Items items;
-    for (UInt64 index = 0; index < entries.size(); ++index)
-        if (ProblemOf(entries[index]) == ZARVO_PROBLEM_NONE) items[Join(Split(entries[index].path))] = index;
+    for (const bool areFolders : {true, false})
+        for (UInt64 index = 0; index < entries.size(); ++index) {
+            const ArchiveEntry& entry = entries[index];
+            const bool isFolder = entry.flags == kFolderEntry;
+            if (isFolder == areFolders && ProblemOf(entry) == ZARVO_PROBLEM_NONE)
+                items[Join(Split(entry.path))] = index;
+        }
     for (const ArchiveEntry& entry : entries) {
         if (ProblemOf(entry) != ZARVO_PROBLEM_NONE) continue;
         Components folder = Split(entry.path);
