@@ -27,7 +27,8 @@ zarvo_code zarvo_archive::Open(Failure* failure) {
         return failure->Set(ZARVO_ERROR_LIMIT, "%llu entries; the limit (max_entries) is %llu",
                             static_cast<unsigned long long>(Nodes().size()),
                             static_cast<unsigned long long>(m_Options.max_entries));
-    if (DirectoryBytes() > m_Options.max_directory_bytes) return RefuseDirectory(DirectoryBytes(), failure);
+    if (const UInt64 bytes = DirectoryBytes(); bytes > m_Options.max_directory_bytes)
+        return RefuseDirectory(bytes, failure);
     m_Data = {New<DataReader>(kMemLabelFileSystem, &m_Blocks, &m_Cache, m_Options.max_block_bytes),
               kMemLabelFileSystem};
     if (!m_Data) return failure->SetMemory();

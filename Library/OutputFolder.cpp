@@ -27,9 +27,9 @@ zarvo_code OutputFolder::Open(const char* path, Failure* failure) {
     for (size_t end = 1; end <= whole.size(); ++end) {
         if (end != whole.size() && whole[end] != '/') continue;
         start = whole.substr(0, end);
-        const bool isMade = RepeatOnInterrupt([&] { return mkdir(start.c_str(), 0777); }) == 0;
+        const int answer = RepeatOnInterrupt([&] { return mkdir(start.c_str(), 0777); }) == 0 ? 0 : errno;
         // What lies below a folder that can't be made is missing: that is no reason of its own.
-        if (isMade || errno != ENOENT || error == 0 || error == EEXIST) error = isMade ? 0 : errno;
+        if (answer != ENOENT || error == 0 || error == EEXIST) error = answer;
     }
     m_Descriptor = RepeatOnInterrupt([&] { return open(path, O_PATH | O_DIRECTORY | O_CLOEXEC); });
     if (m_Descriptor >= 0) return ZARVO_OK;
