@@ -39,19 +39,6 @@ std::string ReadManualLine(const std::string& line, const std::string& mark = ""
     return std::regex_replace(text, std::regex("\\\\\\(aq"), "'");
 }
 
-TEST(ZarvoManual, HasTheOptionsOfTheHelp) {
-    std::set<std::string> listed, known;
-    for (const std::string& line : FindAll(ReadManualSection("OPTIONS"), "\n\\.TP\n\\.BI? ([^\n]*)"))
-        listed.insert(ReadManualLine(line));
-    std::vector<const Subcommand*> subcommands(GetSubcommands().begin(), GetSubcommands().end());
-    subcommands.push_back(&kNoSubcommand);
-    for (const Subcommand* const subcommand : subcommands)
-        for (const Option* const option : subcommand->options)
-            known.insert(DescribeOption(*option));
-    EXPECT_EQ(known, listed);
-    EXPECT_LT(8u, known.size());
-}
-
 // In parentheses, the manual says which subcommands have an option; without them, it means all.
 TEST(ZarvoManual, NamesTheSubcommandsOfEachOption) {
     std::map<std::string, std::string> owners, told;
@@ -74,6 +61,7 @@ TEST(ZarvoManual, NamesTheSubcommandsOfEachOption) {
     for (auto& [option, names] : owners)
         names = std::regex_replace(names, std::regex("^" + all + ".*"), all);
     EXPECT_EQ(owners, told);
+    EXPECT_LT(8u, owners.size());
 }
 
 TEST(ZarvoManual, HasEverySubcommand) {
